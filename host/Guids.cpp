@@ -1,0 +1,70 @@
+// The published interface and class identifiers, and the meanings of the result codes.
+//
+// Identifiers are part of the binary interface: a plug-in built against one release of the host
+// kit keeps working with the next only while these values stay as they are. Never change one;
+// give a changed interface a new identifier instead.
+
+#include "tessarofx/NLECGFilter.h"
+#include "tessarofx/NLEComBase.h"
+#include "tessarofx/NLEFrame.h"
+#include "tessarofx/NLEHost.h"
+#include "tessarofx/NLEProperties.h"
+
+// The component model's own identity interface; every component system uses this value.
+const IID IID_IUnknown = {
+    0x00000000, 0x0000, 0x0000, {0xC0, 0x00, 0x00, 0x00, 0x00, 0x00, 0x00, 0x46}};
+
+const IID IID_INLEProperties = {
+    0xAD8E0F40, 0x0E9C, 0x4893, {0xB8, 0x0C, 0x4C, 0xAC, 0x22, 0x37, 0x57, 0x84}};
+const CLSID CLSID_NLEProperties = {
+    0x6F511BD9, 0xA686, 0x4131, {0x88, 0x39, 0x29, 0xA4, 0x2A, 0x43, 0x05, 0xA4}};
+
+const IID IID_INLEFrame = {
+    0x8D7BBB3E, 0x3D77, 0x4350, {0x80, 0x64, 0xA9, 0x15, 0xC7, 0x84, 0x93, 0x33}};
+const IID IID_INLEFrameBuffer = {
+    0x26BF0F7C, 0xCC48, 0x4527, {0xAF, 0x0F, 0x46, 0x9A, 0xFB, 0x26, 0x88, 0x8C}};
+const IID IID_INLEFrameSurface = {
+    0x49E4196D, 0x2959, 0x40C7, {0x90, 0x5F, 0x0C, 0xCB, 0xE4, 0xF7, 0xF4, 0xE3}};
+const IID IID_INLECGDevice = {
+    0x8B234115, 0xDA2F, 0x4BD2, {0x91, 0x73, 0xC7, 0x72, 0xD6, 0x19, 0x43, 0x33}};
+const IID IID_INLECGOpenCLOperate = {
+    0xC6E15029, 0x80F6, 0x475F, {0xA6, 0x4E, 0xEF, 0x2F, 0x76, 0xB3, 0x9D, 0x50}};
+
+const CLSID CLSID_NLEEnviroment = {
+    0xA789B289, 0x3BAC, 0x4751, {0xA0, 0x65, 0xEF, 0x8A, 0x01, 0x55, 0xA9, 0x0E}};
+const IID IID_INLEEnviroment = {
+    0xE1AF088B, 0xFCC3, 0x4594, {0xA3, 0x60, 0xBE, 0xD3, 0xB2, 0xE8, 0x1D, 0x33}};
+const CLSID CLSID_NLEMemoryFrame = {
+    0xAA92FC86, 0x97EA, 0x4605, {0x84, 0xCF, 0xB8, 0xC7, 0x02, 0x6A, 0x20, 0xB2}};
+const IID IID_INLEMemoryFrame = {
+    0x3A5366D7, 0x1C52, 0x4ED6, {0x96, 0x19, 0x53, 0xEA, 0x84, 0xF0, 0x9E, 0xF0}};
+
+const IID IID_INLECGFilter = {
+    0x010811EF, 0xF920, 0x480B, {0x9F, 0x8B, 0x1D, 0xFF, 0xC6, 0x64, 0xCF, 0x93}};
+
+extern "C" const char* NLEResultText(HRESULT hr) {
+  switch (hr) {
+    case NLE_S_OK:
+      return "success";
+    case NLE_S_FALSE:
+      return "success (false)";
+    case NLE_E_NOTIMPL:
+      return "not implemented";
+    case NLE_E_INVALIDARG:
+      return "bad argument or not found";
+    case NLE_E_RESOURCE:
+      return "resource unavailable";
+    case NLE_E_NOINTERFACE:
+      return "interface not supported";
+    case NLE_E_POINTER:
+      return "null pointer";
+    case NLE_E_OUTOFMEMORY:
+      return "out of memory";
+    case NLE_E_TYPEMISMATCH:
+      return "type mismatch";
+    case NLE_E_CLASSNOTREG:
+      return "class not registered";
+    default:
+      return "unknown error";
+  }
+}
