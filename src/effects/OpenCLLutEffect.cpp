@@ -1,0 +1,20 @@
+// Lut (OpenCL): a 3D LUT file applied on the device.
+#include "plugin/NLEBasicCrossFilter.h"
+
+namespace {
+
+class NLEOpenCLLut final : public NLEBasicCrossFilter {
+ public:
+  static NLEBasicCrossFilter* create() { return new NLEOpenCLLut(); }
+
+  HRESULT InitFilter(INLECGDevice* device, const std::string& programPath) override {
+    const HRESULT hr = NLEBasicCrossFilter::InitFilter(device, programPath);
+    if (hr == NLE_E_RESOURCE) return hr;
+    return InitProgram("LUT", "MAIN", programPath);
+  }
+};
+
+const NLEOpenCLLut::_auto_register s_register(L"74EB022D-1D73-4D1E-9F70-487C356D46CD", L"Lut",
+                                              &NLEOpenCLLut::create);
+
+}  // namespace

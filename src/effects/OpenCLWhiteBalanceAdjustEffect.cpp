@@ -1,0 +1,21 @@
+// WhiteBalanceAdjust (OpenCL): temperature and tint on the device.
+#include "effects/EffectParams.h"
+#include "plugin/NLEBasicCrossFilter.h"
+namespace {
+
+class NLEOpenCLWhiteBalanceAdjustEffect final : public NLEBasicCrossFilter {
+ public:
+  static NLEBasicCrossFilter* create() { return new NLEOpenCLWhiteBalanceAdjustEffect(); }
+
+  HRESULT InitFilter(INLECGDevice* device, const std::string& programPath) override {
+    const HRESULT hr = NLEBasicCrossFilter::InitFilter(device, programPath);
+    if (hr == NLE_E_RESOURCE) return hr;
+    return InitProgram("WhiteBalanceAdjust", "auto_white_balance", programPath);
+  }
+};
+
+const NLEOpenCLWhiteBalanceAdjustEffect::_auto_register s_register(
+    L"39509FB9-39FB-4516-9464-3D891DD61D62", L"WhiteBalanceAdjust",
+    &NLEOpenCLWhiteBalanceAdjustEffect::create, &RegisterWhiteBalanceParams);
+
+}  // namespace
