@@ -1,0 +1,167 @@
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <map>
+
+#include "Commands.h"
+#include "DemoScene.h"
+#include "FilterHost.h"
+#include "ImageFiles.h"
+#include "Text.h"
+#include "tessarofx/NLEComBase.h"
+
+namespace tfxtool {
+namespace {
+
+struct DemoStep {
+  std::string filter;  // as on the command line
+  std::vector<ParamSetting> params;
+  // Earlier steps whose results are this step's inputs; empty: the scene. A keyer's chain needs
+  // the mask of one step as the background of the next.
+  std::string foreground;
+  std::string background;  // empty: the foreground
+};
+
+// One representative setting per filter. Steps whose filter is not implemented yet are skipped
+// with a note, so entries can be added ahead of the effects.
+std::vector<DemoStep> DemoSteps(const std::string& lutPath) {
+  const Rgb key = DemoScreenColour();
+  return {
+      {"ColorAdjust",
+       {{"u_exposure", "20"}, {"u_contrast", "30"}, {"u_vib", "40"}, {"u_sat", "20"}},
+       "",
+       ""},
+      {"LightAdjust",
+       {{"u_highLight", "-40"},
+        {"u_shadow", "50"},
+        {"u_whiteLevel", "20"},
+        {"u_blackLevel", "-20"}},
+       "",
+       ""},
+      {"WhiteBalanceAdjust", {{"u_temperature", "40"}, {"u_tint", "10"}}, "", ""},
+      {"VignetteAdjust",
+       {{"amount", "-60"}, {"size", "40"}, {"roundness", "50"}, {"feather", "60"}},
+       "",
+       ""},
+      {"DistortionFringingAdjust", {{"distortion", "30"}, {"fringing", "60"}}, "", ""},
+      {"ColorLut3dAdjust", {{"lut3dPath", lutPath}}, "", ""},
+      {"HSLAdjust", {}, "", ""},
+      {"ChromeKeyLut3d",
+       {{"red", std::to_string(key.r)},
+        {"green", std::to_string(key.g)},
+        {"blue", std::to_string(key.b)},
+        {"contrast", "50"},
+        {"offset", "0"},
+        {"mode", "0"}},
+       "",
+       ""},
+      {"ChromeKeyCombine", {}, "", "ChromeKeyLut3d"},
+      {"lutAToWhiteEffect", {}, "ChromeKeyCombine", ""},
+  };
+}
+
+std::string Caption(const DemoStep& step) {
+  std::string text;
+  for (const ParamSetting& p : step.params) {
+    // A path says little on a thumbnail; the file name is enough.
+    const size_t slash = p.value.rfind('/');
+    const std::string value = slash == std::string::npos ? p.value : p.value.substr(slash + 1);
+    text += (text.empty() ? "" : " ") + p.name + "=" + value;
+  }
+  if (!step.background.empty()) text += (text.empty() ? "" : " ") + ("bg: " + step.background);
+  if (!step.foreground.empty()) text += (text.empty() ? "" : " ") + ("fg: " + step.foreground);
+  return text.empty() ? "no parameters" : text;
+}
+
+Status MakeDirectories(const std::string& dir) {
+  for (size_t pos = 1; pos <= dir.size(); ++pos) {
+    if (pos != dir.size() && dir[pos] != '/') continue;
+    const std::string part = dir.substr(0, pos);
+    if (mkdir(part.c_str(), 0777) != 0 && errno != EEXIST) {
+      return Status::Error("cannot create " + part + ": " + std::strerror(errno));
+    }
+  }
+  struct stat st;
+  if (stat(dir.c_str(), &st) != 0 || !S_ISDIR(st.st_mode)) {
+    return Status::Error("cannot use " + dir + ": not a directory");
+  }
+  return Status::Ok();
+}
+
+}  // namespace
+
+Status DemoCommand(const GlobalOptions& options, const Args& args) {
+  if (args.size() > 1) return Status::Error("demo: unexpected argument '" + args[1] + "'");
+  if (!args.empty() && IsOptionWord(args[0])) {
+    return Status::Error("demo: unknown option '" + args[0] + "'");
+  }
+  std::string dir = args.empty() ? "demo-out" : args[0];
+  while (dir.size() > 1 && dir.back() == '/') dir.pop_back();
+
+  PluginLibrary plugin;
+  if (Status s = plugin.Load(options.pluginPath); !s.ok()) return s;
+  std::vector<PublishedFilter> published;
+  if (Status s = ReadPublishedFilters(plugin, &published); !s.ok()) return s;
+  if (Status s = MakeDirectories(dir); !s.ok()) return s;
+
+  const cv::Mat scene = MakeDemoScene(960, 540);
+  if (Status s = WriteImage(dir + "/sample.png", scene); !s.ok()) return s;
+  const std::string lut = MakeDemoLut(17);
+  const std::string lutPath = dir + "/demo-look.cube";
+  if (Status s = WriteFileReplacing(lutPath, std::vector<unsigned char>(lut.begin(), lut.end()));
+      !s.ok()) {
+    return s;
+  }
+
+  std::map<std::string, cv::Mat> results;
+  std::vector<SheetTile> tiles = {{"Original", "before", scene}};
+  int failures = 0;
+  for (const DemoStep& step : DemoSteps(lutPath)) {
+    auto input = [&](const std::string& name, const cv::Mat& fallback, cv::Mat* image) {
+      if (name.empty()) {
+        *image = fallback;
+        return true;
+      }
+      auto it = results.find(name);
+      if (it == results.end()) return false;
+      *image = it->second;
+      return true;
+    };
+    cv::Mat foreground, background;
+    const bool haveForeground = input(step.foreground, scene, &foreground);
+    if (!haveForeground || !input(step.background, foreground, &background)) {
+      std::printf("skipped %s: it needs the result of %s\n", step.filter.c_str(),
+                  (haveForeground ? step.background : step.foreground).c_str());
+      continue;
+    }
+    ResolvedFilter filter;
+    cv::Mat result;
+    Status s = ResolveFilter(published, step.filter, &filter);
+    if (s.ok()) s = RunFilter(plugin, filter, step.params, foreground, background, &result);
+    if (!s.ok() && s.code() == NLE_E_NOTIMPL) {
+      std::printf("skipped %s: not implemented yet\n", step.filter.c_str());
+      continue;
+    }
+    const std::string file = dir + "/" + step.filter + ".png";
+    if (s.ok()) s = WriteImage(file, result);
+    if (!s.ok()) {
+      std::fprintf(stderr, "tessarofx: error: %s\n", s.message().c_str());
+      ++failures;
+      continue;
+    }
+    std::printf("wrote %s\n", file.c_str());
+    results[step.filter] = result;
+    tiles.push_back({step.filter, Caption(step), result});
+  }
+
+  const cv::Mat sheet = MakeContactSheet("TessaroFx demo: before and after", tiles);
+  const std::string sheetFile = dir + "/contact-sheet.png";
+  if (Status s = WriteImage(sheetFile, sheet); !s.ok()) return s;
+  std::printf("wrote %s\n", sheetFile.c_str());
+  if (failures) return Status::Error(std::to_string(failures) + " demo filter(s) failed");
+  return Status::Ok();
+}
+
+}  // namespace tfxtool

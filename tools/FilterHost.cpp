@@ -1,0 +1,340 @@
+#include "FilterHost.h"
+
+#include <algorithm>
+#include <cctype>
+
+#include "Text.h"
+#include "tessarofx/NLECGFilter.h"
+#include "tessarofx/NLEHost.h"
+
+namespace tfxtool {
+namespace {
+
+namespace Key = NLEKey::Filter;
+namespace PKey = NLEKey::Filter::Property;
+
+std::string ReadString(INLEProperties* bag, const wchar_t* key) {
+  wchar_t buf[1024] = {};
+  if (NLE_FAILED(bag->GetString(key, buf, 1024, nullptr))) return {};
+  return Narrow(buf);
+}
+
+int32_t ReadInt(INLEProperties* bag, const wchar_t* key, int32_t fallback) {
+  int32_t v = 0;
+  return NLE_SUCCEEDED(bag->GetInt(key, &v)) ? v : fallback;
+}
+
+double ReadNumber(INLEProperties* bag, const wchar_t* key, double fallback) {
+  CNLEValue value;
+  double v = 0;
+  if (NLE_SUCCEEDED(bag->GetValue(key, &value)) && value.GetDouble(&v)) return v;
+  return NLE_SUCCEEDED(bag->GetDouble(key, &v)) ? v : fallback;
+}
+
+NLEComPtr<INLEProperties> ParamBag(INLEProperties* descriptor, int i) {
+  NLEComPtr<IUnknown> unknown;
+  NLEComPtr<INLEProperties> bag;
+  if (NLE_SUCCEEDED(descriptor->GetInterface(PKey::kParamsArray[i], &unknown)) && unknown) {
+    if (NLE_FAILED(unknown.QueryInterface(IID_INLEProperties, &bag))) bag.Reset();
+  }
+  return bag;
+}
+
+// The descriptor's parameters first, in their registered order (the filter's own copies are
+// indexed by it), then those the tool's table adds.
+std::vector<FilterParam> MergeParams(INLEProperties* descriptor, const FilterInfo* info) {
+  std::vector<FilterParam> params;
+  const int count = descriptor ? std::clamp(ReadInt(descriptor, PKey::kCount, 0), 0,
+                                            static_cast<int>(PKey::kMaxParams))
+                               : 0;
+  for (int i = 0; i < count; ++i) {
+    NLEComPtr<INLEProperties> bag = ParamBag(descriptor, i);
+    if (!bag) continue;
+    FilterParam p;
+    p.name = ReadString(bag, PKey::kVariantName);
+    if (p.name.empty()) p.name = ReadString(bag, PKey::kFriendName);
+    p.type = ReadInt(bag, PKey::kType, 3) == 1 ? ParamType::kInt : ParamType::kDouble;
+    p.defaultValue = ReadNumber(bag, PKey::kValue_Default, 0);
+    p.min = ReadNumber(bag, PKey::kValue_Min, p.defaultValue);
+    p.max = ReadNumber(bag, PKey::kValue_Max, p.defaultValue);
+    p.registered = bag;
+    params.push_back(p);
+  }
+  if (!info) return params;
+  for (const ParamInfo& row : info->params) {
+    auto known = std::find_if(params.begin(), params.end(),
+                              [&](const FilterParam& p) { return p.name == row.name; });
+    if (known != params.end()) {
+      known->meaning = row.meaning;
+      continue;
+    }
+    FilterParam p;
+    p.name = row.name;
+    p.type = row.type;
+    p.defaultValue = row.defaultValue;
+    p.min = row.min;
+    p.max = row.max;
+    p.meaning = row.meaning;
+    params.push_back(p);
+  }
+  return params;
+}
+
+std::string NormaliseGuid(std::string text) {
+  if (text.size() == 38 && text.front() == '{' && text.back() == '}') {
+    text = text.substr(1, 36);
+  }
+  for (char& c : text) c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
+  return text;
+}
+
+std::string ValidNames(const std::vector<FilterParam>& params) {
+  std::string names;
+  for (const FilterParam& p : params) names += (names.empty() ? "" : ", ") + p.name;
+  return names;
+}
+
+// The value a setting gives its parameter, checked against the parameter's type and range.
+Status ParseSettingValue(const std::string& filterName, const FilterParam& param,
+                         const std::string& text, CNLEValue* value, std::wstring* wide) {
+  if (param.type == ParamType::kString) {
+    *wide = Widen(text);
+    return Status::Ok();
+  }
+  double v = 0;
+  if (param.type == ParamType::kInt) {
+    long long i = 0;
+    if (!ParseInteger(text, &i)) {
+      return Status::Error("bad value '" + text + "' for " + param.name + ": not an integer");
+    }
+    v = static_cast<double>(i);
+  } else if (!ParseNumber(text, &v)) {
+    return Status::Error("bad value '" + text + "' for " + param.name + ": not a number");
+  }
+  if (v < param.min || v > param.max) {
+    return Status::Error(filterName + " " + param.name + " = " + text + " is outside its range " +
+                         FormatNumber(param.min) + ".." + FormatNumber(param.max));
+  }
+  if (param.type == ParamType::kInt) {
+    *value = CNLEValue(static_cast<int>(v));
+  } else {
+    *value = CNLEValue(v);
+  }
+  return Status::Ok();
+}
+
+// A parameter bag as a host fills it. A registered parameter starts as a copy of the
+// descriptor's bag, so whatever the plug-in put there travels back unchanged; the descriptor's
+// own bag is shared with every filter of its class and is never written.
+Status BuildParamBag(const FilterParam& param, const CNLEValue* number, const std::wstring* text,
+                     NLEComPtr<INLEProperties>& out) {
+  NLEComPtr<INLEProperties> bag;
+  if (NLE_FAILED(NLECommon::CreateProperties(&bag)) || !bag) {
+    return Status::Error("cannot create a property bag");
+  }
+  const std::wstring name = Widen(param.name);
+  if (param.registered) {
+    param.registered->CopyTo(bag);
+  } else {
+    bag->SetString(PKey::kVariantName, name.c_str());
+    bag->SetString(PKey::kFriendName, name.c_str());
+    bag->SetInt(PKey::kDisplayType, 0);
+    bag->SetInt(PKey::kType, static_cast<int32_t>(param.type));
+    if (param.type == ParamType::kString) {
+      bag->SetString(PKey::kValue_Default, L"");
+    } else if (param.type == ParamType::kInt) {
+      bag->SetValue(PKey::kValue_Min, CNLEValue(static_cast<int>(param.min)));
+      bag->SetValue(PKey::kValue_Max, CNLEValue(static_cast<int>(param.max)));
+      bag->SetValue(PKey::kValue_Default, CNLEValue(static_cast<int>(param.defaultValue)));
+    } else {
+      bag->SetValue(PKey::kValue_Min, CNLEValue(param.min));
+      bag->SetValue(PKey::kValue_Max, CNLEValue(param.max));
+      bag->SetValue(PKey::kValue_Default, CNLEValue(param.defaultValue));
+    }
+  }
+  HRESULT hr = NLE_S_OK;
+  if (param.type == ParamType::kString) {
+    hr = bag->SetString(PKey::kValue_Current, text ? text->c_str() : L"");
+  } else if (number) {
+    hr = bag->SetValue(PKey::kValue_Current, *number);
+  } else if (!param.registered) {
+    CNLEValue def;
+    bag->GetValue(PKey::kValue_Default, &def);
+    hr = bag->SetValue(PKey::kValue_Current, def);
+  }
+  if (NLE_FAILED(hr)) {
+    return Status::Error("cannot set " + param.name + ": " + DescribeResult(hr), hr);
+  }
+  out = bag;
+  return Status::Ok();
+}
+
+// NLEComPtr's operator& serves out-parameters of interface calls, so helpers that fill a
+// counted pointer take it by reference.
+Status BuildProperties(const ResolvedFilter& filter, const std::vector<ParamSetting>& settings,
+                       NLEComPtr<INLEProperties>& out) {
+  // Each parameter's value, the last setting of a name winning as on most command lines.
+  std::vector<CNLEValue> numbers(filter.params.size());
+  std::vector<std::wstring> texts(filter.params.size());
+  std::vector<bool> set(filter.params.size(), false);
+  for (const ParamSetting& s : settings) {
+    size_t i = 0;
+    while (i < filter.params.size() && !EqualsNoCase(filter.params[i].name, s.name)) ++i;
+    if (i == filter.params.size()) {
+      if (filter.params.empty()) return Status::Error(filter.name + " takes no parameters");
+      return Status::Error(filter.name + " has no parameter '" + s.name +
+                           "' (valid: " + ValidNames(filter.params) + ")");
+    }
+    if (Status st =
+            ParseSettingValue(filter.name, filter.params[i], s.value, &numbers[i], &texts[i]);
+        !st.ok()) {
+      return st;
+    }
+    set[i] = true;
+  }
+  if (filter.params.size() > static_cast<size_t>(PKey::kMaxParams)) {
+    return Status::Error(filter.name + " has more parameters than a descriptor holds");
+  }
+
+  NLEComPtr<INLEProperties> props;
+  if (NLE_FAILED(NLECommon::CreateProperties(&props)) || !props) {
+    return Status::Error("cannot create a property bag");
+  }
+  for (size_t i = 0; i < filter.params.size(); ++i) {
+    NLEComPtr<INLEProperties> bag;
+    if (Status st = BuildParamBag(filter.params[i], set[i] ? &numbers[i] : nullptr,
+                                  set[i] ? &texts[i] : nullptr, bag);
+        !st.ok()) {
+      return st;
+    }
+    props->SetInterface(PKey::kParamsArray[i], bag.get());
+  }
+  props->SetInt(PKey::kCount, static_cast<int32_t>(filter.params.size()));
+  out = props;
+  return Status::Ok();
+}
+
+// A host frame over a matrix's pixels; the matrix must outlive it.
+Status WrapFrame(const cv::Mat& bgra, NLEComPtr<INLEMemoryFrame>& frame) {
+  NLEComPtr<INLEMemoryFrame> f;
+  HRESULT hr = NLECommon::CreateMemoryFrame(bgra.cols, bgra.rows, 0, &f);
+  // Filters only read their input frames; the destination is the one matrix written.
+  if (NLE_SUCCEEDED(hr) && f) {
+    hr = f->Wrap(const_cast<uint8_t*>(bgra.ptr<uint8_t>()), bgra.cols, bgra.rows,
+                 static_cast<int32_t>(bgra.step[0]), kNLEFrameTopDown);
+  }
+  if (NLE_FAILED(hr) || !f) {
+    return Status::Error("cannot create a frame: " + DescribeResult(hr), hr);
+  }
+  frame = f;
+  return Status::Ok();
+}
+
+}  // namespace
+
+Status ReadPublishedFilters(const PluginLibrary& plugin, std::vector<PublishedFilter>* filters) {
+  filters->clear();
+  const uint32_t count = plugin.FilterCount();
+  for (uint32_t i = 0; i < count; ++i) {
+    NLEComPtr<INLEProperties> descriptor;
+    const HRESULT hr = plugin.Properties(static_cast<int>(i), &descriptor);
+    if (NLE_FAILED(hr) || !descriptor) {
+      return Status::Error(
+          "cannot read the descriptor of filter " + std::to_string(i) + ": " + DescribeResult(hr),
+          hr);
+    }
+    PublishedFilter f;
+    f.index = static_cast<int>(i);
+    f.guid = ReadString(descriptor, Key::kFilterID);
+    f.name = ReadString(descriptor, Key::kFilterFriendName);
+    f.cpu = ReadInt(descriptor, Key::kFilterCSupport, 0) != 0;
+    f.opencl = ReadInt(descriptor, Key::kFilterOpenclSupport, 0) != 0;
+    f.params = MergeParams(descriptor, FindFilterByGuid(f.guid));
+    filters->push_back(std::move(f));
+  }
+  return Status::Ok();
+}
+
+Status ResolveFilter(const std::vector<PublishedFilter>& published, const std::string& request,
+                     ResolvedFilter* filter) {
+  const std::string guid = NormaliseGuid(request);
+  const PublishedFilter* match = nullptr;
+  std::string name;
+  for (const PublishedFilter& f : published) {
+    if (f.guid == guid || EqualsNoCase(f.name, request)) {
+      match = &f;
+      name = f.name;
+    }
+  }
+  if (!match) {
+    // A class hidden behind the published one: same GUID, its own registered name.
+    if (const FilterInfo* info = FindFilterByName(request)) {
+      for (const PublishedFilter& f : published) {
+        if (f.guid != info->guid) continue;
+        match = &f;
+        name = info->name;
+        for (const char* alias : info->aliases) {
+          if (EqualsNoCase(alias, request)) name = alias;
+        }
+      }
+    }
+  }
+  if (!match) {
+    return Status::Error("unknown filter '" + request + "' (see 'tessarofx list')");
+  }
+  filter->guid = match->guid;
+  filter->name = name;
+  filter->params = match->params;
+  return Status::Ok();
+}
+
+Status ParseParamSetting(const std::string& text, ParamSetting* setting) {
+  const size_t eq = text.find('=');
+  if (eq == std::string::npos || eq == 0) {
+    return Status::Error("expected NAME=VALUE after -p, got '" + text + "'");
+  }
+  setting->name = text.substr(0, eq);
+  setting->value = text.substr(eq + 1);
+  return Status::Ok();
+}
+
+Status RunFilter(const PluginLibrary& plugin, const ResolvedFilter& filter,
+                 const std::vector<ParamSetting>& settings, const cv::Mat& foreground,
+                 const cv::Mat& background, cv::Mat* out) {
+  NLEComPtr<INLEProperties> props;
+  if (Status s = BuildProperties(filter, settings, props); !s.ok()) return s;
+
+  const std::wstring guid = Widen(filter.guid);
+  NLEComPtr<INLECGFilter> fx;
+  INLECGFilter* raw = nullptr;
+  HRESULT hr = plugin.Create(guid.c_str(), props, &raw);
+  fx.Attach(raw);
+  if (NLE_FAILED(hr) || !fx) {
+    return Status::Error("cannot create " + filter.name + ": " + DescribeResult(hr), hr);
+  }
+
+  cv::Mat dst(foreground.size(), CV_8UC4, cv::Scalar::all(0));
+  NLEComPtr<INLEMemoryFrame> fgFrame, bgFrame, dstFrame;
+  if (Status s = WrapFrame(foreground, fgFrame); !s.ok()) return s;
+  if (Status s = WrapFrame(background, bgFrame); !s.ok()) return s;
+  if (Status s = WrapFrame(dst, dstFrame); !s.ok()) return s;
+
+  fx->SetForeground(fgFrame.get());
+  fx->SetBackground(bgFrame.get());
+  fx->SetTotalTime(1);
+  fx->SetCurrentTime(0);
+  CGFilterParam param = {};
+  param.frameSize = {foreground.cols, foreground.rows};
+  param.quality = 1;
+  hr = fx->Prepare(param);
+  if (NLE_SUCCEEDED(hr)) hr = fx->Running(dstFrame.get());
+  // The filter borrowed the frames; drop it before they go.
+  fx.Reset();
+  if (NLE_FAILED(hr)) {
+    return Status::Error(filter.name + " failed: " + DescribeResult(hr), hr);
+  }
+  *out = dst;
+  return Status::Ok();
+}
+
+}  // namespace tfxtool

@@ -1,0 +1,68 @@
+// The host side of running a filter: reading the published descriptors, finding a filter by
+// GUID or name, turning command-line settings into the property bags the plug-in expects, and
+// driving one frame through a filter object.
+#pragma once
+
+#include <opencv2/core.hpp>
+#include <string>
+#include <vector>
+
+#include "FilterTable.h"
+#include "PluginLibrary.h"
+#include "Status.h"
+#include "tessarofx/NLEProperties.h"
+
+namespace tfxtool {
+
+// One parameter as a host presents it: the descriptor's entry where the filter registers it,
+// completed (meaning, and the whole entry for unregistered ones) from the tool's table.
+struct FilterParam {
+  std::string name;
+  ParamType type = ParamType::kDouble;
+  double defaultValue = 0;
+  double min = 0;
+  double max = 0;
+  std::string meaning;
+  // The descriptor's own bag, read only: bags given to the plug-in are copies of it.
+  NLEComPtr<INLEProperties> registered;
+};
+
+struct PublishedFilter {
+  int index = 0;
+  std::string guid;
+  std::string name;
+  bool cpu = false;
+  bool opencl = false;
+  std::vector<FilterParam> params;
+};
+
+// Every published filter, in index order.
+Status ReadPublishedFilters(const PluginLibrary& plugin, std::vector<PublishedFilter>* filters);
+
+struct ResolvedFilter {
+  std::string guid;
+  std::string name;  // the name the user asked for, as registered
+  std::vector<FilterParam> params;
+};
+
+// FILTER as given on the command line: a GUID (braces optional) or a friendly name, published or
+// registered behind a published one, in any letter case.
+Status ResolveFilter(const std::vector<PublishedFilter>& published, const std::string& request,
+                     ResolvedFilter* filter);
+
+struct ParamSetting {
+  std::string name;
+  std::string value;
+};
+
+// Splits "NAME=VALUE".
+Status ParseParamSetting(const std::string& text, ParamSetting* setting);
+
+// Creates the filter's CPU class with the settings applied and runs it once: `foreground` is the
+// frame the effect adjusts, `background` the frame under it; `out` gets the foreground's size.
+// The inputs are only read.
+Status RunFilter(const PluginLibrary& plugin, const ResolvedFilter& filter,
+                 const std::vector<ParamSetting>& settings, const cv::Mat& foreground,
+                 const cv::Mat& background, cv::Mat* out);
+
+}  // namespace tfxtool

@@ -1,0 +1,145 @@
+#include "ImageFunctions.h"
+
+#include <new>
+#include <type_traits>
+
+#include "FilterTable.h"
+#include "Text.h"
+#include "tessarofx/ColorAdjust.h"
+#include "tessarofx/CxImage.h"
+
+namespace tfxtool {
+namespace {
+
+// Why symbols and not a link: a host that links libTessaroFx.so would call these functions
+// directly, but the tool is a dlopen host, so it asks the loaded library for the same symbols
+// the linker would have bound. The names are Itanium-mangled; the pointer types below are tied
+// to the public declarations at compile time, and the tool's tests check at run time that every
+// name in the tables resolves in the built plug-in, so a changed signature cannot slip through
+// either side unnoticed.
+using ImageFloatFn = CxImage* (*)(CxImage*, float);
+static_assert(std::is_same_v<decltype(&exposureAdjustment), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&brightnessAdjustment), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&contrastAdjustment), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&vibranceAdjustment), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&saturationAdjustment), ImageFloatFn>);
+
+// The functions take a CxImage, whose constructor and destructor also live in the plug-in.
+// Rather than asking the library for a factory it does not have, the tool does what the
+// compiler would emit for a local `CxImage img(&bits, ...)`: storage of the class's size and
+// alignment, then the complete-object constructor (C1) called on it, and later the
+// complete-object destructor (D1, not the deleting one, as the storage is ours). In the
+// Itanium ABI both take `this` as a hidden first argument and return nothing, which is what
+// these pointer types spell out.
+using WrapCtorFn = void (*)(CxImage*, unsigned char**, unsigned, unsigned, unsigned, unsigned,
+                            _ImagePixelFormat);
+using DtorFn = void (*)(CxImage*);
+constexpr const char* kWrapCtorSymbol = "_ZN7CxImageC1EPPhjjjj17_ImagePixelFormat";
+constexpr const char* kDtorSymbol = "_ZN7CxImageD1Ev";
+
+// A non-owning CxImage over a BGRA matrix, alive for one call.
+class WrappedImage {
+ public:
+  WrappedImage(WrapCtorFn ctor, DtorFn dtor, cv::Mat* bgra) : dtor_(dtor), bits_(bgra->data) {
+    // The image keeps &bits_ as its owner's pointer variable, so bits_ must outlive it.
+    ctor(reinterpret_cast<CxImage*>(storage_), &bits_, static_cast<unsigned>(bgra->cols),
+         static_cast<unsigned>(bgra->rows), 32, static_cast<unsigned>(bgra->step[0]), IPF_BGRA);
+  }
+  WrappedImage(const WrappedImage&) = delete;
+  WrappedImage& operator=(const WrappedImage&) = delete;
+  ~WrappedImage() { dtor_(image()); }
+
+  CxImage* image() { return std::launder(reinterpret_cast<CxImage*>(storage_)); }
+
+ private:
+  alignas(CxImage) unsigned char storage_[sizeof(CxImage)];
+  DtorFn dtor_;
+  unsigned char* bits_;
+};
+
+template <class Fn>
+Status Resolve(const PluginLibrary& plugin, const char* symbol, Fn* fn) {
+  std::string why;
+  void* p = plugin.Symbol(symbol, &why);
+  if (!p) return Status::Error(std::string("the plug-in does not export ") + symbol + ": " + why);
+  *fn = reinterpret_cast<Fn>(p);
+  return Status::Ok();
+}
+
+}  // namespace
+
+const std::vector<ImageFunction>& ImageFunctions() {
+  // Ranges: where each function's arithmetic is defined. Brightness divides by b/253 + 0.99,
+  // which reaches zero near -250.5; contrast divides by 1 - c/255.
+  static const std::vector<ImageFunction> kFunctions = {
+      {"exposure", "exposureAdjustment", "_Z18exposureAdjustmentP7CxImagef", FxKind::kImageFloat,
+       "VALUE", -1000, 1000, "gain 2^(v*0.012): +50 = x1.52"},
+      {"brightness", "brightnessAdjustment", "_Z20brightnessAdjustmentP7CxImagef",
+       FxKind::kImageFloat, "VALUE", -250, 1000, "above 0 scales by 1+v/100, below 0 subtracts"},
+      {"contrast", "contrastAdjustment", "_Z18contrastAdjustmentP7CxImagef", FxKind::kImageFloat,
+       "VALUE", -1000, 254, "above 0 stretches away from mid grey, below 0 flattens"},
+      {"vibrance", "vibranceAdjustment", "_Z18vibranceAdjustmentP7CxImagef", FxKind::kImageFloat,
+       "VALUE", -1000, 1000, "saturates muted colours more than vivid ones"},
+      {"saturation", "saturationAdjustment", "_Z20saturationAdjustmentP7CxImagef",
+       FxKind::kImageFloat, "VALUE", -1000, 1000, "-100 gives grey, above 0 strengthens colour"},
+  };
+  return kFunctions;
+}
+
+const std::vector<SupportSymbol>& ImageSupportSymbols() {
+  static const std::vector<SupportSymbol> kSymbols = {
+      {"CxImage wrapping constructor", kWrapCtorSymbol},
+      {"CxImage destructor", kDtorSymbol},
+  };
+  return kSymbols;
+}
+
+const ImageFunction* FindImageFunction(const std::string& name) {
+  for (const ImageFunction& fn : ImageFunctions()) {
+    if (EqualsNoCase(fn.name, name) || EqualsNoCase(fn.function, name)) return &fn;
+  }
+  return nullptr;
+}
+
+Status PrepareImageCall(const ImageFunction& fn, const std::vector<std::string>& args,
+                        ImageCall* call) {
+  call->function = &fn;
+  switch (fn.kind) {
+    case FxKind::kImageFloat: {
+      if (args.size() != 1) {
+        return Status::Error(std::string(fn.name) + " takes one argument: " + fn.args);
+      }
+      double v = 0;
+      if (!ParseNumber(args[0], &v)) {
+        return Status::Error("bad value '" + args[0] + "' for " + fn.name + ": not a number");
+      }
+      if (v < fn.min || v > fn.max) {
+        return Status::Error(std::string(fn.name) + " " + args[0] + " is outside its range " +
+                             FormatNumber(fn.min) + ".." + FormatNumber(fn.max));
+      }
+      call->value = static_cast<float>(v);
+      return Status::Ok();
+    }
+  }
+  return Status::Error(std::string("unsupported function kind for ") + fn.name);
+}
+
+Status CallImageFunction(const PluginLibrary& plugin, const ImageCall& call, cv::Mat* bgra) {
+  const ImageFunction& fn = *call.function;
+  WrapCtorFn ctor = nullptr;
+  DtorFn dtor = nullptr;
+  if (Status s = Resolve(plugin, kWrapCtorSymbol, &ctor); !s.ok()) return s;
+  if (Status s = Resolve(plugin, kDtorSymbol, &dtor); !s.ok()) return s;
+  switch (fn.kind) {
+    case FxKind::kImageFloat: {
+      ImageFloatFn f = nullptr;
+      if (Status s = Resolve(plugin, fn.symbol, &f); !s.ok()) return s;
+      WrappedImage image(ctor, dtor, bgra);
+      f(image.image(), call.value);
+      return Status::Ok();
+    }
+  }
+  return Status::Error(std::string("unsupported function kind for ") + fn.name);
+}
+
+}  // namespace tfxtool

@@ -1,0 +1,55 @@
+// The plug-in's exported free image functions, as the fx command calls them. The tool does not
+// link the plug-in, so each function is found by its C++ symbol name in the loaded library and
+// called through a pointer of the matching type.
+#pragma once
+
+#include <opencv2/core.hpp>
+#include <string>
+#include <vector>
+
+#include "PluginLibrary.h"
+#include "Status.h"
+
+namespace tfxtool {
+
+// How a function is called; each kind has one pointer type in ImageFunctions.cpp.
+enum class FxKind {
+  kImageFloat,  // CxImage* f(CxImage*, float), in place
+};
+
+struct ImageFunction {
+  const char* name;      // what the user types
+  const char* function;  // the exported function, also accepted on the command line
+  const char* symbol;    // its mangled name in the plug-in
+  FxKind kind;
+  const char* args;  // argument synopsis for the usage text
+  // Accepted argument range: where the function's arithmetic is defined.
+  double min;
+  double max;
+  const char* meaning;
+};
+
+const std::vector<ImageFunction>& ImageFunctions();
+const ImageFunction* FindImageFunction(const std::string& name);
+
+// Symbols the tool needs besides the functions themselves: the image class's wrapping
+// constructor and its destructor.
+struct SupportSymbol {
+  const char* what;
+  const char* symbol;
+};
+const std::vector<SupportSymbol>& ImageSupportSymbols();
+
+// A function with its arguments parsed and checked, ready to call.
+struct ImageCall {
+  const ImageFunction* function = nullptr;
+  float value = 0;  // FxKind::kImageFloat
+};
+
+Status PrepareImageCall(const ImageFunction& fn, const std::vector<std::string>& args,
+                        ImageCall* call);
+
+// Applies the call in place to a BGRA image.
+Status CallImageFunction(const PluginLibrary& plugin, const ImageCall& call, cv::Mat* bgra);
+
+}  // namespace tfxtool
