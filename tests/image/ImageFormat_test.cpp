@@ -1,0 +1,253 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <cstring>
+#include <vector>
+
+#include "tessarofx/CxImage.h"
+
+// Found by argument-dependent lookup, so they live beside tagRGBQUAD.
+static bool operator==(tagRGBQUAD x, tagRGBQUAD y) { return std::memcmp(&x, &y, sizeof x) == 0; }
+
+static std::ostream& operator<<(std::ostream& os, tagRGBQUAD c) {
+  return os << "{r " << int(c.rgbRed) << ", g " << int(c.rgbGreen) << ", b " << int(c.rgbBlue)
+            << ", a " << int(c.rgbReserved) << "}";
+}
+
+namespace {
+
+// Exposes the fields the accessors do not.
+struct ImageProbe : CxImage {
+  using CxImage::CxImage;
+  uint32_t OwnsBits() const { return ownsBits; }
+};
+
+tagRGBQUAD Rgba(uint8_t r, uint8_t g, uint8_t b, uint8_t a) { return tagRGBQUAD{b, g, r, a}; }
+
+TEST(CxImage, CreatePadsRowsToFourBytesAndMakesEightBitsGrey) {
+  const struct {
+    unsigned width, bpp, effWidth;
+  } cases[] = {{100, 24, 300}, {101, 24, 304}, {5, 8, 8}, {3, 16, 8}, {7, 32, 28}};
+  for (const auto& c : cases) {
+    SCOPED_TRACE(testing::Message() << c.width << " x " << c.bpp << " bpp");
+    CxImage image;
+    ASSERT_EQ(image.Create(c.width, 3, c.bpp, IPF_BGRA), &image);
+    EXPECT_EQ(image.GetEffWidth(), c.effWidth);
+    EXPECT_EQ(image.GetSize(), c.effWidth * 3);
+    EXPECT_EQ(image.getFormat(), c.bpp == 8 ? IPF_Gray8 : IPF_BGRA);
+  }
+  uint8_t* none = nullptr;
+  EXPECT_EQ(CxImage(&none, 4, 4, 8, 4, IPF_RGB).getFormat(), IPF_Gray8);
+}
+
+TEST(CxImage, CreateWithAZeroArgumentLeavesTheImageEmpty) {
+  const unsigned cases[][3] = {{0, 4, 32}, {4, 0, 32}, {4, 4, 0}};
+  for (const auto& c : cases) {
+    CxImage image(8, 8, 32, IPF_BGRA);
+    EXPECT_EQ(image.Create(c[0], c[1], c[2], IPF_BGRA), nullptr);
+    EXPECT_EQ(image.getFormat(), IPF_None);
+    EXPECT_EQ(image.GetBits(), nullptr);
+    EXPECT_EQ(image.GetSize(), 0u);
+  }
+}
+
+TEST(CxImage, WrappingImageLeavesTheCallersBufferAlone) {
+  uint8_t* buffer = new uint8_t[40];
+  std::memset(buffer, 0x5a, 40);
+  {
+    ImageProbe image(&buffer, 3, 2, 32, 20, IPF_BGRA);
+    EXPECT_EQ(image.GetBits(), buffer);
+    EXPECT_EQ(image.OwnsBits(), 0u);
+    EXPECT_EQ(image.GetSize(), 40u);
+    image.SetPixelColor(0, 0, Rgba(1, 2, 3, 4));
+  }
+  EXPECT_EQ(buffer[0], 3);
+  EXPECT_EQ(buffer[39], 0x5a);
+  delete[] buffer;  // still ours: a double free would show under the sanitizers
+}
+
+TEST(CxImage, ReadsAndWritesEachByteOrder) {
+  const tagRGBQUAD c = Rgba(10, 20, 30, 40);
+  const struct {
+    unsigned bpp;
+    _ImagePixelFormat format;
+    std::vector<uint8_t> bytes;
+    tagRGBQUAD read;
+  } cases[] = {
+      {24, IPF_RGB, {10, 20, 30}, Rgba(10, 20, 30, 0)},
+      {24, IPF_BGR, {30, 20, 10}, Rgba(10, 20, 30, 0)},
+      {32, IPF_RGBA, {10, 20, 30, 40}, c},
+      {32, IPF_BGRA, {30, 20, 10, 40}, c},
+      {8, IPF_Gray8, {10}, Rgba(10, 10, 10, 10)},
+  };
+  for (const auto& k : cases) {
+    SCOPED_TRACE(testing::Message() << k.bpp << " bpp, format " << k.format);
+    CxImage image(2, 2, k.bpp, k.format);
+    std::memset(image.GetBits(), 0, image.GetSize());
+    image.SetPixelColor(1, 1, c);
+    const uint8_t* p = image.GetBits() + image.GetEffWidth() + k.bytes.size();
+    EXPECT_EQ(std::vector<uint8_t>(p, p + k.bytes.size()), k.bytes);
+    EXPECT_EQ(image.GetPixelColor(1, 1, true), k.read);
+    tagRGBQUAD noAlpha = k.read;
+    if (k.format != IPF_Gray8) noAlpha.rgbReserved = 0;  // grey repeats its value regardless
+    EXPECT_EQ(image.GetPixelColor(1, 1, false), noAlpha);
+  }
+}
+
+TEST(CxImage, SixteenBitWordsLeakBetweenFields) {
+  CxImage image(1, 1, 16, IPF_RGB);
+  // Green is added after the other fields are or-ed in, so its top bits carry into red.
+  image.SetPixelColor(0, 0, Rgba(0x1f, 0xff, 0x1f, 0));
+  uint16_t word;
+  std::memcpy(&word, image.GetBits(), 2);
+  EXPECT_EQ(word, 0x17ff);
+  // Each field is masked with 8 bits, so green overlaps red's low bits.
+  EXPECT_EQ(image.GetPixelColor(0, 0, true), Rgba(2, 0xbf, 0x1f, 0));
+  // The word is read sign-extended.
+  word = 0x8000;
+  std::memcpy(image.GetBits(), &word, 2);
+  EXPECT_EQ(image.GetPixelColor(0, 0, true), Rgba(240, 0, 0, 0));
+
+  CxImage bgr(1, 1, 16, IPF_BGR);
+  bgr.SetPixelColor(0, 0, Rgba(3, 0, 1, 0));
+  std::memcpy(&word, bgr.GetBits(), 2);
+  EXPECT_EQ(word, 3 | (1 << 11));
+  // Blue, stored from bit 11, shows up in green's 8-bit mask.
+  EXPECT_EQ(bgr.GetPixelColor(0, 0, true), Rgba(3, 64, 1, 0));
+}
+
+TEST(CxImage, OutOfRangeAndMismatchedPixelsReadZeroAndIgnoreWrites) {
+  uint8_t buffer[32];
+  std::memset(buffer, 0x77, sizeof buffer);
+  uint8_t* bits = buffer;
+  CxImage image(&bits, 3, 2, 32, 16, IPF_BGRA);
+  CxImage threeByteFormat(&bits, 4, 2, 32, 16, IPF_RGB);
+  CxImage beyondTheTable(&bits, 4, 2, 32, 16, static_cast<_ImagePixelFormat>(9));
+  const tagRGBQUAD zero = Rgba(0, 0, 0, 0);
+  EXPECT_EQ(image.GetPixelColor(3, 0, true), zero);
+  EXPECT_EQ(image.GetPixelColor(0, 2, true), zero);
+  EXPECT_EQ(threeByteFormat.GetPixelColor(0, 0, true), zero);
+  EXPECT_EQ(beyondTheTable.GetPixelColor(0, 0, true), zero);
+  image.SetPixelColor(3, 0, Rgba(1, 2, 3, 4));
+  image.SetPixelColor(0, 2, Rgba(1, 2, 3, 4));
+  threeByteFormat.SetPixelColor(0, 0, Rgba(1, 2, 3, 4));
+  beyondTheTable.SetPixelColor(0, 0, Rgba(1, 2, 3, 4));
+  EXPECT_EQ(std::vector<uint8_t>(buffer, buffer + 32), std::vector<uint8_t>(32, 0x77));
+  EXPECT_EQ(CxImage().GetPixelColor(0, 0, true), zero);
+}
+
+TEST(CxImage, ClampToByteLimitsToByteRange) {
+  EXPECT_EQ(ClampToByte(-1), 0);
+  EXPECT_EQ(ClampToByte(200), 200);
+  EXPECT_EQ(ClampToByte(256), 255);
+}
+
+TEST(CxImage, CopyAllocatesOrReusesTheBuffer) {
+  CxImage src(5, 3, 24, IPF_BGR);
+  for (uint32_t i = 0; i < src.GetSize(); ++i) src.GetBits()[i] = static_cast<uint8_t>(i * 7);
+  ImageProbe fresh;
+  fresh.Copy(&src);
+  ASSERT_NE(fresh.GetBits(), nullptr);
+  EXPECT_NE(fresh.GetBits(), src.GetBits());
+  EXPECT_EQ(fresh.OwnsBits(), 1u);
+  EXPECT_EQ(fresh.GetEffWidth(), src.GetEffWidth());
+  EXPECT_EQ(std::memcmp(fresh.GetBits(), src.GetBits(), src.GetSize()), 0);
+
+  // A wrapper of the same size receives the pixels in the caller's buffer.
+  std::vector<uint8_t> frame(48);
+  uint8_t* bits = frame.data();
+  CxImage wrapper(&bits, 5, 3, 24, 16, IPF_BGR);
+  wrapper.Copy(src);
+  EXPECT_EQ(wrapper.GetBits(), frame.data());
+  EXPECT_EQ(frame[47], src.GetBits()[47]);
+
+  // Copying from an image without pixels changes nothing.
+  wrapper.Copy(CxImage());
+  EXPECT_EQ(wrapper.GetWidth(), 5u);
+}
+
+TEST(CxImage, CopyOfOtherSizeReplacesEvenAWrappedBuffer) {
+  CxImage src(3, 3, 32, IPF_BGRA);
+  std::memset(src.GetBits(), 4, src.GetSize());
+  uint8_t* bits = new uint8_t[16];  // the caller's, from array new
+  ImageProbe wrapper(&bits, 2, 2, 32, 8, IPF_BGRA);
+  wrapper.Copy(&src);
+  EXPECT_EQ(bits, nullptr);
+  ASSERT_NE(wrapper.GetBits(), nullptr);
+  EXPECT_EQ(wrapper.OwnsBits(), 1u);
+  EXPECT_EQ(wrapper.GetBits()[35], 4);
+}
+
+TEST(CxImage, RgbToHslUsesIntegerScale) {
+  EXPECT_EQ(CxImage::RGBtoHSL(Rgba(255, 0, 0, 9)), Rgba(0, 255, 128, 0));  // H, S, L
+  for (int v : {0, 77, 255}) {
+    EXPECT_EQ(CxImage::RGBtoHSL(Rgba(v, v, v, 0)), Rgba(170, 0, (v * 510 + 255) / 510, 0));
+  }
+  // Red is largest and Bdelta (40) < Gdelta (42): the hue wraps to 256 - 2, not 255 - 2.
+  EXPECT_EQ(CxImage::RGBtoHSL(Rgba(255, 0, 10, 0)).rgbRed, 254);
+  EXPECT_EQ(CxImage::RGBtoHSL(Rgba(0, 255, 0, 0)).rgbRed, 85);
+  // Light colours take the other saturation denominator.
+  EXPECT_EQ(CxImage::RGBtoHSL(Rgba(255, 200, 200, 0)).rgbGreen, 255);
+}
+
+TEST(CxImage, HslToRgbGivesGreyForZeroSaturationAndRoundTripsClosely) {
+  for (int l = 0; l < 256; ++l) {
+    EXPECT_EQ(CxImage::HSLtoRGB(tagRGBQUAD{uint8_t(l), 0, 99, 7}), Rgba(l, l, l, 0));
+  }
+  // Hue has 42 steps per sixth of the circle and every step truncates, so a round trip may lose
+  // a few levels, but never swaps or drops a channel.
+  for (uint32_t i = 0; i < (1u << 24); i += 101) {
+    const tagRGBQUAD c = Rgba(i >> 16, (i >> 8) & 255, i & 255, 0);
+    const tagRGBQUAD back = CxImage::HSLtoRGB(CxImage::RGBtoHSL(c));
+    ASSERT_NEAR(back.rgbRed, c.rgbRed, 12) << c;
+    ASSERT_NEAR(back.rgbGreen, c.rgbGreen, 12) << c;
+    ASSERT_NEAR(back.rgbBlue, c.rgbBlue, 12) << c;
+  }
+}
+
+TEST(CxImage, SplitAndCombineRoundTrip) {
+  CxImage image(7, 3, 32, IPF_BGRA);
+  for (uint32_t i = 0; i < image.GetSize(); ++i) image.GetBits()[i] = static_cast<uint8_t>(i * 37);
+  CxImage r, g, b, a, h, s, l;
+  ASSERT_TRUE(image.SplitRGBA(&r, &g, &b, &a));
+  ASSERT_TRUE(image.SplitHSLA(&h, &s, &l, nullptr));
+  EXPECT_EQ(r.getFormat(), IPF_Gray8);
+  CxImage rgb(1, 1, 32, IPF_BGRA), hsl(1, 1, 32, IPF_BGRA);
+  ASSERT_TRUE(rgb.Combine(&r, &g, &b, &a, 0));
+  ASSERT_TRUE(hsl.Combine(&h, &s, &l, &a, 1));
+  for (unsigned long y = 0; y < 3; ++y) {
+    for (unsigned long x = 0; x < 7; ++x) {
+      const tagRGBQUAD c = image.GetPixelColor(x, y, true);
+      EXPECT_EQ(rgb.GetPixelColor(x, y, true), c);
+      tagRGBQUAD expected = CxImage::HSLtoRGB(CxImage::RGBtoHSL(c));
+      expected.rgbReserved = c.rgbReserved;
+      EXPECT_EQ(hsl.GetPixelColor(x, y, true), expected);
+    }
+  }
+  CxImage grey(4, 4, 8, IPF_Gray8), empty;
+  EXPECT_FALSE(grey.SplitRGBA(&r, &g, &b, nullptr));
+  EXPECT_FALSE(empty.SplitHSLA(&r, &g, &b, nullptr));
+  EXPECT_FALSE(image.SplitRGBA(nullptr, nullptr, nullptr, &a));
+  EXPECT_FALSE(rgb.Combine(&r, nullptr, &b, nullptr, 0));
+}
+
+TEST(CxImageDeathTest, CombineAbortsOnMismatchedPlanes) {
+  GTEST_FLAG_SET(death_test_style, "threadsafe");
+  CxImage r(4, 4, 8, IPF_Gray8), g(4, 4, 8, IPF_Gray8), b(4, 4, 8, IPF_Gray8);
+  CxImage wide(5, 4, 8, IPF_Gray8), colour(4, 4, 24, IPF_BGR);
+  CxImage target(4, 4, 32, IPF_BGRA);
+  EXPECT_DEATH(
+      target.Combine(&r, &g, &wide, nullptr, 0),
+      testing::HasSubstr("Combine: Assertion `(rw == gw && gw == bw) && (rh == gh && gh == bh) && "
+                         "(r->GetBpp() == g->GetBpp() && g->GetBpp() == b->GetBpp() && "
+                         "b->GetBpp() == 8)' failed."));
+  EXPECT_DEATH(
+      target.Combine(&r, &g, &b, &colour, 0),
+      testing::HasSubstr("Combine: Assertion `(rw == gw && gw == bw && bw == aw) && "
+                         "(rh == gh && gh == bh && bh == ah) && (r->GetBpp() == g->GetBpp() && "
+                         "g->GetBpp() == b->GetBpp() && b->GetBpp() == a->GetBpp() && "
+                         "a->GetBpp() == 8)' failed."));
+}
+
+}  // namespace
