@@ -1,0 +1,301 @@
+// Exposure, brightness, contrast, vibrance and saturation.
+//
+// Each image function derives its parameters once, then either runs a row kernel over packed
+// 4-byte pixels or, for other layouts, applies the per-pixel form through the accessors. The
+// per-channel operations become a 256-entry table built with the per-pixel arithmetic, so every
+// path gives the same bytes.
+#include "tessarofx/ColorAdjust.h"
+
+#include <climits>
+#include <cmath>
+#include <cstddef>
+#include <cstdint>
+
+#include "adjust/ColorAdjustRows.h"
+
+namespace tfx {
+namespace {
+
+// Float to int toward zero; out-of-range values and NaN give INT_MIN, as the x86 conversion
+// instructions (and so the vector kernels) do, instead of being undefined.
+int TruncToInt(float v) {
+  if (v >= -2147483648.0f && v < 2147483648.0f) return static_cast<int>(v);
+  return INT_MIN;
+}
+
+// 0 below 0, else trunc(min(255, v)).
+uint8_t FloatToByte(float v) {
+  if (v < 0.0f) return 0;
+  return static_cast<uint8_t>(static_cast<int>(v < 255.0f ? v : 255.0f));
+}
+
+uint8_t ScaleChannel(int channel, float gain) {
+  return FloatToByte(static_cast<float>(channel) * gain);
+}
+
+struct ContrastLimits {
+  int lo;
+  int hi;
+  int d;
+};
+
+ContrastLimits DeriveContrast(float c) {
+  // t and lo's product in float.
+  const float t = c > 0.0f ? 1.0f / (1.0f - c / 255.0f) - 1.0f : c / 255.0f;
+  ContrastLimits limits;
+  limits.lo = TruncToInt(t * 100.0f * 0.5f);
+  if (255 - static_cast<int64_t>(limits.lo) < limits.lo) {
+    limits.lo = 120;
+    limits.hi = 127;
+  } else {
+    // hi comes from lo before its lower clamp; when that clamp applies, hi goes unused. Unsigned,
+    // so that the INT_MIN of an infinite t wraps instead of overflowing.
+    limits.hi = static_cast<int>(static_cast<uint32_t>(255) - static_cast<uint32_t>(limits.lo));
+    if (limits.lo < -127) limits.lo = -120;
+  }
+  limits.d = limits.lo < 0 ? 255 + 2 * limits.lo : 255 - 2 * limits.lo;
+  return limits;
+}
+
+uint8_t ContrastChannel(int channel, int lo, int hi, int d) {
+  if (lo < 1) return ClampToByte(channel * d / 255 - lo);
+  if (channel <= lo) return 0;
+  if (channel > hi) return 255;
+  return ClampToByte((channel - lo) * 255 / d);
+}
+
+// (channel * (k + 256) - luma * k) >> 8 in wrapping 32-bit arithmetic, so that absurd strengths
+// give the bytes the vector kernels give rather than undefined behaviour.
+uint8_t MixChannel(int channel, int luma, int k) {
+  const uint32_t mixed = static_cast<uint32_t>(channel) * (static_cast<uint32_t>(k) + 256u) -
+                         static_cast<uint32_t>(luma) * static_cast<uint32_t>(k);
+  return ClampToByte(static_cast<int32_t>(mixed) >> 8);
+}
+
+int Max3(int a, int b, int c) {
+  const int ab = a > b ? a : b;
+  return ab > c ? ab : c;
+}
+
+int Min3(int a, int b, int c) {
+  const int ab = a < b ? a : b;
+  return ab < c ? ab : c;
+}
+
+tagRGBQUAD MapColour(tagRGBQUAD c, const uint8_t table[256]) {
+  c.rgbBlue = table[c.rgbBlue];
+  c.rgbGreen = table[c.rgbGreen];
+  c.rgbRed = table[c.rgbRed];
+  return c;
+}
+
+// Packed 4-byte pixels whose first three bytes are colour: both orders qualify because every
+// operation here treats red, green and blue alike.
+bool HasPackedColour(const CxImage& image) {
+  return image.GetBits() && image.GetBpp() == 32 &&
+         (image.getFormat() == IPF_BGRA || image.getFormat() == IPF_RGBA);
+}
+
+template <class RowFn>
+void ForEachRow(CxImage* image, RowFn row) {
+  uint8_t* bits = image->GetBits();
+  const size_t width = image->GetWidth();
+  const size_t height = image->GetHeight();
+  const size_t stride = image->GetEffWidth();
+  if (stride == width * 4) {
+    row(bits, width * height);
+    return;
+  }
+  for (size_t y = 0; y < height; ++y) row(bits + y * stride, width);
+}
+
+template <class PixelFn>
+void ForEachPixel(CxImage* image, PixelFn pixel) {
+  for (unsigned long y = 0; y < image->GetHeight(); ++y) {
+    for (unsigned long x = 0; x < image->GetWidth(); ++x) {
+      image->SetPixelColor(x, y, pixel(image->GetPixelColor(x, y, true)));
+    }
+  }
+}
+
+void ApplyTable(CxImage* image, const uint8_t table[256], const ColorAdjustRows& rows) {
+  if (HasPackedColour(*image)) {
+    ForEachRow(image,
+               [&](uint8_t* pixels, size_t count) { rows.applyTable(pixels, count, table); });
+  } else {
+    ForEachPixel(image, [&](tagRGBQUAD c) { return MapColour(c, table); });
+  }
+}
+
+float VibranceStrength(float v) {
+  // v / 100 in float, the 0.8 scale in double, stored as float.
+  return static_cast<float>(static_cast<double>(v / 100.0f) * 0.8);
+}
+
+tagRGBQUAD VibrancePixel(tagRGBQUAD c, float strength) {
+  const unsigned char luma = calLuma(c);
+  // The byte negation is intended: a mask luma of 0 gives weight 0, any other L gives 256 - L.
+  const unsigned char weight = static_cast<unsigned char>(-calLuma(calMask(c, luma)));
+  return mixLumaAndColor(c, luma, weight, strength);
+}
+
+}  // namespace
+
+CxImage* ExposureAdjust(CxImage* image, float e, const ColorAdjustRows& rows) {
+  if (!image || e == 0.0f) return image;
+  // The exponent and the power in double, the gain used as float.
+  const float gain = static_cast<float>(std::pow(2.0, static_cast<double>(e) / 50.0 * 0.6));
+  uint8_t table[256];
+  // ScaleChannel also floors at 0, which a positive gain never reaches.
+  for (int v = 0; v < 256; ++v) table[v] = ScaleChannel(v, gain);
+  ApplyTable(image, table, rows);
+  return image;
+}
+
+CxImage* BrightnessAdjust(CxImage* image, float b, const ColorAdjustRows& rows) {
+  if (!image || b == 0.0f || !image->GetBits()) return image;
+  // Positive b in float; the negative curve in double (its constants are not exact in float),
+  // stored as float.
+  const float k = b > 0.0f
+                      ? b / 100.0f + 1.0f
+                      : static_cast<float>((1.0 / (static_cast<double>(b) / 253.0 + 0.99) - 1.0) *
+                                           -255.0 * 0.6);
+  // The sign of k, not of b, picks factor or offset: below b = -250.47 k turns positive.
+  uint8_t table[256];
+  for (int v = 0; v < 256; ++v) {
+    table[v] = FloatToByte(k > 0.0f ? static_cast<float>(v) * k : static_cast<float>(v) + k);
+  }
+
+  uint8_t* bits = image->GetBits();
+  const size_t pixels = size_t{image->GetWidth()} * image->GetHeight();
+  const size_t step = image->GetBpp() / 8;
+  const size_t size = image->GetSize();
+  if (step == 4) {
+    // Row padding is ignored on purpose: width * height pixels from the first byte.
+    const size_t count = pixels < size / 4 ? pixels : size / 4;
+    rows.applyTable(bits, count, table);
+    return image;
+  }
+  // Narrower pixels still get three bytes each, so neighbouring windows overlap; the walk stops
+  // at the end of the buffer.
+  for (size_t i = 0, offset = 0; i < pixels; ++i, offset += step) {
+    for (size_t j = 0; j < 3 && offset + j < size; ++j) bits[offset + j] = table[bits[offset + j]];
+  }
+  return image;
+}
+
+CxImage* ContrastAdjust(CxImage* image, float c, const ColorAdjustRows& rows) {
+  if (!image || c == 0.0f) return image;
+  const ContrastLimits limits = DeriveContrast(c);
+  uint8_t table[256];
+  for (int v = 0; v < 256; ++v) table[v] = ContrastChannel(v, limits.lo, limits.hi, limits.d);
+  ApplyTable(image, table, rows);
+  return image;
+}
+
+CxImage* VibranceAdjust(CxImage* image, float v, const ColorAdjustRows& rows) {
+  if (!image || v == 0.0f) return image;
+  const float strength = VibranceStrength(v);
+  if (HasPackedColour(*image)) {
+    ForEachRow(image,
+               [&](uint8_t* pixels, size_t count) { rows.vibrance(pixels, count, strength); });
+  } else {
+    ForEachPixel(image, [&](tagRGBQUAD c) { return VibrancePixel(c, strength); });
+  }
+  return image;
+}
+
+CxImage* SaturationAdjust(CxImage* image, float s, const ColorAdjustRows& rows) {
+  if (!image || s == 0.0f) return image;
+  // sigma in float.
+  const float sigma = s / 100.0f;
+  if (HasPackedColour(*image)) {
+    ForEachRow(image,
+               [&](uint8_t* pixels, size_t count) { rows.saturation(pixels, count, sigma); });
+  } else {
+    ForEachPixel(image, [&](tagRGBQUAD c) { return calNewColor(c, sigma); });
+  }
+  return image;
+}
+
+}  // namespace tfx
+
+CxImage* exposureAdjustment(CxImage* image, float e) {
+  return tfx::ExposureAdjust(image, e, tfx::BestColorAdjustRows());
+}
+
+CxImage* brightnessAdjustment(CxImage* image, float b) {
+  return tfx::BrightnessAdjust(image, b, tfx::BestColorAdjustRows());
+}
+
+CxImage* contrastAdjustment(CxImage* image, float c) {
+  return tfx::ContrastAdjust(image, c, tfx::BestColorAdjustRows());
+}
+
+CxImage* vibranceAdjustment(CxImage* image, float v) {
+  return tfx::VibranceAdjust(image, v, tfx::BestColorAdjustRows());
+}
+
+CxImage* saturationAdjustment(CxImage* image, float s) {
+  return tfx::SaturationAdjust(image, s, tfx::BestColorAdjustRows());
+}
+
+tagRGBQUAD calPowColor(tagRGBQUAD c, float gain) {
+  c.rgbBlue = tfx::ScaleChannel(c.rgbBlue, gain);
+  c.rgbGreen = tfx::ScaleChannel(c.rgbGreen, gain);
+  c.rgbRed = tfx::ScaleChannel(c.rgbRed, gain);
+  return c;
+}
+
+tagRGBQUAD calContrastColor(tagRGBQUAD c, int lo, int hi, int d) {
+  c.rgbBlue = tfx::ContrastChannel(c.rgbBlue, lo, hi, d);
+  c.rgbGreen = tfx::ContrastChannel(c.rgbGreen, lo, hi, d);
+  c.rgbRed = tfx::ContrastChannel(c.rgbRed, lo, hi, d);
+  return c;
+}
+
+unsigned char calLuma(tagRGBQUAD c) {
+  return static_cast<unsigned char>(
+      (tfx::Min3(c.rgbRed, c.rgbGreen, c.rgbBlue) + tfx::Max3(c.rgbRed, c.rgbGreen, c.rgbBlue)) >>
+      1);
+}
+
+tagRGBQUAD calMask(tagRGBQUAD c, unsigned char luma) {
+  c.rgbBlue = ClampToByte(c.rgbBlue - luma);
+  c.rgbGreen = ClampToByte(c.rgbGreen - luma);
+  c.rgbRed = ClampToByte(c.rgbRed - luma);
+  c.rgbReserved = ClampToByte(c.rgbReserved - luma);
+  return c;
+}
+
+tagRGBQUAD mixLumaAndColor(tagRGBQUAD c, unsigned char luma, unsigned char mask, float strength) {
+  const int k = tfx::TruncToInt(static_cast<float>(mask) * strength);
+  c.rgbBlue = tfx::MixChannel(c.rgbBlue, luma, k);
+  c.rgbGreen = tfx::MixChannel(c.rgbGreen, luma, k);
+  c.rgbRed = tfx::MixChannel(c.rgbRed, luma, k);
+  return c;
+}
+
+tagRGBQUAD calNewColor(tagRGBQUAD c, float s) {
+  const int mx = tfx::Max3(c.rgbRed, c.rgbGreen, c.rgbBlue);
+  const int mn = tfx::Min3(c.rgbRed, c.rgbGreen, c.rgbBlue);
+  if (mx == mn) return c;
+  // Everything below in float.
+  const float sum = static_cast<float>(mx + mn) / 255.0f;
+  const float l = sum / 2.0f;
+  const float delta = static_cast<float>(mx - mn) / 255.0f;
+  const float lv = l * 255.0f;
+  const auto apply = [&](uint8_t channel) {
+    const float f = channel;
+    if (s >= 0.0f) {
+      const float sat = l < 0.5f ? delta / sum : delta / (2.0f - sum);
+      const float a = sat + s >= 1.0f ? 1.0f / sat - 1.0f : 1.0f / (1.0f - s) - 1.0f;
+      return tfx::FloatToByte(f + (f - lv) * a);
+    }
+    return tfx::FloatToByte(lv + (f - lv) * (1.0f + s));
+  };
+  c.rgbBlue = apply(c.rgbBlue);
+  c.rgbGreen = apply(c.rgbGreen);
+  c.rgbRed = apply(c.rgbRed);
+  return c;
+}

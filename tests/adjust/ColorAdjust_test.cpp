@@ -1,0 +1,323 @@
+#include "tessarofx/ColorAdjust.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstdint>
+#include <cstring>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "adjust/ColorAdjustReference.h"
+#include "adjust/ColorAdjustRows.h"
+
+namespace {
+
+using tfx_test::NoiseBytes;
+using tfx_test::SameBuffer;
+using Image = std::unique_ptr<CxImage>;
+
+struct Operation {
+  const char* name;
+  CxImage* (*fast)(CxImage*, float, const tfx::ColorAdjustRows&);
+  CxImage* (*exported)(CxImage*, float);
+  void (*reference)(CxImage*, float);
+  float typical;  // for the tests that sweep layouts rather than strengths
+};
+
+const Operation kExposure = {"Exposure", tfx::ExposureAdjust, exposureAdjustment,
+                             tfx_test::ReferenceExposure, 70.0f};
+const Operation kBrightness = {"Brightness", tfx::BrightnessAdjust, brightnessAdjustment,
+                               tfx_test::ReferenceBrightness, -37.0f};
+const Operation kContrast = {"Contrast", tfx::ContrastAdjust, contrastAdjustment,
+                             tfx_test::ReferenceContrast, 61.0f};
+const Operation kVibrance = {"Vibrance", tfx::VibranceAdjust, vibranceAdjustment,
+                             tfx_test::ReferenceVibrance, 70.0f};
+const Operation kSaturation = {"Saturation", tfx::SaturationAdjust, saturationAdjustment,
+                               tfx_test::ReferenceSaturation, 45.0f};
+const Operation* const kOperations[] = {&kExposure, &kBrightness, &kContrast, &kVibrance,
+                                        &kSaturation};
+
+Image Clone(const CxImage& src) {
+  Image copy = std::make_unique<CxImage>();
+  copy->Copy(src);
+  return copy;
+}
+
+// Noise in every byte, padding included. Strides beyond Create()'s 4-byte padding come from
+// wrapping, as frames arrive.
+Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
+                 unsigned effWidth, uint32_t salt) {
+  std::vector<uint8_t> frame(size_t{effWidth} * height);
+  uint8_t* bits = frame.data();
+  Image image = Clone(CxImage(&bits, width, height, bpp, effWidth, format));
+  const std::vector<uint8_t> noise = NoiseBytes(image->GetSize(), salt);
+  std::memcpy(image->GetBits(), noise.data(), noise.size());
+  return image;
+}
+
+// Every 24-bit colour once, in a 4096-wide BGRA image, with an alpha that varies independently.
+// Sanitizer builds, being many times slower, take every seventh colour.
+const CxImage& EveryColour() {
+#if defined(TFX_SANITIZE_BUILD)
+  constexpr uint32_t kStep = 7;
+#else
+  constexpr uint32_t kStep = 1;
+#endif
+  static const Image image = [] {
+    const uint32_t count = ((1u << 24) + kStep - 1) / kStep;
+    Image all = std::make_unique<CxImage>(4096, (count + 4095) / 4096, 32, IPF_BGRA);
+    uint8_t* p = all->GetBits();
+    for (uint32_t i = 0; i < all->GetWidth() * all->GetHeight(); ++i, p += 4) {
+      const uint32_t colour = (i * kStep) & 0xffffff;
+      const uint8_t pixel[4] = {uint8_t(colour), uint8_t(colour >> 8), uint8_t(colour >> 16),
+                                uint8_t((i * 2654435761u) >> 24)};
+      std::memcpy(p, pixel, 4);
+    }
+    return all;
+  }();
+  return *image;
+}
+
+struct SweepCase {
+  const Operation* op;
+  float strength;
+  const char* label;
+};
+
+void PrintTo(const SweepCase& c, std::ostream* os) { *os << c.label; }
+
+class AllColours : public testing::TestWithParam<SweepCase> {};
+
+TEST_P(AllColours, MatchesReferenceOnEveryKernelSet) {
+  const SweepCase& c = GetParam();
+  const Image expected = Clone(EveryColour());
+  c.op->reference(expected.get(), c.strength);
+  for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
+    SCOPED_TRACE(rows->name);
+    const Image actual = Clone(EveryColour());
+    EXPECT_EQ(c.op->fast(actual.get(), c.strength, *rows), actual.get());
+    EXPECT_TRUE(SameBuffer(*expected, *actual));
+  }
+}
+
+// Both signs, the extremes and the points where the formulas change branch. Contrast 1 gives
+// lo = 0 (compression with d = 255), 100 a stretch, 184 the clamped lo.
+INSTANTIATE_TEST_SUITE_P(ColorAdjust, AllColours,
+                         testing::Values(SweepCase{&kExposure, 50, "Exposure_50"},
+                                         SweepCase{&kExposure, -50, "Exposure_minus50"},
+                                         SweepCase{&kExposure, 100, "Exposure_100"},
+                                         SweepCase{&kExposure, -100, "Exposure_minus100"},
+                                         SweepCase{&kBrightness, 100, "Brightness_100"},
+                                         SweepCase{&kBrightness, 33.3f, "Brightness_33_3"},
+                                         SweepCase{&kBrightness, -0.5f, "Brightness_minus0_5"},
+                                         SweepCase{&kBrightness, -100, "Brightness_minus100"},
+                                         SweepCase{&kContrast, 1, "Contrast_1"},
+                                         SweepCase{&kContrast, 100, "Contrast_100"},
+                                         SweepCase{&kContrast, 184, "Contrast_184"},
+                                         SweepCase{&kContrast, -60, "Contrast_minus60"},
+                                         SweepCase{&kContrast, -255, "Contrast_minus255"},
+                                         SweepCase{&kVibrance, 100, "Vibrance_100"},
+                                         SweepCase{&kVibrance, 37, "Vibrance_37"},
+                                         SweepCase{&kVibrance, -100, "Vibrance_minus100"},
+                                         SweepCase{&kSaturation, 100, "Saturation_100"},
+                                         SweepCase{&kSaturation, 50, "Saturation_50"},
+                                         SweepCase{&kSaturation, -50, "Saturation_minus50"},
+                                         SweepCase{&kSaturation, -100, "Saturation_minus100"}),
+                         [](const testing::TestParamInfo<SweepCase>& p) {
+                           return std::string(p.param.label);
+                         });
+
+TEST(ColorAdjustRows, TableKernelsMapColourBytesOnly) {
+  // Random tables, unlike the monotonic curves of the operations, catch a lookup that only
+  // works for ordered entries.
+  for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
+    for (uint32_t salt = 1; salt <= 4; ++salt) {
+      const std::vector<uint8_t> table = NoiseBytes(256, salt);
+      for (size_t count : {0, 1, 7, 8, 15, 16, 17, 33, 300}) {
+        SCOPED_TRACE(testing::Message() << rows->name << " table " << salt << " count " << count);
+        std::vector<uint8_t> pixels = NoiseBytes(count * 4 + 8, salt + 10);
+        std::vector<uint8_t> expected = pixels;
+        for (size_t i = 0; i < count * 4; ++i) {
+          if (i % 4 != 3) expected[i] = table[expected[i]];
+        }
+        rows->applyTable(pixels.data(), count, table.data());
+        ASSERT_EQ(pixels, expected);
+      }
+    }
+  }
+}
+
+TEST(ColorAdjust, MatchesReferenceForEveryWidthAndPaddedStride) {
+  // Widths around every vector size exercise the tails. Padding must stay untouched by all but
+  // brightness, whose walk ignores rows (and the reference walks the same way).
+  for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
+    for (const Operation* op : kOperations) {
+      for (unsigned width = 1; width <= 40; ++width) {
+        for (unsigned pad : {0u, 12u}) {
+          SCOPED_TRACE(testing::Message() << rows->name << ' ' << op->name << " width " << width
+                                          << " padding " << pad);
+          const Image actual = NoiseImage(width, 3, 32, IPF_BGRA, width * 4 + pad, width);
+          const Image expected = Clone(*actual);
+          op->reference(expected.get(), op->typical);
+          op->fast(actual.get(), op->typical, *rows);
+          ASSERT_TRUE(SameBuffer(*expected, *actual));
+        }
+      }
+    }
+  }
+}
+
+TEST(ColorAdjust, OtherLayoutsMatchTheAccessorReference) {
+  const struct {
+    unsigned bpp, effWidth;
+    _ImagePixelFormat format;
+  } layouts[] = {{24, 40, IPF_BGR},
+                 {24, 40, IPF_RGB},
+                 {32, 56, IPF_RGBA},
+                 {16, 28, IPF_RGB},
+                 {8, 16, IPF_Gray8}};
+  for (const auto& layout : layouts) {
+    for (const Operation* op : kOperations) {
+      // Narrow pixels give brightness overlapping windows; see the test below.
+      if (op == &kBrightness && layout.bpp < 24) continue;
+      SCOPED_TRACE(testing::Message() << op->name << ' ' << layout.bpp << " bpp");
+      const Image actual = NoiseImage(13, 5, layout.bpp, layout.format, layout.effWidth, 9);
+      const Image expected = Clone(*actual);
+      op->reference(expected.get(), op->typical);
+      EXPECT_EQ(op->exported(actual.get(), op->typical), actual.get());
+      EXPECT_TRUE(SameBuffer(*expected, *actual));
+    }
+  }
+}
+
+TEST(ColorAdjust, LeavesImageUntouchedAtZeroStrengthOrWithoutPixels) {
+  const Image image = NoiseImage(9, 4, 24, IPF_BGR, 36, 3);
+  const Image original = Clone(*image);
+  CxImage empty;
+  uint8_t* none = nullptr;
+  CxImage headerOnly(&none, 8, 8, 32, 32, IPF_BGRA);
+  for (const Operation* op : kOperations) {
+    SCOPED_TRACE(op->name);
+    EXPECT_EQ(op->exported(image.get(), 0.0f), image.get());
+    EXPECT_TRUE(SameBuffer(*original, *image));
+    EXPECT_EQ(op->exported(nullptr, 50.0f), nullptr);
+    EXPECT_EQ(op->exported(&empty, 50.0f), &empty);
+    EXPECT_EQ(op->exported(&headerOnly, 50.0f), &headerOnly);
+  }
+}
+
+TEST(ColorAdjust, FollowsTheCurvesAtTheirLandmarks) {
+  const struct {
+    const Operation* op;
+    float strength;
+    int in, out;
+  } cases[] = {
+      // x 2^0.6 and x 2^-0.6
+      {&kExposure, 50, 100, 151},
+      {&kExposure, 50, 169, 255},
+      {&kExposure, -50, 100, 65},
+      // x 2; - 104.25; the smallest darkening is already 1.55 levels
+      {&kBrightness, 100, 127, 254},
+      {&kBrightness, 100, 128, 255},
+      {&kBrightness, -100, 200, 95},
+      {&kBrightness, -100, 106, 1},
+      {&kBrightness, -0.01f, 100, 98},
+      // 183: lo = 127, hi = 128, d = 1
+      {&kContrast, 183, 127, 0},
+      {&kContrast, 183, 128, 255},
+      // 184: lo = 120, hi = 127, d = 15; the ramp tops at 119, then jumps
+      {&kContrast, 184, 120, 0},
+      {&kContrast, 184, 121, 17},
+      {&kContrast, 184, 127, 119},
+      {&kContrast, 184, 128, 255},
+      // -255: lo = -50, d = 155
+      {&kContrast, -255, 0, 50},
+      {&kContrast, -255, 255, 205},
+      // t infinite (255) or negative (300): lo falls below -127 and becomes -120, d = 15
+      {&kContrast, 255, 0, 120},
+      {&kContrast, 300, 255, 135},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(testing::Message() << c.op->name << ' ' << c.strength << " at " << c.in);
+    const uint8_t v = static_cast<uint8_t>(c.in);
+    CxImage image(1, 1, 32, IPF_BGRA);
+    image.SetPixelColor(0, 0, tagRGBQUAD{v, v, v, 200});
+    c.op->exported(&image, c.strength);
+    const tagRGBQUAD out = image.GetPixelColor(0, 0, true);
+    EXPECT_EQ(out.rgbBlue, c.out);
+    EXPECT_EQ(out.rgbRed, c.out);
+    EXPECT_EQ(out.rgbReserved, 200);
+  }
+}
+
+TEST(ColorAdjust, BrightnessWalksPixelsIgnoringRowPadding) {
+  // 3 x 2 pixels, one 4-byte gap per row: the walk takes 6 consecutive pixels from the first
+  // byte, so the first gap is treated as a pixel and the last real pixel is never reached.
+  std::vector<uint8_t> frame(32, 100);
+  uint8_t* bits = frame.data();
+  CxImage image(&bits, 3, 2, 32, 16, IPF_BGRA);
+  brightnessAdjustment(&image, 100.0f);
+  std::vector<uint8_t> expected(32, 100);
+  for (int i = 0; i < 24; ++i) expected[i] = i % 4 == 3 ? 100 : 200;
+  EXPECT_EQ(frame, expected);
+
+  // 3-byte pixels: 9 bytes and 3 of padding per row; the walk covers the first 18 bytes.
+  std::vector<uint8_t> packed(24, 100);
+  bits = packed.data();
+  CxImage rgb(&bits, 3, 2, 24, 12, IPF_BGR);
+  brightnessAdjustment(&rgb, 100.0f);
+  for (int i = 0; i < 24; ++i) EXPECT_EQ(packed[i], i < 18 ? 200 : 100) << i;
+
+  // One-byte pixels still get three bytes each: the windows overlap, and stop at the buffer's
+  // end instead of running past it.
+  std::vector<uint8_t> grey(4, 10);
+  bits = grey.data();
+  CxImage narrow(&bits, 4, 1, 8, 4, IPF_Gray8);
+  brightnessAdjustment(&narrow, 100.0f);
+  EXPECT_EQ(grey, (std::vector<uint8_t>{20, 40, 80, 80}));
+}
+
+TEST(ColorAdjust, VibranceAndSaturationKeepGreysAndFullDesaturationMakesThem) {
+  const Image ramp = std::make_unique<CxImage>(256, 1, 32, IPF_BGRA);
+  for (int v = 0; v < 256; ++v) {
+    ramp->SetPixelColor(v, 0, tagRGBQUAD{uint8_t(v), uint8_t(v), uint8_t(v), 1});
+  }
+  for (const Operation* op : {&kVibrance, &kSaturation}) {
+    for (float strength : {-100.0f, -30.0f, 30.0f, 100.0f}) {
+      const Image image = Clone(*ramp);
+      op->exported(image.get(), strength);
+      EXPECT_TRUE(SameBuffer(*ramp, *image)) << op->name << ' ' << strength;
+    }
+  }
+
+  const Image image = NoiseImage(50, 20, 32, IPF_BGRA, 200, 5);
+  const Image original = Clone(*image);
+  saturationAdjustment(image.get(), -100.0f);
+  for (unsigned long i = 0; i < 1000; ++i) {
+    const tagRGBQUAD c = image->GetPixelColor(i % 50, i / 50, true);
+    const tagRGBQUAD o = original->GetPixelColor(i % 50, i / 50, true);
+    const int mid = (std::max({o.rgbRed, o.rgbGreen, o.rgbBlue}) +
+                     std::min({o.rgbRed, o.rgbGreen, o.rgbBlue})) /
+                    2;
+    ASSERT_EQ(c.rgbRed, c.rgbGreen);
+    ASSERT_EQ(c.rgbGreen, c.rgbBlue);
+    ASSERT_NEAR(c.rgbRed, mid, 1);
+  }
+}
+
+TEST(ColorAdjust, PerPixelFormsKeepTheirOwnLimits) {
+  const tagRGBQUAD c{10, 200, 50, 100};  // blue, green, red, alpha
+  // calPowColor floors at 0, which the image function's positive gain never needs.
+  const tagRGBQUAD dark = calPowColor(c, -2.0f);
+  EXPECT_EQ(dark.rgbBlue + dark.rgbGreen + dark.rgbRed, 0);
+  EXPECT_EQ(dark.rgbReserved, 100);
+  // calMask masks alpha as well.
+  const tagRGBQUAD mask = calMask(c, 60);
+  EXPECT_EQ(mask.rgbBlue + mask.rgbRed, 0);
+  EXPECT_EQ(mask.rgbGreen, 140);
+  EXPECT_EQ(mask.rgbReserved, 40);
+}
+
+}  // namespace

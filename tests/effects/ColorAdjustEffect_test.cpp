@@ -1,0 +1,111 @@
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <random>
+#include <vector>
+
+#include "support/TestFrame.h"
+#include "tessarofx/NLEHost.h"
+#include "tessarofx/TessaroFx.h"
+
+namespace {
+
+namespace Key = NLEKey::Filter;
+constexpr const wchar_t* kColorAdjust = L"18C6E879-4138-42D0-B0B9-6B4401AA97E6";
+
+// Host settings carrying double parameters the way a host's UI writes them.
+NLEComPtr<INLEProperties> Settings(
+    std::initializer_list<std::pair<const wchar_t*, double>> values) {
+  NLEComPtr<INLEProperties> props;
+  NLECommon::CreateProperties(&props);
+  int i = 0;
+  for (const auto& [name, value] : values) {
+    NLEComPtr<INLEProperties> p;
+    NLECommon::CreateProperties(&p);
+    p->SetString(Key::Property::kVariantName, name);
+    p->SetString(Key::Property::kFriendName, name);
+    p->SetInt(Key::Property::kType, NLEFilterPropertyType_Double);
+    p->SetValue(Key::Property::kValue_Default, CNLEValue(0.0));
+    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
+    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
+  }
+  props->SetInt(Key::Property::kCount, i);
+  return props;
+}
+
+NLEComPtr<INLECGFilter> Create(INLEProperties* settings) {
+  NLEComPtr<INLECGFilter> filter;
+  EXPECT_EQ(CreateFilterFromGUID(nullptr, kColorAdjust, settings, nullptr,
+                                 reinterpret_cast<void**>(&filter)),
+            NLE_S_OK);
+  return filter;
+}
+
+void FillRandom(TestFrame* f, unsigned salt) {
+  std::mt19937 rng(salt);
+  for (auto& b : f->pixels) b = static_cast<uint8_t>(rng());
+}
+
+TEST(ColorAdjustEffect, ZeroParametersGiveTheForegroundBack) {
+  NLEComPtr<INLECGFilter> filter =
+      Create(Settings({{L"u_exposure", 0}, {L"u_brightness", 0}, {L"u_contrast", 0}}));
+  TestFrame* fg = new TestFrame(17, 9);
+  TestFrame* dst = new TestFrame(17, 9);
+  NLEComPtr<INLEFrame> h1(fg), h2(dst);
+  FillRandom(fg, 1);
+  filter->SetForeground(fg);
+  ASSERT_EQ(filter->Running(dst), NLE_S_OK);
+  EXPECT_EQ(dst->pixels, fg->pixels);
+}
+
+TEST(ColorAdjustEffect, BrightnessDoublesChannelsAndKeepsAlpha) {
+  NLEComPtr<INLECGFilter> filter = Create(Settings({{L"u_brightness", 100}}));
+  TestFrame* fg = new TestFrame(64, 4);
+  TestFrame* bg = new TestFrame(64, 4, 0, false, 0x55);
+  TestFrame* dst = new TestFrame(64, 4, 300);  // padded rows go through a private copy
+  NLEComPtr<INLEFrame> h1(fg), h2(bg), h3(dst);
+  FillRandom(fg, 2);
+  filter->SetForeground(fg);
+  filter->SetBackground(bg);  // never read by this effect
+  ASSERT_EQ(filter->Running(dst), NLE_S_OK);
+  for (int y = 0; y < 4; ++y) {
+    for (int x = 0; x < 64; ++x) {
+      const uint8_t* in = fg->Pixel(x, y);
+      const uint8_t* out = dst->Pixel(x, y);
+      for (int c = 0; c < 3; ++c) EXPECT_EQ(out[c], std::min(255, in[c] * 2));
+      EXPECT_EQ(out[3], in[3]);
+    }
+  }
+}
+
+TEST(ColorAdjustEffect, ParametersChangedAfterCreationTakeEffect) {
+  NLEComPtr<INLECGFilter> filter = Create(Settings({{L"u_exposure", 0}}));
+  NLEComPtr<INLEProperties> exposure;
+  ASSERT_EQ(filter->GetParamPropertyFromName(L"u_exposure", &exposure), NLE_S_OK);
+  exposure->SetValue(Key::Property::kValue_Current, CNLEValue(50.0));
+  filter->ParamValueChanged();
+
+  TestFrame* fg = new TestFrame(1, 1);
+  TestFrame* dst = new TestFrame(1, 1);
+  NLEComPtr<INLEFrame> h1(fg), h2(dst);
+  fg->pixels = {100, 50, 200, 7};
+  filter->SetForeground(fg);
+  ASSERT_EQ(filter->Running(dst), NLE_S_OK);
+  const float gain = static_cast<float>(std::pow(2.0, 50.0 / 50 * 0.6));
+  EXPECT_EQ(dst->pixels[0], static_cast<int>(100 * gain));
+  EXPECT_EQ(dst->pixels[1], static_cast<int>(50 * gain));
+  EXPECT_EQ(dst->pixels[2], 255);
+  EXPECT_EQ(dst->pixels[3], 7);
+}
+
+TEST(ColorAdjustEffect, MissingForegroundIsABadArgument) {
+  NLEComPtr<INLECGFilter> filter = Create(nullptr);
+  TestFrame* bg = new TestFrame(2, 2);
+  TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
+  NLEComPtr<INLEFrame> h1(bg), h2(dst);
+  filter->SetBackground(bg);
+  EXPECT_EQ(filter->Running(dst), NLE_E_INVALIDARG);
+  EXPECT_EQ(dst->pixels[0], 9);
+}
+
+}  // namespace
