@@ -1,0 +1,61 @@
+// Runs the registered benchmarks, then prints each one's Mpixel/s and its ratio to the memcpy
+// benchmark of the same frame size measured in the same run.
+#include <benchmark/benchmark.h>
+
+#include <cstdio>
+#include <map>
+#include <string>
+#include <vector>
+
+namespace {
+
+class CollectingReporter : public benchmark::ConsoleReporter {
+ public:
+  struct Row {
+    std::string name;
+    double mpixPerSec;
+  };
+  void ReportRuns(const std::vector<Run>& runs) override {
+    ConsoleReporter::ReportRuns(runs);
+    for (const Run& run : runs) {
+      if (run.error_occurred || run.run_type != Run::RT_Iteration) continue;
+      auto it = run.counters.find("items_per_second");
+      if (it == run.counters.end()) continue;
+      rows.push_back({run.benchmark_name(), it->second.value / 1e6});
+    }
+  }
+  std::vector<Row> rows;
+};
+
+// "BM_Name/4K/..." -> "4K": the size label is the first path segment after the name.
+std::string SizeOf(const std::string& name) {
+  const size_t a = name.find('/');
+  if (a == std::string::npos) return "";
+  const size_t b = name.find('/', a + 1);
+  return name.substr(a + 1, b == std::string::npos ? std::string::npos : b - a - 1);
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  benchmark::Initialize(&argc, argv);
+  if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
+  CollectingReporter reporter;
+  benchmark::RunSpecifiedBenchmarks(&reporter);
+
+  std::map<std::string, double> memcpyRate;
+  for (const auto& row : reporter.rows)
+    if (row.name.rfind("BM_Memcpy", 0) == 0) memcpyRate[SizeOf(row.name)] = row.mpixPerSec;
+
+  std::printf("\n%-48s %14s %12s\n", "benchmark", "Mpixel/s", "x memcpy");
+  for (const auto& row : reporter.rows) {
+    auto ref = memcpyRate.find(SizeOf(row.name));
+    if (ref != memcpyRate.end() && ref->second > 0)
+      std::printf("%-48s %14.1f %12.4f\n", row.name.c_str(), row.mpixPerSec,
+                  row.mpixPerSec / ref->second);
+    else
+      std::printf("%-48s %14.1f %12s\n", row.name.c_str(), row.mpixPerSec, "-");
+  }
+  benchmark::Shutdown();
+  return 0;
+}
