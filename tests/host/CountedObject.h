@@ -4,16 +4,13 @@
 
 #include "tessarofx/NLEComBase.h"
 
-class CountedObject final : public IUnknown {
+class CountedObject : public IUnknown {
  public:
   virtual ~CountedObject() = default;
   HRESULT QueryInterface(REFIID iid, void** out) override {
     if (!out) return NLE_E_POINTER;
-    *out = nullptr;
-    if (iid != IID_IUnknown) return NLE_E_NOINTERFACE;
-    *out = this;
-    AddRef();
-    return NLE_S_OK;
+    *out = iid == IID_IUnknown ? this : nullptr;
+    return *out ? (AddRef(), NLE_S_OK) : NLE_E_NOINTERFACE;
   }
   uint32_t AddRef() override { return ++refs; }
   uint32_t Release() override { return --refs; }

@@ -3,6 +3,7 @@
 
 #include <cstdint>
 #include <cstring>
+#include <tuple>
 #include <vector>
 
 #include "tessarofx/CxImage.h"
@@ -26,30 +27,22 @@ struct ImageProbe : CxImage {
 tagRGBQUAD Rgba(uint8_t r, uint8_t g, uint8_t b, uint8_t a) { return tagRGBQUAD{b, g, r, a}; }
 
 TEST(CxImage, CreatePadsRowsToFourBytesAndMakesEightBitsGrey) {
+  // An effWidth of 0 marks a zero argument, which leaves the image empty.
   const struct {
-    unsigned width, bpp, effWidth;
-  } cases[] = {{100, 24, 300}, {101, 24, 304}, {5, 8, 8}, {3, 16, 8}, {7, 32, 28}};
+    unsigned width, height, bpp, effWidth;
+  } cases[] = {{100, 3, 24, 300}, {101, 3, 24, 304}, {5, 3, 8, 8},  {3, 3, 16, 8},
+               {7, 3, 32, 28},    {0, 4, 32, 0},     {4, 0, 32, 0}, {4, 4, 0, 0}};
   for (const auto& c : cases) {
-    SCOPED_TRACE(testing::Message() << c.width << " x " << c.bpp << " bpp");
-    CxImage image;
-    ASSERT_EQ(image.Create(c.width, 3, c.bpp, IPF_BGRA), &image);
+    SCOPED_TRACE(testing::Message() << c.width << "x" << c.height << ", " << c.bpp << " bpp");
+    CxImage image(8, 8, 32, IPF_BGRA);
+    EXPECT_EQ(image.Create(c.width, c.height, c.bpp, IPF_BGRA), c.effWidth ? &image : nullptr);
     EXPECT_EQ(image.GetEffWidth(), c.effWidth);
-    EXPECT_EQ(image.GetSize(), c.effWidth * 3);
-    EXPECT_EQ(image.getFormat(), c.bpp == 8 ? IPF_Gray8 : IPF_BGRA);
+    EXPECT_EQ(image.GetSize(), c.effWidth * c.height);
+    EXPECT_EQ(image.getFormat(), !c.effWidth ? IPF_None : c.bpp == 8 ? IPF_Gray8 : IPF_BGRA);
+    EXPECT_EQ(image.GetBits() == nullptr, !c.effWidth);
   }
   uint8_t* none = nullptr;
   EXPECT_EQ(CxImage(&none, 4, 4, 8, 4, IPF_RGB).getFormat(), IPF_Gray8);
-}
-
-TEST(CxImage, CreateWithAZeroArgumentLeavesTheImageEmpty) {
-  const unsigned cases[][3] = {{0, 4, 32}, {4, 0, 32}, {4, 4, 0}};
-  for (const auto& c : cases) {
-    CxImage image(8, 8, 32, IPF_BGRA);
-    EXPECT_EQ(image.Create(c[0], c[1], c[2], IPF_BGRA), nullptr);
-    EXPECT_EQ(image.getFormat(), IPF_None);
-    EXPECT_EQ(image.GetBits(), nullptr);
-    EXPECT_EQ(image.GetSize(), 0u);
-  }
 }
 
 TEST(CxImage, WrappingImageLeavesTheCallersBufferAlone) {
@@ -124,26 +117,17 @@ TEST(CxImage, OutOfRangeAndMismatchedPixelsReadZeroAndIgnoreWrites) {
   CxImage image(&bits, 3, 2, 32, 16, IPF_BGRA);
   CxImage threeByteFormat(&bits, 4, 2, 32, 16, IPF_RGB);
   CxImage beyondTheTable(&bits, 4, 2, 32, 16, static_cast<_ImagePixelFormat>(9));
-  const tagRGBQUAD zero = Rgba(0, 0, 0, 0);
-  EXPECT_EQ(image.GetPixelColor(3, 0, true), zero);
-  EXPECT_EQ(image.GetPixelColor(0, 2, true), zero);
-  EXPECT_EQ(threeByteFormat.GetPixelColor(0, 0, true), zero);
-  EXPECT_EQ(beyondTheTable.GetPixelColor(0, 0, true), zero);
-  image.SetPixelColor(3, 0, Rgba(1, 2, 3, 4));
-  image.SetPixelColor(0, 2, Rgba(1, 2, 3, 4));
-  threeByteFormat.SetPixelColor(0, 0, Rgba(1, 2, 3, 4));
-  beyondTheTable.SetPixelColor(0, 0, Rgba(1, 2, 3, 4));
+  for (auto [at, x, y] : {std::tuple(&image, 3, 0), std::tuple(&image, 0, 2),
+                          std::tuple(&threeByteFormat, 0, 0), std::tuple(&beyondTheTable, 0, 0)}) {
+    EXPECT_EQ(at->GetPixelColor(x, y, true), Rgba(0, 0, 0, 0))
+        << at->getFormat() << " at " << x << "," << y;
+    at->SetPixelColor(x, y, Rgba(1, 2, 3, 4));
+  }
   EXPECT_EQ(std::vector<uint8_t>(buffer, buffer + 32), std::vector<uint8_t>(32, 0x77));
-  EXPECT_EQ(CxImage().GetPixelColor(0, 0, true), zero);
+  EXPECT_EQ(CxImage().GetPixelColor(0, 0, true), Rgba(0, 0, 0, 0));
 }
 
-TEST(CxImage, ClampToByteLimitsToByteRange) {
-  EXPECT_EQ(ClampToByte(-1), 0);
-  EXPECT_EQ(ClampToByte(200), 200);
-  EXPECT_EQ(ClampToByte(256), 255);
-}
-
-TEST(CxImage, CopyAllocatesOrReusesTheBuffer) {
+TEST(CxImage, CopyReusesASameSizedBufferAndReplacesAnyOther) {
   CxImage src(5, 3, 24, IPF_BGR);
   for (uint32_t i = 0; i < src.GetSize(); ++i) src.GetBits()[i] = static_cast<uint8_t>(i * 7);
   ImageProbe fresh;
@@ -161,22 +145,18 @@ TEST(CxImage, CopyAllocatesOrReusesTheBuffer) {
   wrapper.Copy(src);
   EXPECT_EQ(wrapper.GetBits(), frame.data());
   EXPECT_EQ(frame[47], src.GetBits()[47]);
-
   // Copying from an image without pixels changes nothing.
   wrapper.Copy(CxImage());
   EXPECT_EQ(wrapper.GetWidth(), 5u);
-}
 
-TEST(CxImage, CopyOfOtherSizeReplacesEvenAWrappedBuffer) {
-  CxImage src(3, 3, 32, IPF_BGRA);
-  std::memset(src.GetBits(), 4, src.GetSize());
-  uint8_t* bits = new uint8_t[16];  // the caller's, from array new
-  ImageProbe wrapper(&bits, 2, 2, 32, 8, IPF_BGRA);
-  wrapper.Copy(&src);
-  EXPECT_EQ(bits, nullptr);
-  ASSERT_NE(wrapper.GetBits(), nullptr);
-  EXPECT_EQ(wrapper.OwnsBits(), 1u);
-  EXPECT_EQ(wrapper.GetBits()[35], 4);
+  // A wrapper of another size frees even the caller's buffer and clears the caller's pointer.
+  uint8_t* small = new uint8_t[16];  // from array new, as the wrapper will delete it
+  ImageProbe other(&small, 2, 2, 32, 8, IPF_BGRA);
+  other.Copy(&src);
+  EXPECT_EQ(small, nullptr);
+  ASSERT_NE(other.GetBits(), nullptr);
+  EXPECT_EQ(other.OwnsBits(), 1u);
+  EXPECT_EQ(other.GetBits()[47], src.GetBits()[47]);
 }
 
 TEST(CxImage, RgbToHslUsesIntegerScale) {
