@@ -5,9 +5,13 @@
 #include <algorithm>
 #include <cstdint>
 #include <cstring>
+#include <iostream>
+#include <limits>
 #include <memory>
 #include <string>
 #include <vector>
+
+#include <hwy/targets.h>
 
 #include "adjust/ColorAdjustReference.h"
 #include "adjust/ColorAdjustRows.h"
@@ -128,6 +132,76 @@ INSTANTIATE_TEST_SUITE_P(ColorAdjust, AllColours,
                          [](const testing::TestParamInfo<SweepCase>& p) {
                            return std::string(p.param.label);
                          });
+
+TEST(ColorAdjustRows, OneSetPerTargetCompiledAndSupported) {
+  // Every test that loops over the sets then covers every Highway target this machine runs.
+  std::vector<std::string> expected;
+  for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
+    expected.push_back(hwy::TargetName(target));
+  }
+  std::vector<std::string> names;
+  std::string list;
+  for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
+    names.push_back(rows->name);
+    list += ' ' + names.back();
+  }
+  std::cout << "[ targets  ]" << list << std::endl;
+  EXPECT_EQ(names, expected);
+  ASSERT_FALSE(names.empty());
+  const tfx::ColorAdjustRows& best = tfx::BestColorAdjustRows();
+  const tfx::ColorAdjustRows& first = *tfx::SupportedColorAdjustRows().front();
+  EXPECT_STREQ(best.name, first.name);
+  EXPECT_EQ(best.applyTable, first.applyTable);
+  EXPECT_EQ(best.vibrance, first.vibrance);
+  EXPECT_EQ(best.saturation, first.saturation);
+}
+
+tagRGBQUAD VibranceByPixel(tagRGBQUAD c, float strength) {
+  const unsigned char luma = calLuma(c);
+  const auto mask = static_cast<unsigned char>(-calLuma(calMask(c, luma)));
+  return mixLumaAndColor(c, luma, mask, strength);
+}
+
+TEST(ColorAdjustRows, MatchThePerPixelFormsAtExtremeStrengths) {
+  // Far outside what the operations pass, where the reference's ints would overflow: the kernels
+  // switch to their wrap-around and NaN-safe forms around the thresholds below, and must still
+  // give the bytes of the per-pixel forms. Greys, then (v, (v + 128) / 2, 128), whose middle
+  // channel can meet l * 255 exactly, which an infinite gain turns into NaN, then noise; 4101
+  // pixels leave a tail on every vector width.
+  constexpr float kInf = std::numeric_limits<float>::infinity();
+  constexpr float kNan = std::numeric_limits<float>::quiet_NaN();
+  std::vector<uint8_t> noise = NoiseBytes(4101 * 4, 77);
+  for (int v = 0; v < 256; ++v) {
+    const uint8_t grey[3] = {uint8_t(v), uint8_t(v), uint8_t(v)};
+    const uint8_t steps[3] = {uint8_t(v), uint8_t(v / 2 + 64), uint8_t(128)};
+    std::memcpy(&noise[4 * v], grey, 3);
+    std::memcpy(&noise[4 * (256 + v)], steps, 3);
+  }
+  const float strengths[] = {16448.0f, 16449.0f, -16449.0f, 8.5e6f, -8.5e6f,
+                             1e30f,    kInf,     -kInf,     kNan};
+  const float sigmas[] = {1.0f, 0.999f, 2.0f, 1e30f, kInf, -1e30f, -3.4e38f, -kInf, kNan};
+  const auto check = [&](const char* label, float strength, auto kernel, auto by_pixel) {
+    std::vector<uint8_t> expected = noise;
+    for (size_t i = 0; i < expected.size(); i += 4) {
+      tagRGBQUAD c;
+      std::memcpy(&c, &expected[i], 4);
+      c = by_pixel(c, strength);
+      std::memcpy(&expected[i], &c, 4);
+    }
+    for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
+      SCOPED_TRACE(testing::Message() << rows->name << ' ' << label << ' ' << strength);
+      std::vector<uint8_t> actual = noise;
+      (rows->*kernel)(actual.data(), actual.size() / 4, strength);
+      ASSERT_EQ(actual, expected);
+    }
+  };
+  for (const float strength : strengths) {
+    check("vibrance", strength, &tfx::ColorAdjustRows::vibrance, VibranceByPixel);
+  }
+  for (const float sigma : sigmas) {
+    check("saturation", sigma, &tfx::ColorAdjustRows::saturation, calNewColor);
+  }
+}
 
 TEST(ColorAdjustRows, TableKernelsMapColourBytesOnly) {
   // Random tables, unlike the monotonic curves of the operations, catch a lookup that only

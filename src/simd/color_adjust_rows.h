@@ -1,0 +1,29 @@
+// Row kernels behind the colour adjustments, one set per instruction set compiled in, picked at
+// run time. Every set gives the same bytes as the per-pixel forms in adjust/ColorAdjust.cpp, so
+// callers may use any of them; tests run them all.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <vector>
+
+namespace tfx {
+
+// Each kernel rewrites `count` consecutive 4-byte pixels in place: bytes 0..2 are colour (in
+// either order: every operation treats the three channels alike), byte 3 is alpha and is kept.
+// Rows need no particular alignment.
+struct ColorAdjustRows {
+  const char* name;  // the instruction set, as Highway names it
+  void (*applyTable)(uint8_t* pixels, size_t count, const uint8_t table[256]);
+  // strength = v / 100 * 0.8
+  void (*vibrance)(uint8_t* pixels, size_t count, float strength);
+  // sigma = s / 100, not 0
+  void (*saturation)(uint8_t* pixels, size_t count, float sigma);
+};
+
+// The set Highway's dispatch picks for this CPU, chosen on the first call.
+const ColorAdjustRows& BestColorAdjustRows();
+// One set per instruction set both compiled in and run by this CPU, best first.
+std::vector<const ColorAdjustRows*> SupportedColorAdjustRows();
+
+}  // namespace tfx

@@ -1,0 +1,371 @@
+// The colour-adjust row kernels, compiled once per instruction set by foreach_target.h.
+//
+// Every lane gives the bytes of the per-pixel forms in adjust/ColorAdjust.cpp, bit for bit: it
+// evaluates their float and integer expressions in the same order and precision, or a rewrite
+// that provably rounds the same (each one says why next to it). Nothing is fused into a
+// multiply-add: there is no MulAdd here, and the build passes -ffp-contract=off although the
+// AVX2 and AVX-512 targets enable FMA instructions.
+#include <cmath>
+#include <cstring>
+
+#include "simd/color_adjust_rows.h"
+
+#undef HWY_TARGET_INCLUDE
+#define HWY_TARGET_INCLUDE "simd/color_adjust_rows_hwy.cpp"
+#include <hwy/foreach_target.h>  // IWYU pragma: keep
+#include <hwy/highway.h>
+
+HWY_BEFORE_NAMESPACE();
+namespace tfx {
+namespace HWY_NAMESPACE {
+
+namespace hn = hwy::HWY_NAMESPACE;
+
+// Vibrance and saturation see each pixel as a 32-bit lane, byte 0 being the low byte; the table
+// lookup sees bytes.
+using DU = hn::ScalableTag<uint32_t>;
+using DI = hn::RebindToSigned<DU>;
+using DF = hn::RebindToFloat<DU>;
+using VU = hn::Vec<DU>;
+using VI = hn::Vec<DI>;
+using VF = hn::Vec<DF>;
+
+// ---- Table lookup ------------------------------------------------------------------------------
+
+#if HWY_TARGET != HWY_SCALAR
+
+using D8 = hn::Repartition<uint8_t, DU>;
+using DI8 = hn::RebindToSigned<D8>;
+using V8 = hn::Vec<D8>;
+
+// Bytes 3 of the pixels (alpha).
+HWY_INLINE hn::Mask<D8> AlphaBytes() {
+  return hn::MaskFromVec(hn::BitCast(D8(), hn::Set(DU(), 0xff000000u)));
+}
+
+// A byte shuffle looks up 16 entries and gives 0 where the index has bit 7 set. Shuffle i sees
+// the byte minus 16 * i (wrapping), whose low nibble is the byte's and whose bit 7 is clear
+// exactly when (h - i) mod 16 < 8, h being the byte's high nibble. Below 128 (h < 8), shuffles
+// 0..7 thus fire for i <= h, and with A_i = T_i ^ T_(i-1) (T_i the i-th run of 16 table entries,
+// T_(-1) = 0) they XOR to T_h. From 128 on, shuffles 1..8 fire for i >= h - 7, and with
+// B_i = T_(i+7) ^ T_(i+8) (T_16 = 0) they XOR to T_h as well. Both groups share their indices;
+// bit 7 of the byte picks the group whose result counts. The chunks are A_0..A_7, B_1..B_8.
+void MakeChunks(const uint8_t table[256], uint8_t chunks[256]) {
+  for (int j = 0; j < 16; ++j) {
+    for (int i = 0; i < 8; ++i) {
+      chunks[16 * i + j] = table[16 * i + j] ^ (i > 0 ? table[16 * (i - 1) + j] : 0);
+      chunks[128 + 16 * i + j] = table[16 * (i + 8) + j] ^ (i < 7 ? table[16 * (i + 9) + j] : 0);
+    }
+  }
+}
+
+// x86 shuffles read only bit 7 and the low nibble of an index. Elsewhere an index from 16 to 127
+// may give 0 instead, so those bits alone are kept.
+HWY_INLINE V8 LookUpChunk(const uint8_t* chunk, V8 index) {
+  const D8 d8;
+#if HWY_ARCH_X86 && HWY_TARGET <= HWY_SSSE3
+  const V8 clean = index;
+#else
+  const V8 clean = hn::And(index, hn::Set(d8, uint8_t{0x8f}));
+#endif
+  return hn::TableLookupBytesOr0(hn::LoadDup128(d8, chunk), clean);
+}
+
+// The byte minus 16 * i.
+HWY_INLINE V8 ShuffleIndex(V8 x, int i) {
+  return hn::Sub(x, hn::Set(D8(), static_cast<uint8_t>(16 * i)));
+}
+
+// Bytes 0..2 of each pixel from the table, byte 3 (alpha) kept.
+struct TableVector {
+  const uint8_t* chunks;  // from MakeChunks
+
+  const uint8_t* A(int i) const { return chunks + 16 * i; }
+  const uint8_t* B(int i) const { return chunks + 128 + 16 * (i - 1); }
+
+  HWY_INLINE V8 operator()(V8 x) const {
+    const D8 d8;
+    const DI8 di8;
+    V8 low = LookUpChunk(A(0), x);
+    V8 high = LookUpChunk(B(8), ShuffleIndex(x, 8));
+    for (int i = 1; i < 7; i += 2) {
+      const V8 index = ShuffleIndex(x, i);
+      const V8 next = ShuffleIndex(x, i + 1);
+      low = hn::Xor3(low, LookUpChunk(A(i), index), LookUpChunk(A(i + 1), next));
+      high = hn::Xor3(high, LookUpChunk(B(i), index), LookUpChunk(B(i + 1), next));
+    }
+    const V8 index = ShuffleIndex(x, 7);
+    low = hn::Xor(low, LookUpChunk(A(7), index));
+    high = hn::Xor(high, LookUpChunk(B(7), index));
+    const auto upper = hn::RebindMask(d8, hn::Lt(hn::BitCast(di8, x), hn::Zero(di8)));
+    return hn::IfThenElse(AlphaBytes(), x, hn::IfThenElse(upper, high, low));
+  }
+};
+
+#endif  // HWY_TARGET != HWY_SCALAR
+
+// ---- Per-pixel arithmetic on 32-bit lanes ------------------------------------------------------
+
+HWY_INLINE VI Channel0(VU p) { return hn::BitCast(DI(), hn::And(p, hn::Set(DU(), 255u))); }
+HWY_INLINE VI Channel1(VU p) {
+  return hn::BitCast(DI(), hn::And(hn::ShiftRight<8>(p), hn::Set(DU(), 255u)));
+}
+HWY_INLINE VI Channel2(VU p) {
+  return hn::BitCast(DI(), hn::And(hn::ShiftRight<16>(p), hn::Set(DU(), 255u)));
+}
+
+HWY_INLINE VU Alpha(VU p) { return hn::And(p, hn::Set(DU(), 0xff000000u)); }
+
+// Alpha of `p` with the three colour channels (each 0..255) put back.
+HWY_INLINE VU Pack(VU p, VI c0, VI c1, VI c2) {
+  const DU du;
+  return hn::Or3(hn::Or(Alpha(p), hn::BitCast(du, c0)), hn::ShiftLeft<8>(hn::BitCast(du, c1)),
+                 hn::ShiftLeft<16>(hn::BitCast(du, c2)));
+}
+
+// An integer-valued float below 2^22 in magnitude plus 1.5 * 2^23 is exact and holds the integer
+// in its low mantissa bits: truncation without ConvertTo's overflow handling.
+HWY_INLINE VI SmallToInt(VF v) {
+  const DF df;
+  const DI di;
+  const VF shifted = hn::Add(hn::Trunc(v), hn::Set(df, 12582912.0f));
+  return hn::Sub(hn::BitCast(di, shifted), hn::Set(di, 0x4b400000));
+}
+
+// Toward zero; out-of-range values and NaN give INT_MIN as in the per-pixel form, where
+// ConvertTo alone would saturate to INT_MAX (and may not be handed NaN).
+HWY_INLINE VI TruncToInt(VF v) {
+  const DF df;
+  const DI di;
+  const auto in_range =
+      hn::And(hn::Ge(v, hn::Set(df, -2147483648.0f)), hn::Lt(v, hn::Set(df, 2147483648.0f)));
+  return hn::IfThenElse(hn::RebindMask(di, in_range),
+                        hn::ConvertTo(di, hn::IfThenElseZero(in_range, v)),
+                        hn::Set(di, hwy::LimitsMin<int32_t>()));
+}
+
+// v clamped to [0, 255], ready for truncation: the per-pixel form's 0 below 0, else
+// trunc(min(255, v)). kNanSafe maps NaN to 255 as that form does; without it a NaN lane's result
+// depends on the target's Min and Max.
+template <bool kNanSafe>
+HWY_INLINE VF ClampToByteRange(VF v) {
+  const DF df;
+  const VF top = hn::Set(df, 255.0f);
+  const VF capped = kNanSafe ? hn::IfThenElse(hn::Lt(v, top), v, top) : hn::Min(v, top);
+  return hn::Max(capped, hn::Zero(df));
+}
+
+// trunc(v) for v in [0, 255], as the bit pattern of trunc(v) + 2^23: 0x4b000000 + the byte.
+HWY_INLINE VU ByteBits(VF v) {
+  const DF df;
+  return hn::BitCast(DU(), hn::Add(hn::Trunc(v), hn::Set(df, 8388608.0f)));
+}
+
+// Pack for channels given as ByteBits. Shifting left by 8 or 16 pushes the 0x4b out of the lane,
+// so only channel 0 needs masking.
+HWY_INLINE VU PackByteBits(VU p, VU b0, VU b1, VU b2) {
+  const DU du;
+  return hn::Or3(hn::OrAnd(Alpha(p), b0, hn::Set(du, 255u)), hn::ShiftLeft<8>(b1),
+                 hn::ShiftLeft<16>(b2));
+}
+
+// (channel * (k + 256) - luma * k) >> 8 with 32-bit wrap-around, as in the per-pixel form,
+// rearranged to (channel << 8) + (channel - luma) * k: equal modulo 2^32, one multiply fewer.
+HWY_INLINE VI MixChannel(VI c, VI luma, VU k) {
+  const DU du;
+  const DI di;
+  const VU mixed =
+      hn::Add(hn::ShiftLeft<8>(hn::BitCast(du, c)), hn::Mul(hn::BitCast(du, hn::Sub(c, luma)), k));
+  return hn::Max(hn::Min(hn::ShiftRight<8>(hn::BitCast(di, mixed)), hn::Set(di, 255)),
+                 hn::Zero(di));
+}
+
+// MixChannel when |(channel - luma) * k| stays below 2^30: nothing wraps, and the channel comes
+// out of the shift whole, ((c << 8) + x) >> 8 being c + (x >> 8).
+HWY_INLINE VI MixChannelSmall(VI c, VI luma, VI k) {
+  const DI di;
+  const VI mixed = hn::Add(c, hn::ShiftRight<8>(hn::Mul(hn::Sub(c, luma), k)));
+  return hn::Max(hn::Min(mixed, hn::Set(di, 255)), hn::Zero(di));
+}
+
+// kSmall: 255 * |strength| rounds below 2^22. Then so does every product of a weight and the
+// strength (rounding is monotonic), and k * 255 stays below 2^30.
+template <bool kSmall>
+struct VibranceVector {
+  float strength;
+
+  HWY_INLINE VU operator()(VU p) const {
+    const DU du;
+    const DI di;
+    const DF df;
+    const VI c0 = Channel0(p), c1 = Channel1(p), c2 = Channel2(p);
+    const VI mx = hn::Max(c0, hn::Max(c1, c2));
+    const VI mn = hn::Min(c0, hn::Min(c1, c2));
+    const VI luma = hn::ShiftRight<1>(hn::Add(mx, mn));
+    // Of the three masks (channel - luma, floored at 0) the smallest is always 0 and the largest
+    // is mx - luma, so the luma of the mask is (mx - luma) >> 1.
+    const VI weight = hn::And(hn::Neg(hn::ShiftRight<1>(hn::Sub(mx, luma))), hn::Set(di, 255));
+    const VF product = hn::Mul(hn::ConvertTo(df, weight), hn::Set(df, strength));
+    if (kSmall) {
+      const VI k = SmallToInt(product);
+      return Pack(p, MixChannelSmall(c0, luma, k), MixChannelSmall(c1, luma, k),
+                  MixChannelSmall(c2, luma, k));
+    }
+    const VU k = hn::BitCast(du, TruncToInt(product));
+    return Pack(p, MixChannel(c0, luma, k), MixChannel(c1, luma, k), MixChannel(c2, luma, k));
+  }
+};
+
+// Only grey pixels can make a NaN when the gain is finite, and they are restored whole; a NaN or
+// infinite sigma needs kNanSafe.
+template <bool kIncrease, bool kNanSafe>
+struct SaturationVector {
+  float sigma;
+  float fixedGain;  // 1 / (1 - sigma) - 1, or 1 + sigma when decreasing
+
+  HWY_INLINE VU operator()(VU p) const {
+    const DU du;
+    const DF df;
+    const VI c0 = Channel0(p), c1 = Channel1(p), c2 = Channel2(p);
+    const VF f0 = hn::ConvertTo(df, c0), f1 = hn::ConvertTo(df, c1), f2 = hn::ConvertTo(df, c2);
+    const VI mx = hn::Max(c0, hn::Max(c1, c2));
+    const VI mn = hn::Min(c0, hn::Min(c1, c2));
+    const VF sum = hn::Div(hn::ConvertTo(df, hn::Add(mx, mn)), hn::Set(df, 255.0f));
+    const VF delta = hn::Div(hn::ConvertTo(df, hn::Sub(mx, mn)), hn::Set(df, 255.0f));
+    // l * 255 with l = sum / 2: halving is exact, so this rounds the same product once.
+    const VF lv = hn::Mul(sum, hn::Set(df, 127.5f));
+    VF o0, o1, o2;
+    if (kIncrease) {
+      // The per-pixel form divides by l < 0.5 ? sum : 2 - sum. Below 1, 2 - sum exceeds sum; from
+      // 1 on, it is exact and at most 1, so the smaller of the two is that divisor.
+      const VF one = hn::Set(df, 1.0f);
+      const VF s = hn::Div(delta, hn::Min(sum, hn::Sub(hn::Set(df, 2.0f), sum)));
+      const VF a = hn::IfThenElse(hn::Ge(hn::Add(s, hn::Set(df, sigma)), one),
+                                  hn::Sub(hn::Div(one, s), one), hn::Set(df, fixedGain));
+      o0 = hn::Add(f0, hn::Mul(hn::Sub(f0, lv), a));
+      o1 = hn::Add(f1, hn::Mul(hn::Sub(f1, lv), a));
+      o2 = hn::Add(f2, hn::Mul(hn::Sub(f2, lv), a));
+    } else {
+      const VF gain = hn::Set(df, fixedGain);
+      o0 = hn::Add(lv, hn::Mul(hn::Sub(f0, lv), gain));
+      o1 = hn::Add(lv, hn::Mul(hn::Sub(f1, lv), gain));
+      o2 = hn::Add(lv, hn::Mul(hn::Sub(f2, lv), gain));
+    }
+    const VU adjusted = PackByteBits(p, ByteBits(ClampToByteRange<kNanSafe>(o0)),
+                                     ByteBits(ClampToByteRange<kNanSafe>(o1)),
+                                     ByteBits(ClampToByteRange<kNanSafe>(o2)));
+    // Grey pixels are left as they are.
+    return hn::IfThenElse(hn::RebindMask(du, hn::Eq(mx, mn)), p, adjusted);
+  }
+};
+
+// ---- Rows --------------------------------------------------------------------------------------
+
+// Rows are walked in whole vectors of `d`'s lanes; the last partial vector goes through a
+// zero-padded copy, so the tail gets the same arithmetic as every other pixel.
+template <class D, class Kernel>
+HWY_INLINE void ForEachVector(D d, uint8_t* pixels, size_t count, const Kernel& kernel) {
+  using T = hn::TFromD<D>;
+  const size_t step = hn::Lanes(d) * sizeof(T);
+  const size_t bytes = count * 4;
+  size_t i = 0;
+  for (; i + step <= bytes; i += step) {
+    T* const row = reinterpret_cast<T*>(pixels + i);
+    hn::StoreU(kernel(hn::LoadU(d, row)), d, row);
+  }
+  if (i < bytes) {
+    HWY_ALIGN T tail[HWY_MAX_BYTES / sizeof(T)] = {};
+    std::memcpy(tail, pixels + i, bytes - i);
+    hn::Store(kernel(hn::Load(d, tail)), d, tail);
+    std::memcpy(pixels + i, tail, bytes - i);
+  }
+}
+
+#if HWY_TARGET == HWY_SCALAR
+// One-lane vectors have no byte shuffle to build on, so the table is read directly.
+void ApplyTableRow(uint8_t* pixels, size_t count, const uint8_t table[256]) {
+  for (size_t i = 0; i < count; ++i, pixels += 4) {
+    pixels[0] = table[pixels[0]];
+    pixels[1] = table[pixels[1]];
+    pixels[2] = table[pixels[2]];
+  }
+}
+#else
+void ApplyTableRow(uint8_t* pixels, size_t count, const uint8_t table[256]) {
+  HWY_ALIGN uint8_t chunks[256];
+  MakeChunks(table, chunks);
+  ForEachVector(D8(), pixels, count, TableVector{chunks});
+}
+#endif
+
+void VibranceRow(uint8_t* pixels, size_t count, float strength) {
+  if (std::fabs(255.0f * strength) < 4194304.0f) {
+    ForEachVector(DU(), pixels, count, VibranceVector<true>{strength});
+  } else {
+    ForEachVector(DU(), pixels, count, VibranceVector<false>{strength});
+  }
+}
+
+void SaturationRow(uint8_t* pixels, size_t count, float sigma) {
+  if (sigma >= 0.0f) {
+    const float gain = 1.0f / (1.0f - sigma) - 1.0f;
+    ForEachVector(DU(), pixels, count, SaturationVector<true, false>{sigma, gain});
+  } else if (std::isfinite(sigma)) {
+    ForEachVector(DU(), pixels, count, SaturationVector<false, false>{sigma, 1.0f + sigma});
+  } else {
+    ForEachVector(DU(), pixels, count, SaturationVector<false, true>{sigma, 1.0f + sigma});
+  }
+}
+
+const ColorAdjustRows* RowsOfThisTarget() {
+  static const ColorAdjustRows rows = {hwy::TargetName(HWY_TARGET), &ApplyTableRow, &VibranceRow,
+                                       &SaturationRow};
+  return &rows;
+}
+
+}  // namespace HWY_NAMESPACE
+}  // namespace tfx
+HWY_AFTER_NAMESPACE();
+
+#if HWY_ONCE
+namespace tfx {
+
+HWY_EXPORT(RowsOfThisTarget);
+
+namespace {
+
+// The entry of `target` in an HWY_EXPORT table, by the rule hwy::ChosenTarget applies to the
+// mask of supported targets, here holding that one target: dynamic targets in their own slots,
+// EMU128 or SCALAR in the last.
+size_t DispatchSlot(int64_t target) {
+#if (HWY_TARGETS & (HWY_TARGETS - 1)) == 0
+  static_cast<void>(target);
+  return 0;  // a single target gets a single-entry table
+#else
+  const int64_t mask = (HWY_CHOSEN_TARGET_SHIFT(target) | HWY_CHOSEN_TARGET_MASK_SCALAR) &
+                       HWY_CHOSEN_TARGET_MASK_TARGETS;
+  return hwy::Num0BitsBelowLS1Bit_Nonzero64(static_cast<uint64_t>(mask));
+#endif
+}
+
+}  // namespace
+
+const ColorAdjustRows& BestColorAdjustRows() {
+  static const ColorAdjustRows* const best = HWY_DYNAMIC_DISPATCH(RowsOfThisTarget)();
+  return *best;
+}
+
+std::vector<const ColorAdjustRows*> SupportedColorAdjustRows() {
+  // The targets of hwy::SupportedAndGeneratedTargets(), best (lowest bit) first, walked here
+  // because its std::vector<int64_t> would be instantiated with default visibility and exported.
+  std::vector<const ColorAdjustRows*> rows;
+  for (int64_t targets = hwy::SupportedTargets() & HWY_TARGETS; targets != 0;
+       targets &= targets - 1) {
+    const int64_t target = targets & ~(targets - 1);
+    rows.push_back(HWY_DISPATCH_TABLE(RowsOfThisTarget)[DispatchSlot(target)]());
+  }
+  return rows;
+}
+
+}  // namespace tfx
+#endif  // HWY_ONCE
