@@ -1,27 +1,12 @@
-#include <cerrno>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <new>
 
+#include "base/Assert.h"
 #include "tessarofx/CxImage.h"
 
 namespace {
-
-// Combine's size checks stop the process in release builds too, printing what glibc's assert
-// prints so that logs read the same either way.
-[[noreturn]] void FailAssertion(const char* expr, const char* file, unsigned line,
-                                const char* function) {
-#if defined(__GLIBC__)
-  std::fprintf(stderr, "%s: ", program_invocation_short_name);
-#endif
-  std::fprintf(stderr, "%s:%u: %s: Assertion `%s' failed.\n", file, line, function, expr);
-  std::fflush(stderr);
-  std::abort();
-}
-
-#define TFX_IMAGE_ASSERT(expr) \
-  ((expr) ? static_cast<void>(0) : FailAssertion(#expr, __FILE__, __LINE__, __func__))
 
 uint32_t BytesPerPixelFor(uint32_t bpp) {
   switch (bpp) {
@@ -307,13 +292,12 @@ bool CxImage::Combine(CxImage* r, CxImage* g, CxImage* b, CxImage* a, int colors
   const uint32_t rh = r->GetHeight(), gh = g->GetHeight(), bh = b->GetHeight();
   if (a) {
     const uint32_t aw = a->GetWidth(), ah = a->GetHeight();
-    TFX_IMAGE_ASSERT((rw == gw && gw == bw && bw == aw) && (rh == gh && gh == bh && bh == ah) &&
-                     (r->GetBpp() == g->GetBpp() && g->GetBpp() == b->GetBpp() &&
-                      b->GetBpp() == a->GetBpp() && a->GetBpp() == 8));
+    TFX_ASSERT((rw == gw && gw == bw && bw == aw) && (rh == gh && gh == bh && bh == ah) &&
+               (r->GetBpp() == g->GetBpp() && g->GetBpp() == b->GetBpp() &&
+                b->GetBpp() == a->GetBpp() && a->GetBpp() == 8));
   } else {
-    TFX_IMAGE_ASSERT(
-        (rw == gw && gw == bw) && (rh == gh && gh == bh) &&
-        (r->GetBpp() == g->GetBpp() && g->GetBpp() == b->GetBpp() && b->GetBpp() == 8));
+    TFX_ASSERT((rw == gw && gw == bw) && (rh == gh && gh == bh) &&
+               (r->GetBpp() == g->GetBpp() && g->GetBpp() == b->GetBpp() && b->GetBpp() == 8));
   }
 
   Create(rw, rh, bpp, format);

@@ -2,7 +2,7 @@
 // kParamsArray[i] with kCount giving how many.
 #pragma once
 
-#include "plugin/Assert.h"
+#include "base/Assert.h"
 #include "tessarofx/NLEProperties.h"
 
 class NLEFilterInfoComPtr {
