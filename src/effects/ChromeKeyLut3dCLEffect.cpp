@@ -8,9 +8,7 @@ class NLEChromeKeyLut3dCLEffect final : public NLEBasicCrossFilter {
   static NLEBasicCrossFilter* create() { return new NLEChromeKeyLut3dCLEffect(); }
 
   HRESULT InitFilter(INLECGDevice* device, const std::string& programPath) override {
-    const HRESULT hr = NLEBasicCrossFilter::InitFilter(device, programPath);
-    if (hr == NLE_E_RESOURCE) return hr;
-    return InitProgram("LUT", "MAIN", programPath);
+    return InitFilterWithProgram(device, programPath, "LUT", "MAIN");
   }
 };
 

@@ -8,9 +8,7 @@ class NLEOpenCL3dlutAToWhiteEffect final : public NLEBasicCrossFilter {
   static NLEBasicCrossFilter* create() { return new NLEOpenCL3dlutAToWhiteEffect(); }
 
   HRESULT InitFilter(INLECGDevice* device, const std::string& programPath) override {
-    const HRESULT hr = NLEBasicCrossFilter::InitFilter(device, programPath);
-    if (hr == NLE_E_RESOURCE) return hr;
-    return InitProgram("lutAToWhiteEffect", "lut_a_to_white_effect", programPath);
+    return InitFilterWithProgram(device, programPath, "lutAToWhiteEffect", "lut_a_to_white_effect");
   }
 };
 

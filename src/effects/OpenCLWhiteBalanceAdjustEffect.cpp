@@ -8,9 +8,7 @@ class NLEOpenCLWhiteBalanceAdjustEffect final : public NLEBasicCrossFilter {
   static NLEBasicCrossFilter* create() { return new NLEOpenCLWhiteBalanceAdjustEffect(); }
 
   HRESULT InitFilter(INLECGDevice* device, const std::string& programPath) override {
-    const HRESULT hr = NLEBasicCrossFilter::InitFilter(device, programPath);
-    if (hr == NLE_E_RESOURCE) return hr;
-    return InitProgram("WhiteBalanceAdjust", "auto_white_balance", programPath);
+    return InitFilterWithProgram(device, programPath, "WhiteBalanceAdjust", "auto_white_balance");
   }
 };
 

@@ -27,7 +27,11 @@ HRESULT NLEBasicCrossFilter::InitFilter(INLECGDevice* device, const std::string&
   return programManager_ && memoryHandle_ ? NLE_S_OK : NLE_E_RESOURCE;
 }
 
-HRESULT NLEBasicCrossFilter::InitProgram(const char*, const char*, const std::string&) {
+HRESULT NLEBasicCrossFilter::InitFilterWithProgram(INLECGDevice* device,
+                                                   const std::string& programPath, const char*,
+                                                   const char*) {
+  const HRESULT hr = NLEBasicCrossFilter::InitFilter(device, programPath);
+  if (hr == NLE_E_RESOURCE) return hr;
   // This build carries no OpenCL program loader yet, so no kernel can be made ready.
   return NLE_E_RESOURCE;
 }

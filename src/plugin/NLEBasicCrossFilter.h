@@ -37,9 +37,10 @@ class NLEBasicCrossFilter : public NLEBasicFilter {
   static OPENCL::openclMemory* GetFrameOpenCLMemory(INLEFrame* frame);
 
  protected:
-  // Builds (or finds, shared per device by name) the program and caches the kernel.
-  HRESULT InitProgram(const char* programName, const char* kernelName,
-                      const std::string& programPath);
+  // The InitFilter of every OpenCL effect: binds to the device, then builds (or finds, shared
+  // per device by name) the effect's program and caches its kernel.
+  HRESULT InitFilterWithProgram(INLECGDevice* device, const std::string& programPath,
+                                const char* programName, const char* kernelName);
 
   OPENCL::openclProgramManager* ProgramManager() const { return programManager_; }
   OPENCL::openclMemManager* MemoryHandle() const { return memoryHandle_; }
