@@ -139,21 +139,14 @@ tagRGBQUAD VibrancePixel(tagRGBQUAD c, float strength) {
   return mixLumaAndColor(c, luma, weight, strength);
 }
 
-}  // namespace
-
-CxImage* ExposureAdjust(CxImage* image, float e, const ColorAdjustRows& rows) {
-  if (!image || e == 0.0f) return image;
+void ExposureTable(float e, uint8_t table[256]) {
   // The exponent and the power in double, the gain used as float.
   const float gain = static_cast<float>(std::pow(2.0, static_cast<double>(e) / 50.0 * 0.6));
-  uint8_t table[256];
   // ScaleChannel also floors at 0, which a positive gain never reaches.
   for (int v = 0; v < 256; ++v) table[v] = ScaleChannel(v, gain);
-  ApplyTable(image, table, rows);
-  return image;
 }
 
-CxImage* BrightnessAdjust(CxImage* image, float b, const ColorAdjustRows& rows) {
-  if (!image || b == 0.0f || !image->GetBits()) return image;
+void BrightnessTable(float b, uint8_t table[256]) {
   // Positive b in float; the negative curve in double (its constants are not exact in float),
   // stored as float.
   const float k = b > 0.0f
@@ -161,10 +154,30 @@ CxImage* BrightnessAdjust(CxImage* image, float b, const ColorAdjustRows& rows) 
                       : static_cast<float>((1.0 / (static_cast<double>(b) / 253.0 + 0.99) - 1.0) *
                                            -255.0 * 0.6);
   // The sign of k, not of b, picks factor or offset: below b = -250.47 k turns positive.
-  uint8_t table[256];
   for (int v = 0; v < 256; ++v) {
     table[v] = FloatToByte(k > 0.0f ? static_cast<float>(v) * k : static_cast<float>(v) + k);
   }
+}
+
+void ContrastTable(float c, uint8_t table[256]) {
+  const ContrastLimits limits = DeriveContrast(c);
+  for (int v = 0; v < 256; ++v) table[v] = ContrastChannel(v, limits.lo, limits.hi, limits.d);
+}
+
+}  // namespace
+
+CxImage* ExposureAdjust(CxImage* image, float e, const ColorAdjustRows& rows) {
+  if (!image || e == 0.0f) return image;
+  uint8_t table[256];
+  ExposureTable(e, table);
+  ApplyTable(image, table, rows);
+  return image;
+}
+
+CxImage* BrightnessAdjust(CxImage* image, float b, const ColorAdjustRows& rows) {
+  if (!image || b == 0.0f || !image->GetBits()) return image;
+  uint8_t table[256];
+  BrightnessTable(b, table);
 
   uint8_t* bits = image->GetBits();
   const size_t pixels = size_t{image->GetWidth()} * image->GetHeight();
@@ -186,10 +199,31 @@ CxImage* BrightnessAdjust(CxImage* image, float b, const ColorAdjustRows& rows) 
 
 CxImage* ContrastAdjust(CxImage* image, float c, const ColorAdjustRows& rows) {
   if (!image || c == 0.0f) return image;
-  const ContrastLimits limits = DeriveContrast(c);
   uint8_t table[256];
-  for (int v = 0; v < 256; ++v) table[v] = ContrastChannel(v, limits.lo, limits.hi, limits.d);
+  ContrastTable(c, table);
   ApplyTable(image, table, rows);
+  return image;
+}
+
+CxImage* ToneAdjust(CxImage* image, float e, float b, float c, const ColorAdjustRows& rows) {
+  if (!image) return image;
+  // Brightness walks width * height pixels whatever the stride, so only unpadded rows let the
+  // three curves act as one; elsewhere they run one after the other.
+  if (!HasPackedColour(*image) || image->GetEffWidth() != image->GetWidth() * 4) {
+    return ContrastAdjust(BrightnessAdjust(ExposureAdjust(image, e, rows), b, rows), c, rows);
+  }
+  uint8_t table[256];
+  for (int v = 0; v < 256; ++v) table[v] = static_cast<uint8_t>(v);
+  uint8_t step[256];
+  const auto compose = [&](float strength, void (*build)(float, uint8_t*)) {
+    if (strength == 0.0f) return;
+    build(strength, step);
+    for (uint8_t& t : table) t = step[t];
+  };
+  compose(e, ExposureTable);
+  compose(b, BrightnessTable);
+  compose(c, ContrastTable);
+  if (e != 0.0f || b != 0.0f || c != 0.0f) ApplyTable(image, table, rows);
   return image;
 }
 

@@ -1,4 +1,5 @@
 // ColorAdjust: exposure, brightness, contrast, vibrance and saturation, in that order.
+#include "adjust/ColorAdjustRows.h"
 #include "plugin/NLEDynamicEffect.h"
 #include "tessarofx/ColorAdjust.h"
 #include "tessarofx/CxImage.h"
@@ -24,9 +25,7 @@ class NLEColorAdjustEffect final : public NLEDynamicEffect {
     myCopy(src, dst, srcWidth, srcHeight < dstHeight ? srcHeight : dstHeight, srcStride, dstStride);
     CxImage image(&dst, static_cast<unsigned>(dstWidth), static_cast<unsigned>(dstHeight), 32,
                   static_cast<unsigned>(dstStride), IPF_BGRA);
-    exposureAdjustment(&image, exposure);
-    brightnessAdjustment(&image, brightness);
-    contrastAdjustment(&image, contrast);
+    tfx::ToneAdjust(&image, exposure, brightness, contrast, tfx::BestColorAdjustRows());
     vibranceAdjustment(&image, vibrance);
     saturationAdjustment(&image, saturation);
     return 0;

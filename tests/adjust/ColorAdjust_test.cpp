@@ -243,6 +243,23 @@ TEST(ColorAdjust, MatchesReferenceForEveryWidthAndPaddedStride) {
   }
 }
 
+TEST(ColorAdjust, ToneAdjustEqualsTheThreeCurvesInTurn) {
+  // One composed table on unpadded frames, the three passes elsewhere: the bytes must not tell.
+  const float settings[][3] = {{70, -37, 61}, {0, 100, -255}, {-100, 0, 184}, {33.3f, -0.5f, 0}};
+  for (const auto& s : settings) {
+    for (unsigned pad : {0u, 8u}) {
+      SCOPED_TRACE(testing::Message() << s[0] << ' ' << s[1] << ' ' << s[2] << " pad " << pad);
+      const Image actual = NoiseImage(37, 5, 32, IPF_BGRA, 37 * 4 + pad, 11);
+      const Image expected = Clone(*actual);
+      tfx_test::ReferenceExposure(expected.get(), s[0]);
+      tfx_test::ReferenceBrightness(expected.get(), s[1]);
+      tfx_test::ReferenceContrast(expected.get(), s[2]);
+      tfx::ToneAdjust(actual.get(), s[0], s[1], s[2], tfx::BestColorAdjustRows());
+      ASSERT_TRUE(SameBuffer(*expected, *actual));
+    }
+  }
+}
+
 TEST(ColorAdjust, OtherLayoutsMatchTheAccessorReference) {
   const struct {
     unsigned bpp, effWidth;
