@@ -240,15 +240,15 @@ TEST_F(ToolTest, FailuresNameTheirCauseAndLeaveNoOutput) {
   } cases[] = {
       {"apply NoSuchFilter in.png out.png", "unknown filter 'NoSuchFilter'"},
       {"apply ColorAdjust -p u_glow=3 in.png out.png", "valid: u_exposure"},
-      {"apply HSLAdjust -p a=1 in.png out.png", "takes no parameters"},
+      {"apply ChromeKeyCombine -p a=1 in.png out.png", "takes no parameters"},
       {"apply ColorAdjust -p u_sat=12x in.png out.png", "not a number"},
       {"apply ChromeKeyLut3d -p red=1.5 in.png out.png", "not an integer"},
       {"apply ColorAdjust -p u_contrast=255 in.png out.png", "-100..100"},
       {"apply ChromeKeyLut3d -p green=256 in.png out.png", "0..255"},
       {"apply ColorAdjust none.png out.png", "none.png"},
       {"apply ColorAdjust --background wide.png in.png out.png", "9x4"},
-      // HSLAdjust has no effect yet; when it gets one, pick another unimplemented filter.
-      {"apply HSLAdjust in.png out.png", "0x80000001 (not implemented)"},
+      // ChromeKeyCombine has no effect yet; when it gets one, pick another unimplemented filter.
+      {"apply ChromeKeyCombine in.png out.png", "0x80000001 (not implemented)"},
       {"apply ColorAdjust in.png out.xyz", "unknown image format"},
       {"apply ColorAdjust in.png no/such/dir/out.png", "No such file or directory"},
       {"apply ColorAdjust in.png in.png/out.png", "Not a directory"},
