@@ -12,9 +12,11 @@ namespace {
 void PrintFunctions() {
   std::printf("Image functions (fx NAME ARG... INPUT OUTPUT):\n");
   for (const ImageFunction& fn : ImageFunctions()) {
-    const std::string range = FormatNumber(fn.min) + ".." + FormatNumber(fn.max);
-    std::printf("  %-11s %-6s %-12s %-22s %s\n      %s\n", fn.name, fn.args, range.c_str(),
-                fn.function, fn.symbol, fn.meaning);
+    std::printf("  %-18s %-22s %s\n      %s\n", fn.name, fn.function, fn.symbol, fn.meaning);
+    for (const FxArg& arg : fn.args) {
+      std::printf("      %-12s %s..%s\n", arg.name, FormatNumber(arg.min).c_str(),
+                  FormatNumber(arg.max).c_str());
+    }
   }
   std::printf("Support symbols:\n");
   for (const SupportSymbol& s : ImageSupportSymbols()) {

@@ -1,6 +1,8 @@
 #include "ImageFunctions.h"
 
+#include <memory>
 #include <new>
+#include <opencv2/imgproc.hpp>
 #include <type_traits>
 
 #include "FilterTable.h"
@@ -18,6 +20,9 @@ namespace {
 // name in the tables resolves in the built plug-in, so a changed signature cannot slip through
 // either side unnoticed.
 using ImageFloatFn = CxImage* (*)(CxImage*, float);
+using ImageLongFn = CxImage* (*)(CxImage*, long);
+using ImageFloat6Fn = CxImage* (*)(CxImage*, float, float, float, float, float, float);
+using NewImageFn = CxImage* (*)(int, int);
 static_assert(std::is_same_v<decltype(&exposureAdjustment), ImageFloatFn>);
 static_assert(std::is_same_v<decltype(&brightnessAdjustment), ImageFloatFn>);
 static_assert(std::is_same_v<decltype(&contrastAdjustment), ImageFloatFn>);
@@ -72,16 +77,36 @@ const std::vector<ImageFunction>& ImageFunctions() {
   // Ranges: where each function's arithmetic is defined. Brightness divides by b/253 + 0.99,
   // which reaches zero near -250.5; contrast divides by 1 - c/255.
   static const std::vector<ImageFunction> kFunctions = {
-      {"exposure", "exposureAdjustment", "_Z18exposureAdjustmentP7CxImagef", FxKind::kImageFloat,
-       "VALUE", -1000, 1000, "gain 2^(v*0.012): +50 = x1.52"},
-      {"brightness", "brightnessAdjustment", "_Z20brightnessAdjustmentP7CxImagef",
-       FxKind::kImageFloat, "VALUE", -250, 1000, "above 0 scales by 1+v/100, below 0 subtracts"},
-      {"contrast", "contrastAdjustment", "_Z18contrastAdjustmentP7CxImagef", FxKind::kImageFloat,
-       "VALUE", -1000, 254, "above 0 stretches away from mid grey, below 0 flattens"},
-      {"vibrance", "vibranceAdjustment", "_Z18vibranceAdjustmentP7CxImagef", FxKind::kImageFloat,
-       "VALUE", -1000, 1000, "saturates muted colours more than vivid ones"},
-      {"saturation", "saturationAdjustment", "_Z20saturationAdjustmentP7CxImagef",
-       FxKind::kImageFloat, "VALUE", -1000, 1000, "-100 gives grey, above 0 strengthens colour"},
+      {"exposure",
+       "exposureAdjustment",
+       "_Z18exposureAdjustmentP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -1000, 1000}},
+       "gain 2^(v*0.012): +50 = x1.52"},
+      {"brightness",
+       "brightnessAdjustment",
+       "_Z20brightnessAdjustmentP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -250, 1000}},
+       "above 0 scales by 1+v/100, below 0 subtracts"},
+      {"contrast",
+       "contrastAdjustment",
+       "_Z18contrastAdjustmentP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -1000, 254}},
+       "above 0 stretches away from mid grey, below 0 flattens"},
+      {"vibrance",
+       "vibranceAdjustment",
+       "_Z18vibranceAdjustmentP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -1000, 1000}},
+       "saturates muted colours more than vivid ones"},
+      {"saturation",
+       "saturationAdjustment",
+       "_Z20saturationAdjustmentP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -1000, 1000}},
+       "-100 gives grey, above 0 strengthens colour"},
   };
   return kFunctions;
 }
@@ -104,40 +129,76 @@ const ImageFunction* FindImageFunction(const std::string& name) {
 Status PrepareImageCall(const ImageFunction& fn, const std::vector<std::string>& args,
                         ImageCall* call) {
   call->function = &fn;
-  switch (fn.kind) {
-    case FxKind::kImageFloat: {
-      if (args.size() != 1) {
-        return Status::Error(std::string(fn.name) + " takes one argument: " + fn.args);
-      }
-      double v = 0;
-      if (!ParseNumber(args[0], &v)) {
-        return Status::Error("bad value '" + args[0] + "' for " + fn.name + ": not a number");
-      }
-      if (v < fn.min || v > fn.max) {
-        return Status::Error(std::string(fn.name) + " " + args[0] + " is outside its range " +
-                             FormatNumber(fn.min) + ".." + FormatNumber(fn.max));
-      }
-      call->value = static_cast<float>(v);
-      return Status::Ok();
-    }
+  call->values.clear();
+  if (args.size() != fn.args.size()) {
+    std::string synopsis;
+    for (const FxArg& arg : fn.args) synopsis += std::string(" ") + arg.name;
+    return Status::Error(std::string(fn.name) + " takes " + std::to_string(fn.args.size()) +
+                         " argument" + (fn.args.size() == 1 ? "" : "s") +
+                         (synopsis.empty() ? "" : ":" + synopsis));
   }
-  return Status::Error(std::string("unsupported function kind for ") + fn.name);
+  for (size_t i = 0; i < args.size(); ++i) {
+    const FxArg& arg = fn.args[i];
+    double v = 0;
+    if (!ParseNumber(args[i], &v)) {
+      return Status::Error("bad value '" + args[i] + "' for " + fn.name + " " + arg.name +
+                           ": not a number");
+    }
+    if (v < arg.min || v > arg.max) {
+      return Status::Error(std::string(fn.name) + " " + arg.name + " " + args[i] +
+                           " is outside its range " + FormatNumber(arg.min) + ".." +
+                           FormatNumber(arg.max));
+    }
+    call->values.push_back(v);
+  }
+  return Status::Ok();
 }
 
 Status CallImageFunction(const PluginLibrary& plugin, const ImageCall& call, cv::Mat* bgra) {
   const ImageFunction& fn = *call.function;
+  const std::vector<double>& v = call.values;
+  const auto f = [&](size_t i) { return static_cast<float>(v[i]); };
+  if (fn.kind == FxKind::kNewImage) {
+    NewImageFn create = nullptr;
+    if (Status s = Resolve(plugin, fn.symbol, &create); !s.ok()) return s;
+    // The new image belongs to the caller; its virtual destructor frees it through the plug-in.
+    std::unique_ptr<CxImage> made(create(bgra->cols, bgra->rows));
+    if (!made || !made->GetBits() || made->GetBpp() != 24) {
+      return Status::Error(std::string(fn.function) + " made no image");
+    }
+    // The maker stores blue, green, red whatever its format tag says.
+    const cv::Mat bgr(static_cast<int>(made->GetHeight()), static_cast<int>(made->GetWidth()),
+                      CV_8UC3, made->GetBits(), made->GetEffWidth());
+    cv::cvtColor(bgr, *bgra, cv::COLOR_BGR2BGRA);
+    return Status::Ok();
+  }
+
   WrapCtorFn ctor = nullptr;
   DtorFn dtor = nullptr;
   if (Status s = Resolve(plugin, kWrapCtorSymbol, &ctor); !s.ok()) return s;
   if (Status s = Resolve(plugin, kDtorSymbol, &dtor); !s.ok()) return s;
+  WrappedImage image(ctor, dtor, bgra);
   switch (fn.kind) {
     case FxKind::kImageFloat: {
-      ImageFloatFn f = nullptr;
-      if (Status s = Resolve(plugin, fn.symbol, &f); !s.ok()) return s;
-      WrappedImage image(ctor, dtor, bgra);
-      f(image.image(), call.value);
+      ImageFloatFn call1 = nullptr;
+      if (Status s = Resolve(plugin, fn.symbol, &call1); !s.ok()) return s;
+      call1(image.image(), f(0));
       return Status::Ok();
     }
+    case FxKind::kImageLong: {
+      ImageLongFn callLong = nullptr;
+      if (Status s = Resolve(plugin, fn.symbol, &callLong); !s.ok()) return s;
+      callLong(image.image(), static_cast<long>(v[0]));
+      return Status::Ok();
+    }
+    case FxKind::kImageFloat6: {
+      ImageFloat6Fn call6 = nullptr;
+      if (Status s = Resolve(plugin, fn.symbol, &call6); !s.ok()) return s;
+      call6(image.image(), f(0), f(1), f(2), f(3), f(4), f(5));
+      return Status::Ok();
+    }
+    case FxKind::kNewImage:
+      break;
   }
   return Status::Error(std::string("unsupported function kind for ") + fn.name);
 }

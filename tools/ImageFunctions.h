@@ -14,7 +14,18 @@ namespace tfxtool {
 
 // How a function is called; each kind has one pointer type in ImageFunctions.cpp.
 enum class FxKind {
-  kImageFloat,  // CxImage* f(CxImage*, float), in place
+  kImageFloat,   // CxImage* f(CxImage*, float), in place
+  kImageLong,    // CxImage* f(CxImage*, long), in place
+  kImageFloat6,  // CxImage* f(CxImage*, float, float, float, float, float, float), in place
+  kNewImage,     // CxImage* f(int width, int height): a new image of the input's size
+};
+
+// One numeric argument: its name in the usage text and the range where the function's
+// arithmetic is defined.
+struct FxArg {
+  const char* name;
+  double min;
+  double max;
 };
 
 struct ImageFunction {
@@ -22,10 +33,7 @@ struct ImageFunction {
   const char* function;  // the exported function, also accepted on the command line
   const char* symbol;    // its mangled name in the plug-in
   FxKind kind;
-  const char* args;  // argument synopsis for the usage text
-  // Accepted argument range: where the function's arithmetic is defined.
-  double min;
-  double max;
+  std::vector<FxArg> args;  // in call order
   const char* meaning;
 };
 
@@ -43,7 +51,7 @@ const std::vector<SupportSymbol>& ImageSupportSymbols();
 // A function with its arguments parsed and checked, ready to call.
 struct ImageCall {
   const ImageFunction* function = nullptr;
-  float value = 0;  // FxKind::kImageFloat
+  std::vector<double> values;  // one per argument, checked against its range
 };
 
 Status PrepareImageCall(const ImageFunction& fn, const std::vector<std::string>& args,
