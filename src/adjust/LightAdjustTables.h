@@ -1,0 +1,25 @@
+// The light adjustments as the effect runs them: all four in one call, folded into one table pass
+// where that gives the same bytes as the four image functions in turn.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+#include "tessarofx/CxImage.h"
+
+namespace tfx {
+
+// A light table maps a channel c of a pixel whose brightest channel is M to table[M * 256 + c];
+// only the entries with c <= M are meaningful.
+inline constexpr size_t kLightTableSize = 256 * 256;
+
+// hdrHighlight(h), hdrShadow(s), hdrWhiteLevel(w), hdrBlackLevel(k0) in that order.
+CxImage* LightAdjust(CxImage* image, float h, float s, float w, float k0);
+
+// Composes the four operations into one light table. Each operation weighs a pixel by its
+// brightest channel after the previous ones, which one table can only know when no operation lets
+// a darker channel overtake the brightest; otherwise this returns false and LightAdjust runs the
+// operations one by one.
+bool FoldLightAdjust(float h, float s, float w, float k0, uint8_t* table);
+
+}  // namespace tfx

@@ -1,0 +1,259 @@
+#include "tessarofx/LightAdjust.h"
+
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <cstring>
+#include <limits>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "adjust/ColorAdjustReference.h"
+#include "adjust/LightAdjustReference.h"
+#include "adjust/LightAdjustTables.h"
+
+namespace {
+
+using tfx_test::NoiseBytes;
+using tfx_test::SameBuffer;
+using Image = std::unique_ptr<CxImage>;
+
+struct Operation {
+  const char* name;
+  CxImage* (*exported)(CxImage*, float);
+  void (*reference)(CxImage*, float);
+  tagRGBQUAD (*perPixel)(tagRGBQUAD, float);
+  float up, down;  // the per-pixel argument is strength / 100 times `up` (strength > 0) or `down`
+};
+
+const Operation kHighlight = {"Highlight",  hdrHighlight, tfx_test::ReferenceHighlight,
+                              calHighlight, 1.0f,         1.0f};
+const Operation kShadow = {"Shadow", hdrShadow, tfx_test::ReferenceShadow, calShadow, 2.0f, 0.5f};
+const Operation kWhiteLevel = {"WhiteLevel",       hdrWhiteLevel, tfx_test::ReferenceWhiteLevel,
+                               calWhiteLevelPixel, 1.0f,          1.0f};
+const Operation kBlackLevel = {"BlackLevel",       hdrBlackLevel, tfx_test::ReferenceBlackLevel,
+                               calBlackLevelPixel, 0.5f,          2.0f};
+const Operation* const kOperations[] = {&kHighlight, &kShadow, &kWhiteLevel, &kBlackLevel};
+
+Image Clone(const CxImage& src) {
+  Image copy = std::make_unique<CxImage>();
+  copy->Copy(src);
+  return copy;
+}
+
+// Noise in every byte, padding included; strides beyond Create()'s padding come from wrapping.
+Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
+                 unsigned effWidth, uint32_t salt) {
+  std::vector<uint8_t> frame(size_t{effWidth} * height);
+  uint8_t* bits = frame.data();
+  Image image = Clone(CxImage(&bits, width, height, bpp, effWidth, format));
+  const std::vector<uint8_t> noise = NoiseBytes(image->GetSize(), salt);
+  std::memcpy(image->GetBits(), noise.data(), noise.size());
+  return image;
+}
+
+// Every 24-bit colour once, 4096 wide, with an alpha that varies independently. Sanitizer builds
+// take every seventh colour.
+const CxImage& EveryColour() {
+#if defined(TFX_SANITIZE_BUILD)
+  constexpr uint32_t kStep = 7;
+#else
+  constexpr uint32_t kStep = 1;
+#endif
+  static const Image image = [] {
+    const uint32_t count = ((1u << 24) + kStep - 1) / kStep;
+    Image all = std::make_unique<CxImage>(4096, (count + 4095) / 4096, 32, IPF_BGRA);
+    uint8_t* p = all->GetBits();
+    for (uint32_t i = 0; i < all->GetWidth() * all->GetHeight(); ++i, p += 4) {
+      const uint32_t colour = (i * kStep) & 0xffffff;
+      const uint8_t pixel[4] = {uint8_t(colour), uint8_t(colour >> 8), uint8_t(colour >> 16),
+                                uint8_t((i * 2654435761u) >> 24)};
+      std::memcpy(p, pixel, 4);
+    }
+    return all;
+  }();
+  return *image;
+}
+
+struct SweepCase {
+  const Operation* op;
+  float strength;
+  const char* label;
+};
+
+void PrintTo(const SweepCase& c, std::ostream* os) { *os << c.label; }
+
+class LightAllColours : public testing::TestWithParam<SweepCase> {};
+
+TEST_P(LightAllColours, MatchesReference) {
+  const SweepCase& c = GetParam();
+  const Image expected = Clone(EveryColour());
+  c.op->reference(expected.get(), c.strength);
+  const Image actual = Clone(EveryColour());
+  EXPECT_EQ(c.op->exported(actual.get(), c.strength), actual.get());
+  EXPECT_TRUE(SameBuffer(*expected, *actual));
+}
+
+// Both signs and the usual extremes; beyond them highlight 300 and shadow 250 leave 0..255 and
+// wrap, white level 250 and black level -180 clamp.
+INSTANTIATE_TEST_SUITE_P(LightAdjust, LightAllColours,
+                         testing::Values(SweepCase{&kHighlight, 100, "Highlight_100"},
+                                         SweepCase{&kHighlight, -100, "Highlight_minus100"},
+                                         SweepCase{&kHighlight, 37, "Highlight_37"},
+                                         SweepCase{&kHighlight, 300, "Highlight_300"},
+                                         SweepCase{&kShadow, 100, "Shadow_100"},
+                                         SweepCase{&kShadow, -100, "Shadow_minus100"},
+                                         SweepCase{&kShadow, -41.5f, "Shadow_minus41_5"},
+                                         SweepCase{&kShadow, 250, "Shadow_250"},
+                                         SweepCase{&kWhiteLevel, 100, "WhiteLevel_100"},
+                                         SweepCase{&kWhiteLevel, -100, "WhiteLevel_minus100"},
+                                         SweepCase{&kWhiteLevel, 63, "WhiteLevel_63"},
+                                         SweepCase{&kWhiteLevel, 250, "WhiteLevel_250"},
+                                         SweepCase{&kBlackLevel, 100, "BlackLevel_100"},
+                                         SweepCase{&kBlackLevel, -100, "BlackLevel_minus100"},
+                                         SweepCase{&kBlackLevel, 29, "BlackLevel_29"},
+                                         SweepCase{&kBlackLevel, -180, "BlackLevel_minus180"}),
+                         [](const testing::TestParamInfo<SweepCase>& p) {
+                           return std::string(p.param.label);
+                         });
+
+TEST(LightAdjust, OnePassEqualsTheFourOperationsInTurn) {
+  // The folded table must not tell from four passes, and settings whose operations let a darker
+  // channel overtake the brightest one must take the four passes.
+  const struct {
+    float h, s, w, k0;
+    bool folds;
+  } cases[] = {{100, 100, 100, 100, true},
+               {-100, -100, -100, -100, true},
+               {45, -20, 0, 70, true},
+               {300, 0, 40, -60, false}};
+  std::vector<uint8_t> table(tfx::kLightTableSize);
+  for (const auto& c : cases) {
+    SCOPED_TRACE(testing::Message() << c.h << ' ' << c.s << ' ' << c.w << ' ' << c.k0);
+    EXPECT_EQ(tfx::FoldLightAdjust(c.h, c.s, c.w, c.k0, table.data()), c.folds);
+    const Image expected = Clone(EveryColour());
+    tfx_test::ReferenceHighlight(expected.get(), c.h);
+    tfx_test::ReferenceShadow(expected.get(), c.s);
+    tfx_test::ReferenceWhiteLevel(expected.get(), c.w);
+    tfx_test::ReferenceBlackLevel(expected.get(), c.k0);
+    const Image actual = Clone(EveryColour());
+    EXPECT_EQ(tfx::LightAdjust(actual.get(), c.h, c.s, c.w, c.k0), actual.get());
+    EXPECT_TRUE(SameBuffer(*expected, *actual));
+  }
+}
+
+TEST(LightAdjust, MatchesReferenceOnPaddedRowsAndOtherLayouts) {
+  const struct {
+    unsigned width, bpp, effWidth;
+    _ImagePixelFormat format;
+  } layouts[] = {{1, 32, 4, IPF_BGRA},  {7, 32, 40, IPF_BGRA}, {13, 32, 56, IPF_RGBA},
+                 {13, 24, 40, IPF_BGR}, {13, 24, 40, IPF_RGB}, {13, 16, 28, IPF_RGB},
+                 {13, 8, 16, IPF_Gray8}};
+  for (const auto& layout : layouts) {
+    for (const Operation* op : kOperations) {
+      SCOPED_TRACE(testing::Message()
+                   << op->name << ' ' << layout.bpp << " bpp, width " << layout.width);
+      const Image actual =
+          NoiseImage(layout.width, 5, layout.bpp, layout.format, layout.effWidth, 9);
+      const Image expected = Clone(*actual);
+      op->reference(expected.get(), 70);
+      EXPECT_EQ(op->exported(actual.get(), 70), actual.get());
+      EXPECT_TRUE(SameBuffer(*expected, *actual));
+    }
+    // All four at once: 16-bit pixels lose bits on every write, which one pass would skip.
+    SCOPED_TRACE(testing::Message() << "all four, " << layout.bpp << " bpp");
+    const Image actual = NoiseImage(layout.width, 5, layout.bpp, layout.format, layout.effWidth, 4);
+    const Image expected = Clone(*actual);
+    tfx_test::ReferenceHighlight(expected.get(), 70);
+    tfx_test::ReferenceShadow(expected.get(), -40);
+    tfx_test::ReferenceWhiteLevel(expected.get(), 30);
+    tfx_test::ReferenceBlackLevel(expected.get(), -55);
+    tfx::LightAdjust(actual.get(), 70, -40, 30, -55);
+    EXPECT_TRUE(SameBuffer(*expected, *actual));
+  }
+}
+
+TEST(LightAdjust, LeavesImageUntouchedAtZeroStrengthOrWithoutPixels) {
+  const Image image = NoiseImage(9, 4, 32, IPF_BGRA, 36, 3);
+  const Image original = Clone(*image);
+  CxImage empty;
+  uint8_t* none = nullptr;
+  CxImage headerOnly(&none, 8, 8, 32, 32, IPF_BGRA);
+  for (const Operation* op : kOperations) {
+    SCOPED_TRACE(op->name);
+    EXPECT_EQ(op->exported(image.get(), 0.0f), image.get());
+    EXPECT_EQ(op->exported(nullptr, 50.0f), nullptr);
+    EXPECT_EQ(op->exported(&empty, 50.0f), &empty);
+    EXPECT_EQ(op->exported(&headerOnly, 50.0f), &headerOnly);
+  }
+  EXPECT_EQ(tfx::LightAdjust(image.get(), 0, 0, 0, 0), image.get());
+  EXPECT_TRUE(SameBuffer(*original, *image));
+  EXPECT_EQ(tfx::LightAdjust(nullptr, 10, 10, 10, 10), nullptr);
+  EXPECT_EQ(tfx::LightAdjust(&headerOnly, 10, 10, 10, 10), &headerOnly);
+}
+
+TEST(LightAdjust, ImageFunctionsScaleStrengthAsThePerPixelFormsExpect) {
+  // Shadow lifts four times as strongly as it deepens, black level the other way round. Absurd
+  // strengths overflow the curve; the tables must still give the per-pixel bytes.
+  constexpr float kInf = std::numeric_limits<float>::infinity();
+  const float strengths[] = {100, -100, 55, 1e30f, -kInf, std::numeric_limits<float>::quiet_NaN()};
+  const Image noise = NoiseImage(61, 17, 32, IPF_BGRA, 61 * 4, 21);
+  for (const Operation* op : kOperations) {
+    for (const float strength : strengths) {
+      SCOPED_TRACE(testing::Message() << op->name << ' ' << strength);
+      const Image actual = Clone(*noise);
+      op->exported(actual.get(), strength);
+      const float arg = strength / 100.0f * (strength > 0 ? op->up : op->down);
+      const Image expected = Clone(*noise);
+      for (unsigned long y = 0; y < 17; ++y) {
+        for (unsigned long x = 0; x < 61; ++x) {
+          expected->SetPixelColor(x, y, op->perPixel(expected->GetPixelColor(x, y), arg));
+        }
+      }
+      EXPECT_TRUE(SameBuffer(*expected, *actual));
+    }
+  }
+}
+
+TEST(LightAdjust, FollowsTheCurveAtItsLandmarks) {
+  const struct {
+    const Operation* op;
+    float strength;
+    int in, out;
+  } cases[] = {
+      // 255 - 127 * (255 - 128 * 128 / 255) / 255 = 159.9995
+      {&kHighlight, 100, 128, 159},
+      // White level lifts twice (159.9995, then 189.92) but lowers once.
+      {&kWhiteLevel, 100, 128, 189},
+      {&kWhiteLevel, -100, 128, 96},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(testing::Message() << c.op->name << ' ' << c.strength << " at " << c.in);
+    const uint8_t v = static_cast<uint8_t>(c.in);
+    CxImage image(1, 1, 32, IPF_BGRA);
+    image.SetPixelColor(0, 0, tagRGBQUAD{v, v, v, 200});
+    c.op->exported(&image, c.strength);
+    const tagRGBQUAD out = image.GetPixelColor(0, 0, true);
+    EXPECT_EQ(out.rgbBlue, c.out);
+    EXPECT_EQ(out.rgbRed, c.out);
+    EXPECT_EQ(out.rgbReserved, 200);
+  }
+  // E(100, 5) = 403.9: the byte form keeps the low 8 bits (403 & 255) rather than clamping.
+  EXPECT_EQ(enHanceColor(100, 5), 147);
+  // Black and full channels are fixed points of every operation.
+  for (const Operation* op : kOperations) {
+    for (const float strength : {100.0f, -100.0f}) {
+      SCOPED_TRACE(testing::Message() << op->name << ' ' << strength);
+      CxImage image(2, 1, 32, IPF_BGRA);
+      image.SetPixelColor(0, 0, tagRGBQUAD{0, 90, 200, 7});
+      image.SetPixelColor(1, 0, tagRGBQUAD{255, 255, 255, 7});
+      op->exported(&image, strength);
+      EXPECT_EQ(image.GetPixelColor(0, 0, true).rgbBlue, 0);
+      const tagRGBQUAD white = image.GetPixelColor(1, 0, true);
+      EXPECT_EQ(white.rgbBlue + white.rgbGreen + white.rgbRed, 3 * 255);
+    }
+  }
+}
+
+}  // namespace
