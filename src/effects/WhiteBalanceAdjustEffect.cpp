@@ -1,13 +1,37 @@
 // WhiteBalanceAdjust: temperature, tint and per-channel gains.
+#include <opencv2/core.hpp>
+
 #include "effects/EffectParams.h"
 #include "plugin/NLEDynamicEffect.h"
+#include "tessarofx/WhiteBalance.h"
+
 namespace {
 
-// The pixel work of this effect is not part of this build: Transform keeps the base answer
-// (not implemented), so hosts see a clean failure rather than an unchanged frame.
 class NLEWhiteBalanceAdjustEffect final : public NLEDynamicEffect {
  public:
   static NLEDynamicEffect* create() { return new NLEWhiteBalanceAdjustEffect(); }
+
+  // Reads the foreground and writes every destination byte itself, so there is no copy step.
+  // Both frames are taken as packed rows of width * 4 bytes, which is how the pipeline hands
+  // them over.
+  int Transform(uint8_t* dst, int dstWidth, int dstHeight, int, const uint8_t*, int, int, int,
+                const uint8_t* src, int srcWidth, int srcHeight, int) override {
+    if (!dst || !src) return NLE_E_INVALIDARG;
+    const double temperature = ParamDouble(L"u_temperature");
+    const double tint = ParamDouble(L"u_tint");
+    const ColorGain gain{static_cast<float>(ParamDouble(L"u_rgain", 1.0)),
+                         static_cast<float>(ParamDouble(L"u_ggain", 1.0)),
+                         static_cast<float>(ParamDouble(L"u_bgain", 1.0))};
+    if (dstWidth <= 0 || dstHeight <= 0 || srcWidth <= 0 || srcHeight <= 0) return 0;
+    cv::Mat in(srcHeight, srcWidth, CV_8UC4, const_cast<uint8_t*>(src));
+    cv::Mat out(dstHeight, dstWidth, CV_8UC4, dst);
+    balance_.Process(in, out, gain, static_cast<float>(temperature / 200.0),
+                     static_cast<float>(tint / 200.0));
+    return 0;
+  }
+
+ private:
+  AdjustWhiteBalance balance_;
 };
 
 const NLEWhiteBalanceAdjustEffect::_auto_register s_register(

@@ -1,0 +1,424 @@
+#include "tessarofx/WhiteBalance.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <climits>
+#include <cmath>
+#include <cstdint>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+#include <opencv2/core.hpp>
+#include <ostream>
+#include <string>
+#include <vector>
+
+#include "adjust/ColorAdjustReference.h"
+
+namespace {
+
+using tfx_test::NoiseBytes;
+using tfx_test::SameBuffer;
+using Image = std::unique_ptr<CxImage>;
+
+// ---- plain per-pixel forms, written from the formulas and run through the accessors ----------
+
+uint8_t RefClamp(double v) { return static_cast<uint8_t>(v < 0 ? 0 : v > 255 ? 255 : int(v)); }
+
+tagRGBQUAD RefBlackBody(long kelvin) {
+  const double x = kelvin < 1000 ? 10.0 : (kelvin > 40000 ? 40000 : kelvin) / 100.0;
+  const auto unit = [](double v) { return v < 0 ? 0.0 : v > 1 ? 1.0 : v; };
+  double r = 255, g, b;
+  if (x <= 66) {
+    g = unit(std::log(x) * 0.3900815787690196 - 0.6318414437886275) * 255;
+  } else {
+    r = unit(1.292936186062745 * std::pow(x - 60, -0.1332047592)) * 255;
+    g = unit(1.1298908608952942 * std::pow(x - 60, -0.0755148492)) * 255;
+  }
+  if (x >= 66) {
+    b = 255;
+  } else if (x <= 19) {
+    b = 0;
+  } else {
+    b = unit(std::log(x - 10) * 0.543206789110196 - 1.19625408914) * 255;
+  }
+  return tagRGBQUAD{uint8_t(int(b)), uint8_t(int(g)), uint8_t(int(r)), 0};
+}
+
+void RefTemperature(CxImage* image, long t) {
+  if (t == 11500) return;
+  const long k = t < 11500 ? 26000 - t : std::max(18100 - t, 1700L);
+  const tagRGBQUAD tc = RefBlackBody(k);
+  const float tr = tc.rgbRed / 255.0f, tg = tc.rgbGreen / 255.0f, tb = tc.rgbBlue / 255.0f;
+  const float w = float(std::fabs(1.0 - k / 11500.0) * 1.7);
+  const auto mix = [&](int ch, float tch) {
+    const int m = uint8_t(int(ch / 255.0f * tch * 255.0f));
+    return RefClamp(m * w + ch * (1.0f - w));
+  };
+  for (unsigned long y = 0; y < image->GetHeight(); ++y) {
+    for (unsigned long x = 0; x < image->GetWidth(); ++x) {
+      const tagRGBQUAD c = image->GetPixelColor(x, y, true);
+      const tagRGBQUAD m{mix(c.rgbBlue, tb), mix(c.rgbGreen, tg), mix(c.rgbRed, tr), 0};
+      tagRGBQUAD hsl = CxImage::RGBtoHSL(m);
+      hsl.rgbBlue = uint8_t((std::max({c.rgbRed, c.rgbGreen, c.rgbBlue}) +
+                             std::min({c.rgbRed, c.rgbGreen, c.rgbBlue})) >>
+                            1);
+      tagRGBQUAD out = CxImage::HSLtoRGB(hsl);
+      out.rgbReserved = c.rgbReserved;
+      image->SetPixelColor(x, y, out);
+    }
+  }
+}
+
+void RefTint(CxImage* image, float t) {
+  if (t == 0) return;
+  const int k = int(t * 100) >> 8;
+  for (unsigned long y = 0; y < image->GetHeight(); ++y) {
+    for (unsigned long x = 0; x < image->GetWidth(); ++x) {
+      tagRGBQUAD c = image->GetPixelColor(x, y, true);
+      const int luma = (117 * c.rgbBlue + 601 * c.rgbGreen + 306 * c.rgbRed) >> 10;
+      c.rgbRed = ClampToByte(c.rgbRed + ((luma * k) >> 8));
+      c.rgbBlue = ClampToByte(c.rgbBlue + ((luma * k) >> 8));
+      c.rgbGreen = ClampToByte(c.rgbGreen + ((luma * -k) >> 8));
+      image->SetPixelColor(x, y, c);
+    }
+  }
+}
+
+void RefWhiteBalance(CxImage* image, float v) {
+  if (v == 0) return;
+  const float ratio = v / 500;
+  const unsigned w = image->GetWidth(), h = image->GetHeight();
+  std::vector<int> hist(768), sums(size_t{w} * h);
+  for (unsigned y = 0; y < h; ++y) {
+    for (unsigned x = 0; x < w; ++x) {
+      const tagRGBQUAD c = image->GetPixelColor(x, y, true);
+      sums[y * w + x] = c.rgbBlue + c.rgbGreen + c.rgbRed;
+      ++hist[sums[y * w + x]];
+    }
+  }
+  int threshold = 0, running = 0;
+  for (int i = 767; i >= 0; --i) {
+    running += hist[i];
+    if (float(running) > ratio * float(w) * float(h)) {
+      threshold = i;
+      break;
+    }
+  }
+  long long r = 0, g = 0, b = 0, n = 0;
+  for (unsigned y = 0; y < h; ++y) {
+    for (unsigned x = 0; x < w; ++x) {
+      if (sums[y * w + x] <= threshold) continue;
+      const tagRGBQUAD c = image->GetPixelColor(x, y, true);
+      r += c.rgbRed, g += c.rgbGreen, b += c.rgbBlue, ++n;
+    }
+  }
+  const long long ar = r ? r / n : 0, ag = g ? g / n : 0, ab = b ? b / n : 0;
+  const auto scale = [](int ch, long long avg) {
+    return uint8_t(avg == 0 ? ch : std::min<long long>(ch * 255 / avg, 255));
+  };
+  for (unsigned y = 0; y < h; ++y) {
+    for (unsigned x = 0; x < w; ++x) {
+      tagRGBQUAD c = image->GetPixelColor(x, y, true);
+      c.rgbRed = scale(c.rgbRed, ar), c.rgbGreen = scale(c.rgbGreen, ag);
+      c.rgbBlue = scale(c.rgbBlue, ab);
+      image->SetPixelColor(x, y, c);
+    }
+  }
+}
+
+// ---- images ----------------------------------------------------------------------------------
+
+Image Clone(const CxImage& src) {
+  Image copy = std::make_unique<CxImage>();
+  copy->Copy(src);
+  return copy;
+}
+
+Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
+                 unsigned effWidth, uint32_t salt) {
+  std::vector<uint8_t> frame(size_t{effWidth} * height);
+  uint8_t* bits = frame.data();
+  Image image = Clone(CxImage(&bits, width, height, bpp, effWidth, format));
+  const std::vector<uint8_t> noise = NoiseBytes(image->GetSize(), salt);
+  std::memcpy(image->GetBits(), noise.data(), noise.size());
+  return image;
+}
+
+// Every 24-bit colour once in a 4096-wide BGRA image, with an alpha varying independently.
+// Sanitizer builds take every seventh colour.
+const CxImage& EveryColour() {
+#if defined(TFX_SANITIZE_BUILD)
+  constexpr uint32_t kStep = 7;
+#else
+  constexpr uint32_t kStep = 1;
+#endif
+  static const Image image = [] {
+    const uint32_t count = ((1u << 24) + kStep - 1) / kStep;
+    Image all = std::make_unique<CxImage>(4096, (count + 4095) / 4096, 32, IPF_BGRA);
+    uint8_t* p = all->GetBits();
+    for (uint32_t i = 0; i < all->GetWidth() * all->GetHeight(); ++i, p += 4) {
+      const uint32_t colour = (i * kStep) & 0xffffff;
+      const uint8_t pixel[4] = {uint8_t(colour), uint8_t(colour >> 8), uint8_t(colour >> 16),
+                                uint8_t((i * 2654435761u) >> 24)};
+      std::memcpy(p, pixel, 4);
+    }
+    return all;
+  }();
+  return *image;
+}
+
+// ---- the three image functions against their per-pixel forms ---------------------------------
+
+struct Operation {
+  const char* name;
+  void (*run)(CxImage*, double);
+  void (*reference)(CxImage*, double);
+  double typical;
+};
+
+const Operation kTemperature = {"Temperature",
+                                [](CxImage* i, double t) { temperatureAdjustment(i, long(t)); },
+                                [](CxImage* i, double t) { RefTemperature(i, long(t)); }, 4000};
+const Operation kTint = {"Tint", [](CxImage* i, double t) { tintAdjustment(i, float(t)); },
+                         [](CxImage* i, double t) { RefTint(i, float(t)); }, -37};
+const Operation kBalance = {"WhiteBalance",
+                            [](CxImage* i, double v) { whiteBalanceAdjustment(i, float(v)); },
+                            [](CxImage* i, double v) { RefWhiteBalance(i, float(v)); }, 40};
+const Operation* const kOperations[] = {&kTemperature, &kTint, &kBalance};
+
+struct SweepCase {
+  const Operation* op;
+  double strength;
+  const char* label;
+};
+
+void PrintTo(const SweepCase& c, std::ostream* os) { *os << c.label; }
+
+class WhiteBalanceSweep : public testing::TestWithParam<SweepCase> {};
+
+TEST_P(WhiteBalanceSweep, MatchesThePerPixelForm) {
+  const SweepCase& c = GetParam();
+  const Image expected = Clone(EveryColour());
+  c.op->reference(expected.get(), c.strength);
+  const Image actual = Clone(EveryColour());
+  c.op->run(actual.get(), c.strength);
+  EXPECT_TRUE(SameBuffer(*expected, *actual));
+}
+
+// Temperature: far below neutral (K above 40000 and a weight above 1.7), both sides of the jump
+// at 11500, and the 1700 K floor. Tint: the range ends and a negative k whose shifts round
+// differently for red and green.
+// Balance: a sliver of the brightest colours and most of them.
+INSTANTIATE_TEST_SUITE_P(
+    EveryColour, WhiteBalanceSweep,
+    testing::Values(SweepCase{&kTemperature, -30000, "Temperature_minus30000"},
+                    SweepCase{&kTemperature, 11499, "Temperature_11499"},
+                    SweepCase{&kTemperature, 11501, "Temperature_11501"},
+                    SweepCase{&kTemperature, 40000, "Temperature_40000"},
+                    SweepCase{&kTint, 100, "Tint_100"}, SweepCase{&kTint, -100, "Tint_minus100"},
+                    SweepCase{&kTint, -41.3, "Tint_minus41_3"},
+                    SweepCase{&kBalance, 1, "Balance_1"}, SweepCase{&kBalance, 450, "Balance_450"}),
+    [](const testing::TestParamInfo<SweepCase>& p) { return std::string(p.param.label); });
+
+TEST(WhiteBalance, OtherLayoutsAndPaddedRowsMatchThePerPixelForm) {
+  const struct {
+    unsigned bpp, effWidth;
+    _ImagePixelFormat format;
+  } layouts[] = {{32, 76, IPF_BGRA}, {32, 56, IPF_RGBA}, {24, 40, IPF_BGR},
+                 {24, 40, IPF_RGB},  {16, 28, IPF_RGB},  {8, 16, IPF_Gray8}};
+  for (const auto& layout : layouts) {
+    for (const Operation* op : kOperations) {
+      SCOPED_TRACE(testing::Message() << op->name << ' ' << layout.bpp << " bpp");
+      const Image actual = NoiseImage(13, 5, layout.bpp, layout.format, layout.effWidth, 9);
+      const Image expected = Clone(*actual);
+      op->reference(expected.get(), op->typical);
+      op->run(actual.get(), op->typical);
+      EXPECT_TRUE(SameBuffer(*expected, *actual));
+    }
+  }
+}
+
+TEST(WhiteBalance, NeutralStrengthsAndMissingPixelsChangeNothing) {
+  const Image image = NoiseImage(9, 4, 32, IPF_BGRA, 36, 3);
+  const Image original = Clone(*image);
+  EXPECT_EQ(temperatureAdjustment(image.get(), 11500), image.get());
+  EXPECT_EQ(tintAdjustment(image.get(), 0.0f), image.get());
+  EXPECT_EQ(whiteBalanceAdjustment(image.get(), 0.0f), image.get());
+  // Negative v: the threshold lands on the top sum, above which nothing lies.
+  EXPECT_EQ(whiteBalanceAdjustment(image.get(), -20.0f), image.get());
+  EXPECT_TRUE(SameBuffer(*original, *image));
+
+  CxImage empty;
+  uint8_t* none = nullptr;
+  CxImage headerOnly(&none, 8, 8, 32, 32, IPF_BGRA);
+  for (CxImage* target : {static_cast<CxImage*>(nullptr), &empty, &headerOnly}) {
+    EXPECT_EQ(temperatureAdjustment(target, 3000), target);
+    EXPECT_EQ(tintAdjustment(target, 50.0f), target);
+    EXPECT_EQ(whiteBalanceAdjustment(target, 50.0f), target);
+  }
+}
+
+TEST(WhiteBalance, BalanceLeavesBlackAndScalesTheBrightestToWhite) {
+  CxImage black(6, 3, 32, IPF_BGRA);
+  std::memset(black.GetBits(), 0, black.GetSize());
+  whiteBalanceAdjustment(&black, 100.0f);
+  for (uint32_t i = 0; i < black.GetSize(); ++i) ASSERT_EQ(black.GetBits()[i], 0);
+
+  // Sums 600, 300, 150, 30. v = 150 asks for 0.3 of 4 pixels: the count from the top first
+  // exceeds 1.2 at 300, and only sums above that index are averaged, so the top pixel alone
+  // sets the averages (blue 250, green 200, red 150).
+  CxImage image(4, 1, 32, IPF_BGRA);
+  const tagRGBQUAD pixels[] = {
+      {250, 200, 150, 9}, {100, 100, 100, 8}, {50, 50, 50, 7}, {10, 10, 10, 6}};
+  for (int x = 0; x < 4; ++x) image.SetPixelColor(x, 0, pixels[x]);
+  whiteBalanceAdjustment(&image, 150.0f);
+  const tagRGBQUAD top = image.GetPixelColor(0, 0, true);
+  EXPECT_EQ(top.rgbBlue, 255);
+  EXPECT_EQ(top.rgbGreen, 255);
+  EXPECT_EQ(top.rgbRed, 255);
+  EXPECT_EQ(top.rgbReserved, 9);
+  const tagRGBQUAD grey = image.GetPixelColor(1, 0, true);
+  EXPECT_EQ(grey.rgbBlue, 100 * 255 / 250);
+  EXPECT_EQ(grey.rgbGreen, 100 * 255 / 200);
+  EXPECT_EQ(grey.rgbRed, 100 * 255 / 150);
+}
+
+TEST(WhiteBalance, ThresholdCountsFromTheTopSum) {
+  std::vector<int> hist(768, 0);
+  hist[767] = 2;
+  hist[700] = 3;
+  hist[10] = 5;
+  // 10 pixels: 0.2 -> 2 is not exceeded until 700; 0.5 -> 5 not until 10.
+  EXPECT_EQ(calThreshold(hist.data(), 5, 2, 0.2f), 700);
+  EXPECT_EQ(calThreshold(hist.data(), 5, 2, 0.1f), 767);
+  EXPECT_EQ(calThreshold(hist.data(), 5, 2, 0.5f), 10);
+  EXPECT_EQ(calThreshold(hist.data(), 5, 2, 1.0f), 0);
+  EXPECT_EQ(calThreshold(nullptr, 5, 2, 0.2f), 0);
+}
+
+TEST(WhiteBalance, BlackBodyColoursAtTheirLandmarks) {
+  const tagRGBQUAD daylight = temperatureToRGB(6600);
+  EXPECT_EQ(daylight.rgbRed, 255);
+  EXPECT_EQ(daylight.rgbBlue, 255);
+  EXPECT_EQ(temperatureToRGB(1900).rgbBlue, 0);
+  EXPECT_EQ(temperatureToRGB(1900).rgbRed, 255);
+  const auto word = [](tagRGBQUAD c) {
+    uint32_t w;
+    std::memcpy(&w, &c, 4);
+    return w;
+  };
+  // Out of range kelvin take the ends: below 1000 is x = 10, above 40000 is 40000.
+  EXPECT_EQ(word(temperatureToRGB(999)), word(temperatureToRGB(1000)));
+  EXPECT_EQ(word(temperatureToRGB(-5)), word(temperatureToRGB(1000)));
+  EXPECT_EQ(word(temperatureToRGB(90000)), word(temperatureToRGB(40000)));
+}
+
+TEST(WhiteBalance, TemperatureJumpsAtNeutral) {
+  // One step either side of 11500 pulls towards about 14500 K (blue) and 6600 K (warm white).
+  const Image below = NoiseImage(64, 16, 32, IPF_BGRA, 256, 21);
+  const Image above = Clone(*below);
+  temperatureAdjustment(below.get(), 11499);
+  temperatureAdjustment(above.get(), 11501);
+  const auto blueOverRed = [](const CxImage& image) {
+    long sum = 0;
+    for (uint32_t i = 0; i < image.GetSize(); i += 4) {
+      sum += image.GetBits()[i] - image.GetBits()[i + 2];
+    }
+    return double(sum) / (image.GetSize() / 4);
+  };
+  EXPECT_GT(blueOverRed(*below), 5.0);
+  EXPECT_LT(blueOverRed(*above), -5.0);
+}
+
+TEST(WhiteBalance, GradientImageHoldsOneBlackBodyColourPerColumn) {
+  const std::unique_ptr<CxImage> gradient(createTemperateColor(301, 3));
+  ASSERT_NE(gradient, nullptr);
+  EXPECT_EQ(gradient->GetWidth(), 301u);
+  EXPECT_EQ(gradient->GetBpp(), 24u);
+  EXPECT_EQ(gradient->getFormat(), IPF_RGB);
+  for (unsigned y = 0; y < 3; ++y) {
+    const uint8_t* row = gradient->GetBits() + y * gradient->GetEffWidth();
+    for (int x = 0; x < 301; ++x) {
+      // Stored blue, green, red whatever the tag says.
+      const tagRGBQUAD c = RefBlackBody(30000 - 100 * x);
+      ASSERT_EQ(row[3 * x], c.rgbBlue) << x;
+      ASSERT_EQ(row[3 * x + 1], c.rgbGreen) << x;
+      ASSERT_EQ(row[3 * x + 2], c.rgbRed) << x;
+    }
+  }
+  for (const auto& size : {std::pair{0, 5}, std::pair{5, 0}, std::pair{-3, 2}}) {
+    const std::unique_ptr<CxImage> empty(createTemperateColor(size.first, size.second));
+    ASSERT_NE(empty, nullptr);
+    EXPECT_EQ(empty->GetBits(), nullptr);
+    EXPECT_EQ(empty->getFormat(), IPF_None);
+  }
+}
+
+TEST(WhiteBalance, PerPixelHelpers) {
+  const tagRGBQUAD c{10, 100, 200, 77}, t{250, 0, 100, 3};
+  tagRGBQUAD m = mixColorAndTmpColor(c, t, 0.5f);
+  EXPECT_EQ(m.rgbBlue, 130);
+  EXPECT_EQ(m.rgbGreen, 50);
+  EXPECT_EQ(m.rgbRed, 150);
+  EXPECT_EQ(m.rgbReserved, 77);
+  // Weight 2: 2 t - c, limited at both ends.
+  m = mixColorAndTmpColor(c, t, 2.0f);
+  EXPECT_EQ(m.rgbBlue, 255);
+  EXPECT_EQ(m.rgbGreen, 0);
+  EXPECT_EQ(m.rgbRed, 0);
+
+  EXPECT_EQ(luminance(tagRGBQUAD{10, 100, 201, 0}), 105);
+
+  // Y of (10, 100, 200) is (1170 + 60100 + 61200) >> 10 = 119. (119 * 40) >> 8 = 18 but
+  // (119 * -40) >> 8 = -19: the arithmetic shift rounds both down.
+  tagRGBQUAD p = calNewTintPixel(c, 40, -40, 40);
+  EXPECT_EQ(p.rgbRed, 218);
+  EXPECT_EQ(p.rgbGreen, 81);
+  EXPECT_EQ(p.rgbBlue, 28);
+  EXPECT_EQ(p.rgbReserved, 77);
+  p = calNewTintPixel(c, INT_MAX, INT_MIN, 0);
+  EXPECT_EQ(p.rgbRed, 255);
+  EXPECT_EQ(p.rgbGreen, 0);
+  EXPECT_EQ(p.rgbBlue, 10);
+
+  // t * 100 beyond the int range converts as INT_MIN, the strongest green, without overflow.
+  CxImage image(1, 1, 32, IPF_BGRA);
+  image.SetPixelColor(0, 0, tagRGBQUAD{90, 90, 90, 1});
+  tintAdjustment(&image, 1e30f);
+  p = image.GetPixelColor(0, 0, true);
+  EXPECT_EQ(p.rgbRed + p.rgbBlue, 0);
+  EXPECT_EQ(p.rgbGreen, 255);
+}
+
+// ---- the effect's balance on matrices ----------------------------------------------------------
+
+TEST(AdjustWhiteBalance, ScalesByTheTemperatureAndTintFactors) {
+  AdjustWhiteBalance balance;
+  // 3 channels, no alpha to copy; a = 0.25, b = -0.5: blue x 0.5, green x 1.5, red x 1.
+  std::vector<uint8_t> bytes = {100, 100, 100, 200, 171, 7, 0, 255, 255};
+  cv::Mat rgb(1, 3, CV_8UC3, bytes.data());
+  cv::Mat out(1, 3, CV_8UC3);
+  ASSERT_TRUE(balance.Process(rgb, out, ColorGain{5, 5, 5}, 0.25f, -0.5f));
+  const std::vector<uint8_t> expected = {50, 150, 100, 100, 255, 7, 0, 255, 255};
+  EXPECT_EQ(std::vector<uint8_t>(out.data, out.data + 9), expected);
+
+  // In place, with a destination smaller than the source: only its pixels are written.
+  std::vector<uint8_t> frame = {10, 20, 30, 40, 50, 60, 70, 80};
+  std::vector<uint8_t> small = {1, 1, 1, 1};
+  cv::Mat in(1, 2, CV_8UC4, frame.data());
+  cv::Mat one(1, 1, CV_8UC4, small.data());
+  balance.Process(in, one, ColorGain{1, 1, 1}, 1.0f, 0.0f);
+  EXPECT_EQ(small, (std::vector<uint8_t>{0, 20, 60, 40}));
+  balance.Process(in, in, ColorGain{1, 1, 1}, 0.0f, 1.0f);
+  EXPECT_EQ(frame, (std::vector<uint8_t>{15, 0, 45, 40, 75, 0, 105, 80}));
+
+  // Nothing to do for matrices it cannot read.
+  cv::Mat empty, grey(2, 2, CV_8UC1, cv::Scalar(9));
+  EXPECT_TRUE(balance.Process(empty, grey, ColorGain{1, 1, 1}, 1.0f, 1.0f));
+  EXPECT_TRUE(balance.Process(grey, grey, ColorGain{1, 1, 1}, 1.0f, 1.0f));
+  EXPECT_EQ(grey.at<uint8_t>(1, 1), 9);
+}
+
+}  // namespace

@@ -1,0 +1,166 @@
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstdint>
+#include <random>
+#include <string>
+#include <vector>
+
+#include "support/TestFrame.h"
+#include "tessarofx/NLEHost.h"
+#include "tessarofx/TessaroFx.h"
+
+namespace {
+
+namespace Key = NLEKey::Filter;
+constexpr const wchar_t* kWhiteBalance = L"39509FB9-39FB-4516-9464-3D891DD61D62";
+
+NLEComPtr<INLEProperties> Settings(
+    std::initializer_list<std::pair<const wchar_t*, double>> values) {
+  NLEComPtr<INLEProperties> props;
+  NLECommon::CreateProperties(&props);
+  int i = 0;
+  for (const auto& [name, value] : values) {
+    NLEComPtr<INLEProperties> p;
+    NLECommon::CreateProperties(&p);
+    p->SetString(Key::Property::kVariantName, name);
+    p->SetString(Key::Property::kFriendName, name);
+    p->SetInt(Key::Property::kType, NLEFilterPropertyType_Double);
+    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
+    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
+  }
+  props->SetInt(Key::Property::kCount, i);
+  return props;
+}
+
+NLEComPtr<INLECGFilter> Create(INLEProperties* settings) {
+  NLEComPtr<INLECGFilter> filter;
+  EXPECT_EQ(CreateFilterFromGUID(nullptr, kWhiteBalance, settings, nullptr,
+                                 reinterpret_cast<void**>(&filter)),
+            NLE_S_OK);
+  return filter;
+}
+
+void Set(INLECGFilter* filter, const wchar_t* name, double value) {
+  NLEComPtr<INLEProperties> p;
+  ASSERT_EQ(filter->GetParamPropertyFromName(name, &p), NLE_S_OK);
+  p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
+  filter->ParamValueChanged();
+}
+
+void FillRandom(TestFrame* f, unsigned salt) {
+  std::mt19937 rng(salt);
+  for (auto& b : f->pixels) b = static_cast<uint8_t>(rng());
+}
+
+// The balance per byte, from the formulas: factor in double, then float; product in float,
+// truncated and limited.
+uint8_t Scaled(int v, double factor) {
+  const float p = static_cast<float>(factor) * static_cast<float>(v);
+  return static_cast<uint8_t>(!(p > 0) ? 0 : p >= 255 ? 255 : int(p));
+}
+
+TEST(WhiteBalanceAdjustEffect, EveryColourMatchesTheFactors) {
+  // Every 24-bit colour with an independent alpha, through Running, at both signs, the range
+  // ends and far outside them (negative and above-2 factors).
+#if defined(TFX_SANITIZE_BUILD)
+  constexpr int kHeight = 512;  // every 32nd row
+#else
+  constexpr int kHeight = 4096;
+#endif
+  TestFrame* fg = new TestFrame(4096, kHeight);
+  TestFrame* dst = new TestFrame(4096, kHeight);
+  NLEComPtr<INLEFrame> h1(fg), h2(dst);
+  for (uint32_t i = 0; i < 4096u * kHeight; ++i) {
+    const uint32_t colour = (i * (4096 / kHeight)) & 0xffffff;
+    const uint8_t pixel[4] = {uint8_t(colour), uint8_t(colour >> 8), uint8_t(colour >> 16),
+                              uint8_t((i * 2654435761u) >> 24)};
+    std::copy(pixel, pixel + 4, &fg->pixels[4 * size_t{i}]);
+  }
+  NLEComPtr<INLECGFilter> filter = Create(Settings({{L"u_temperature", 0}, {L"u_tint", 0}}));
+  filter->SetForeground(fg);
+  const double settings[][2] = {{100, 0}, {-100, 37}, {0, -100}, {-33.3, 71.1}, {-900, 650}};
+  for (const auto& s : settings) {
+    SCOPED_TRACE(testing::Message() << "temperature " << s[0] << " tint " << s[1]);
+    Set(filter.get(), L"u_temperature", s[0]);
+    Set(filter.get(), L"u_tint", s[1]);
+    ASSERT_EQ(filter->Running(dst), NLE_S_OK);
+    const float a = static_cast<float>(s[0] / 200.0), b = static_cast<float>(s[1] / 200.0);
+    uint8_t table[3][256];
+    for (int v = 0; v < 256; ++v) {
+      table[0][v] = Scaled(v, 1 + 0.5 * b - a);
+      table[1][v] = Scaled(v, 1 - b);
+      table[2][v] = Scaled(v, 1 + 0.5 * b + a);
+    }
+    for (size_t i = 0; i < fg->pixels.size(); i += 4) {
+      const uint8_t* in = &fg->pixels[i];
+      const uint8_t* out = &dst->pixels[i];
+      if (out[0] != table[0][in[0]] || out[1] != table[1][in[1]] || out[2] != table[2][in[2]] ||
+          out[3] != in[3]) {
+        FAIL() << "pixel " << i / 4 << ": " << int(in[0]) << ' ' << int(in[1]) << ' ' << int(in[2])
+               << " gave " << int(out[0]) << ' ' << int(out[1]) << ' ' << int(out[2]) << ' '
+               << int(out[3]);
+      }
+    }
+  }
+}
+
+TEST(WhiteBalanceAdjustEffect, ZeroCopiesAndTheRangeEndsDoubleAndRemoveChannels) {
+  TestFrame* fg = new TestFrame(33, 7);
+  TestFrame* dst = new TestFrame(33, 7, 200);  // padded: written back through a private copy
+  NLEComPtr<INLEFrame> h1(fg), h2(dst);
+  FillRandom(fg, 3);
+  // No settings at all: the registered defaults, temperature and tint 0.
+  NLEComPtr<INLECGFilter> filter = Create(nullptr);
+  filter->SetForeground(fg);
+  const auto run = [&](auto check) {
+    ASSERT_EQ(filter->Running(dst), NLE_S_OK);
+    for (int y = 0; y < 7; ++y) {
+      for (int x = 0; x < 33; ++x) check(fg->Pixel(x, y), dst->Pixel(x, y));
+    }
+  };
+  run([](const uint8_t* in, const uint8_t* out) {
+    for (int c = 0; c < 4; ++c) ASSERT_EQ(out[c], in[c]);
+  });
+
+  // 200 is beyond the registered range: a = 1 doubles red and removes blue.
+  Set(filter.get(), L"u_temperature", 200);
+  run([](const uint8_t* in, const uint8_t* out) {
+    ASSERT_EQ(out[0], 0);
+    ASSERT_EQ(out[1], in[1]);
+    ASSERT_EQ(out[2], std::min(255, in[2] * 2));
+    ASSERT_EQ(out[3], in[3]);
+  });
+
+  // b = 1 removes green and multiplies red and blue by 1.5.
+  Set(filter.get(), L"u_temperature", 0);
+  Set(filter.get(), L"u_tint", 200);
+  run([](const uint8_t* in, const uint8_t* out) {
+    ASSERT_EQ(out[0], std::min(255, in[0] * 3 / 2));
+    ASSERT_EQ(out[1], 0);
+    ASSERT_EQ(out[2], std::min(255, in[2] * 3 / 2));
+  });
+
+  // The gains are carried but never applied.
+  Set(filter.get(), L"u_tint", -40);
+  Set(filter.get(), L"u_temperature", 25);
+  ASSERT_EQ(filter->Running(dst), NLE_S_OK);
+  const std::vector<uint8_t> plain = dst->pixels;
+  Set(filter.get(), L"u_rgain", -50);
+  Set(filter.get(), L"u_ggain", 0);
+  Set(filter.get(), L"u_bgain", 99);
+  ASSERT_EQ(filter->Running(dst), NLE_S_OK);
+  EXPECT_EQ(dst->pixels, plain);
+}
+
+TEST(WhiteBalanceAdjustEffect, MissingForegroundIsABadArgument) {
+  NLEComPtr<INLECGFilter> filter = Create(Settings({{L"u_temperature", 50}}));
+  TestFrame* bg = new TestFrame(2, 2, 0, false, 40);
+  TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
+  NLEComPtr<INLEFrame> h1(bg), h2(dst);
+  filter->SetBackground(bg);
+  EXPECT_EQ(filter->Running(dst), NLE_E_INVALIDARG);
+  EXPECT_EQ(dst->pixels, std::vector<uint8_t>(16, 9));
+}
+
+}  // namespace
