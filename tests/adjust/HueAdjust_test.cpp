@@ -1,0 +1,244 @@
+#include "tessarofx/HueAdjust.h"
+
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <cstdint>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+#include <thread>
+#include <vector>
+
+#include <hwy/targets.h>
+
+#include "adjust/ColorAdjustReference.h"
+
+namespace {
+
+using tfx_test::NoiseBytes;
+using tfx_test::SameBuffer;
+using Image = std::unique_ptr<CxImage>;
+
+Image Clone(const CxImage& src) {
+  Image copy = std::make_unique<CxImage>();
+  copy->Copy(src);
+  return copy;
+}
+
+Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
+                 unsigned effWidth, uint32_t salt) {
+  std::vector<uint8_t> frame(size_t{effWidth} * height);
+  uint8_t* bits = frame.data();
+  Image image = Clone(CxImage(&bits, width, height, bpp, effWidth, format));
+  const std::vector<uint8_t> noise = NoiseBytes(image->GetSize(), salt);
+  std::memcpy(image->GetBits(), noise.data(), noise.size());
+  return image;
+}
+
+// Every 24-bit colour once (every seventh under the sanitizers) with varying alpha.
+const CxImage& EveryColour() {
+#if defined(TFX_SANITIZE_BUILD)
+  constexpr uint32_t kStep = 7;
+#else
+  constexpr uint32_t kStep = 1;
+#endif
+  static const Image image = [] {
+    const uint32_t count = ((1u << 24) + kStep - 1) / kStep;
+    Image all = std::make_unique<CxImage>(4096, (count + 4095) / 4096, 32, IPF_BGRA);
+    uint8_t* p = all->GetBits();
+    for (uint32_t i = 0; i < all->GetWidth() * all->GetHeight(); ++i, p += 4) {
+      const uint32_t colour = (i * kStep) & 0xffffff;
+      const uint8_t pixel[4] = {uint8_t(colour), uint8_t(colour >> 8), uint8_t(colour >> 16),
+                                uint8_t((i * 2654435761u) >> 24)};
+      std::memcpy(p, pixel, 4);
+    }
+    return all;
+  }();
+  return *image;
+}
+
+// The matrix from its definition: cos and sin in double, entries in double stored as float.
+void ReferenceMatrix(float angle, float m[9]) {
+  const double a = angle * 3.14159265358979323846 / 180.0;
+  const double third = (1.0 - std::cos(a)) / 3.0;
+  const double k = 0.57735026f;
+  const float m0 = static_cast<float>(third + std::cos(a));
+  const float m1 = static_cast<float>(third - k * std::sin(a));
+  const float m2 = static_cast<float>(third + k * std::sin(a));
+  const float rows[9] = {m0, m1, m2, m2, m0, m1, m1, m2, m0};
+  std::memcpy(m, rows, sizeof(rows));
+}
+
+uint8_t Store(float v) { return v < 0 ? 0 : v > 255 ? 255 : static_cast<uint8_t>(v); }
+
+// width * height windows of three bytes, bpp / 8 apart, each row using the bytes stored before.
+void ReferenceHue(CxImage* image, float angle) {
+  float m[9];
+  ReferenceMatrix(angle, m);
+  uint8_t* bits = image->GetBits();
+  const size_t step = image->GetBpp() / 8;
+  for (size_t i = 0; i < size_t{image->GetWidth()} * image->GetHeight(); ++i) {
+    uint8_t* b = bits + i * step;
+    if (i * step + 3 > image->GetSize()) break;
+    if (b[0] == b[1] && b[1] == b[2]) continue;  // greys stay
+    b[0] = Store(m[0] * b[0] + m[1] * b[1] + m[2] * b[2]);
+    b[1] = Store(m[3] * b[0] + m[4] * b[1] + m[5] * b[2]);
+    b[2] = Store(m[6] * b[0] + m[7] * b[1] + m[8] * b[2]);
+  }
+}
+
+// Runs `body` once with the kernels of each instruction set compiled in and run by this CPU.
+template <class Body>
+void ForEveryTarget(Body body) {
+  for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
+    SCOPED_TRACE(hwy::TargetName(target));
+    hwy::SetSupportedTargetsForTest(target);
+    body();
+  }
+  hwy::SetSupportedTargetsForTest(0);
+}
+
+TEST(HueAdjust, MatchesTheSequentialFormulaOnEveryColourAndTarget) {
+  for (const float angle : {37.5f, -100.0f, 120.0f}) {
+    SCOPED_TRACE(angle);
+    const Image expected = Clone(EveryColour());
+    ReferenceHue(expected.get(), angle);
+    ForEveryTarget([&] {
+      const Image actual = Clone(EveryColour());
+      EXPECT_EQ(hueAdjustment(actual.get(), angle), actual.get());
+      EXPECT_TRUE(SameBuffer(*expected, *actual));
+    });
+    float m[9];
+    ReferenceMatrix(angle, m);
+    EXPECT_EQ(std::memcmp(m, matrix, sizeof(m)), 0);
+    // The per-pixel form is the same step.
+    const uint8_t* in = EveryColour().GetBits();
+    for (size_t i = 0; i < EveryColour().GetSize(); i += 4 * 4099) {
+      tagRGBQUAD c;
+      std::memcpy(&c, in + i, 4);
+      const tagRGBQUAD out = transformHue1(c, angle);
+      ASSERT_EQ(std::memcmp(&out, expected->GetBits() + i, 4), 0) << i;
+    }
+  }
+}
+
+TEST(HueAdjust, WalksPixelsFromTheFirstByteInEveryLayout) {
+  // Padded rows are walked as if packed; narrow pixels give overlapping windows that stop
+  // before leaving the buffer.
+  const struct {
+    unsigned width, bpp, effWidth;
+    _ImagePixelFormat format;
+  } layouts[] = {{13, 32, 60, IPF_BGRA},
+                 {13, 32, 52, IPF_RGBA},
+                 {13, 24, 40, IPF_BGR},
+                 {13, 16, 28, IPF_RGB},
+                 {13, 8, 13, IPF_Gray8}};
+  ForEveryTarget([&] {
+    for (const auto& l : layouts) {
+      SCOPED_TRACE(l.bpp);
+      const Image actual = NoiseImage(l.width, 5, l.bpp, l.format, l.effWidth, l.bpp);
+      const Image expected = Clone(*actual);
+      ReferenceHue(expected.get(), 65.0f);
+      hueAdjustment(actual.get(), 65.0f);
+      EXPECT_TRUE(SameBuffer(*expected, *actual));
+    }
+  });
+}
+
+TEST(HueAdjust, LeavesImagesAndMatrixAloneWithoutWork) {
+  calculateHueMartrix(10.0f);
+  float before[9];
+  std::memcpy(before, matrix, sizeof(before));
+  const Image image = NoiseImage(7, 3, 32, IPF_BGRA, 28, 1);
+  const Image original = Clone(*image);
+  CxImage empty;
+  for (const float angle : {0.0f, NAN, INFINITY}) {
+    EXPECT_EQ(hueAdjustment(image.get(), angle), image.get());
+    EXPECT_TRUE(SameBuffer(*original, *image));
+  }
+  EXPECT_EQ(hueAdjustment(nullptr, 30.0f), nullptr);
+  EXPECT_EQ(hueAdjustment(&empty, 30.0f), &empty);
+  EXPECT_EQ(std::memcmp(before, matrix, sizeof(before)), 0);
+}
+
+TEST(HueAdjust, KeepsGreysAndComesBackAtAFullTurn) {
+  const Image image = NoiseImage(64, 16, 32, IPF_BGRA, 256, 4);
+  const Image original = Clone(*image);
+  hueAdjustment(image.get(), 360.0f);
+  for (size_t i = 0; i < image->GetSize(); ++i) {
+    ASSERT_LE(std::abs(image->GetBits()[i] - original->GetBits()[i]), 1) << i;
+  }
+  // Rows that sum to 1 in float would truncate most greys a level down; greys stay put.
+  CxImage ramp(256, 1, 32, IPF_BGRA);
+  for (int v = 0; v < 256; ++v)
+    ramp.SetPixelColor(v, 0, tagRGBQUAD{uint8_t(v), uint8_t(v), uint8_t(v), 9});
+  for (int angle = -180; angle <= 360; angle += 15) {
+    const Image grey = Clone(ramp);
+    hueAdjustment(grey.get(), static_cast<float>(angle));
+    ASSERT_TRUE(SameBuffer(ramp, *grey)) << angle;
+    for (int v = 0; v < 256; v += 5) {
+      const tagRGBQUAD c = ramp.GetPixelColor(v, 0, true);
+      const tagRGBQUAD out = transformHue1(c, static_cast<float>(angle));
+      ASSERT_EQ(std::memcmp(&out, &c, 4), 0) << angle << ' ' << v;
+    }
+  }
+  // The luma family is shared with vibrance.
+  EXPECT_EQ(calLuma(tagRGBQUAD{10, 200, 51, 0}), 105);
+}
+
+TEST(HueAdjust, ConcurrentRotationsWithDifferentAnglesStayApart) {
+  const Image source = NoiseImage(256, 64, 32, IPF_BGRA, 1024, 8);
+  const float angles[2] = {40.0f, -110.0f};
+  Image expected[2];
+  float matrices[2][9];
+  for (int t = 0; t < 2; ++t) {
+    expected[t] = Clone(*source);
+    hueAdjustment(expected[t].get(), angles[t]);
+    ReferenceMatrix(angles[t], matrices[t]);
+  }
+  bool same[2] = {true, true};
+  std::thread threads[2];
+  for (int t = 0; t < 2; ++t) {
+    threads[t] = std::thread([&, t] {
+      for (int round = 0; round < 40; ++round) {
+        const Image image = Clone(*source);
+        hueAdjustment(image.get(), angles[t]);
+        same[t] =
+            same[t] && std::memcmp(image->GetBits(), expected[t]->GetBits(), image->GetSize()) == 0;
+      }
+    });
+  }
+  for (std::thread& t : threads) t.join();
+  EXPECT_TRUE(same[0]);
+  EXPECT_TRUE(same[1]);
+  // The published matrix is one whole matrix, never a mix of the two.
+  EXPECT_TRUE(std::memcmp(matrix, matrices[0], sizeof(matrix)) == 0 ||
+              std::memcmp(matrix, matrices[1], sizeof(matrix)) == 0);
+}
+
+TEST(HueAdjust, ExactRotationTurnsTheSameWayAsTheMatrix) {
+  // At 120 degrees red goes to blue; grey and the distance from grey are kept.
+  const _rgb blue = transformHue2(_rgb{1.0f, 0.0f, 0.0f}, 120.0f);
+  EXPECT_NEAR(blue.r, 0.0f, 1e-6f);
+  EXPECT_NEAR(blue.g, 0.0f, 1e-6f);
+  EXPECT_NEAR(blue.b, 1.0f, 1e-6f);
+  const _rgb grey = transformHue2(_rgb{0.3f, 0.3f, 0.3f}, 77.0f);
+  EXPECT_FLOAT_EQ(grey.r, 0.3f);
+  EXPECT_FLOAT_EQ(grey.b, 0.3f);
+  // At small angles the sequential rows differ from the product by well under a level, while
+  // the wrong direction would be off by up to twice the turn (about 16 levels at 3 degrees).
+  const auto level = [](float v) { return std::fmin(255.0f, std::fmax(0.0f, v * 255.0f)); };
+  for (const float angle : {-3.0f, 3.0f}) {
+    for (size_t i = 0; i < 200; ++i) {
+      const std::vector<uint8_t> c = NoiseBytes(3, static_cast<uint32_t>(i + 1));
+      const tagRGBQUAD out = transformHue1(tagRGBQUAD{c[0], c[1], c[2], 0}, angle);
+      const _rgb exact = transformHue2(_rgb{c[2] / 255.0f, c[1] / 255.0f, c[0] / 255.0f}, angle);
+      EXPECT_NEAR(out.rgbRed, level(exact.r), 1.5f) << i;
+      EXPECT_NEAR(out.rgbGreen, level(exact.g), 1.5f) << i;
+      EXPECT_NEAR(out.rgbBlue, level(exact.b), 1.5f) << i;
+    }
+  }
+}
+
+}  // namespace
