@@ -1,0 +1,400 @@
+// Eight-band hue, saturation and lightness.
+//
+// Everything that depends on the hue alone (the band weights and the three sums they give) is
+// folded into a table of 1536 hue steps per parameter set. Packed 32-bit pixels then go through
+// a vector kernel, compiled once per instruction set by foreach_target.h and picked at run time,
+// whose lanes evaluate the same float operations in the same order as the per-pixel form used
+// for the other layouts: both give the bytes the formulas in HSLAdjust.h define. Nothing is fused
+// into a multiply-add (no MulAdd, and the build passes -ffp-contract=off).
+#ifndef TFX_ADJUST_HSLADJUST_SHARED
+#define TFX_ADJUST_HSLADJUST_SHARED
+
+#include "tessarofx/HSLAdjust.h"
+
+#include <algorithm>
+#include <cmath>
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+
+namespace tfx {
+namespace {
+
+constexpr int kHueSteps = 1536;  // 256 per sextant
+
+// Per hue step: hue shift in sextants, chroma factor, lightness before the grey fade, unused.
+struct Tables {
+  HSLBands bands;
+  bool active;
+  alignas(64) float hue[kHueSteps * 4];
+};
+
+}  // namespace
+}  // namespace tfx
+
+#endif  // TFX_ADJUST_HSLADJUST_SHARED
+
+#undef HWY_TARGET_INCLUDE
+#define HWY_TARGET_INCLUDE "adjust/HSLAdjust.cpp"
+#include <hwy/foreach_target.h>  // IWYU pragma: keep
+#include <hwy/highway.h>
+
+HWY_BEFORE_NAMESPACE();
+namespace tfx {
+namespace HWY_NAMESPACE {
+
+namespace hn = hwy::HWY_NAMESPACE;
+
+using DU = hn::ScalableTag<uint32_t>;
+using DI = hn::RebindToSigned<DU>;
+using DF = hn::RebindToFloat<DU>;
+using VU = hn::Vec<DU>;
+using VI = hn::Vec<DI>;
+using VF = hn::Vec<DF>;
+
+HWY_INLINE VI Byte(VU p, int shift) {
+  const VU shifted = shift == 0 ? p : shift == 8 ? hn::ShiftRight<8>(p) : hn::ShiftRight<16>(p);
+  return hn::BitCast(DI(), hn::And(shifted, hn::Set(DU(), 255u)));
+}
+
+// One vector of pixels; red at bit kRed, blue at bit 16 - kRed.
+template <int kRed>
+HWY_INLINE VU AdjustPixels(VU px, const float* table) {
+  const DU du;
+  const DI di;
+  const DF df;
+  const VI r = Byte(px, kRed);
+  const VI g = Byte(px, 8);
+  const VI b = Byte(px, 16 - kRed);
+  const VI mx = hn::Max(r, hn::Max(g, b));
+  const VI mn = hn::Min(r, hn::Min(g, b));
+  const VI c = hn::Sub(mx, mn);
+  const VI c2 = hn::ShiftLeft<1>(c);
+  const VI c4 = hn::ShiftLeft<2>(c);
+  const VI c6 = hn::Add(c4, c2);
+  const VI pRed = hn::Add(hn::Sub(g, b), hn::IfThenElseZero(hn::Lt(g, b), c6));
+  const VI p = hn::IfThenElse(
+      hn::Eq(r, mx), pRed,
+      hn::IfThenElse(hn::Eq(g, mx), hn::Add(c2, hn::Sub(b, r)), hn::Add(c4, hn::Sub(r, g))));
+  // floor(256 p / c) from a float quotient: below 1536 its ulp is 2^-13, while a quotient that is
+  // not an integer lies at least 1/c >= 1/255 from one, so rounding never crosses an integer.
+  // Greys divide by 1 instead and are kept below.
+  const VF cf = hn::ConvertTo(df, c);
+  const VF divisor = hn::ConvertTo(df, hn::Max(c, hn::Set(di, 1)));
+  const VI j = hn::ConvertTo(di, hn::Div(hn::ConvertTo(df, hn::ShiftLeft<8>(p)), divisor));
+  const VI index = hn::ShiftLeft<2>(j);
+  const VF shift = hn::GatherIndex(df, table, index);
+  const VF k = hn::GatherIndex(df, table + 1, index);
+  const VF light = hn::GatherIndex(df, table + 2, index);
+  const VF zero = hn::Zero(df);
+  const VF one = hn::Set(df, 1.0f);
+  const auto untouched = hn::And(hn::And(hn::Eq(shift, zero), hn::Eq(k, one)), hn::Eq(light, zero));
+  const auto keep = hn::Or(hn::RebindMask(df, hn::Eq(c, hn::Zero(di))), untouched);
+  if (hn::AllTrue(df, keep)) return px;
+
+  const VF mxf = hn::ConvertTo(df, mx);
+  const VF mnf = hn::ConvertTo(df, mn);
+  VF vr = hn::ConvertTo(df, r);
+  VF vg = hn::ConvertTo(df, g);
+  VF vb = hn::ConvertTo(df, b);
+
+  // Hue: the sextant k' is the number of thresholds n c (n = 1..5) that q reaches; the masks
+  // are nested, so the last one reached gives k' c.
+  {
+    const VF turn = hn::ConvertTo(df, c6);
+    VF q = hn::Add(hn::ConvertTo(df, p), hn::Mul(shift, cf));
+    q = hn::IfThenElse(hn::Lt(q, zero), hn::Add(q, turn),
+                       hn::IfThenElse(q >= turn, hn::Sub(q, turn), q));
+    const VF t1 = cf;
+    const VF t2 = hn::ConvertTo(df, c2);
+    const VF t3 = hn::ConvertTo(df, hn::Add(c2, c));
+    const VF t4 = hn::ConvertTo(df, c4);
+    const VF t5 = hn::ConvertTo(df, hn::Add(c4, c));
+    const auto m1 = q >= t1;
+    const auto m2 = q >= t2;
+    const auto m3 = q >= t3;
+    const auto m4 = q >= t4;
+    const auto m5 = q >= t5;
+    VF base = hn::IfThenElseZero(m1, t1);
+    base = hn::IfThenElse(m2, t2, base);
+    base = hn::IfThenElse(m3, t3, base);
+    base = hn::IfThenElse(m4, t4, base);
+    base = hn::IfThenElse(m5, t5, base);
+    const VF x = hn::Sub(q, base);
+    const VF rise = hn::Add(mnf, x);
+    const VF fall = hn::Sub(mxf, x);
+    const auto in0 = hn::Not(m1);
+    const auto in1 = hn::AndNot(m2, m1);
+    const auto in2 = hn::AndNot(m3, m2);
+    const auto in3 = hn::AndNot(m4, m3);
+    const auto in4 = hn::AndNot(m5, m4);
+    const VF hr = hn::IfThenElse(
+        in1, fall, hn::IfThenElse(in4, rise, hn::IfThenElse(hn::Or(in2, in3), mnf, mxf)));
+    const VF hg =
+        hn::IfThenElse(in0, rise, hn::IfThenElse(in3, fall, hn::IfThenElse(m4, mnf, mxf)));
+    const VF hb = hn::IfThenElse(in2, rise, hn::IfThenElse(m5, fall, hn::IfThenElse(m3, mxf, mnf)));
+    const auto on = hn::Ne(shift, zero);
+    vr = hn::IfThenElse(on, hr, vr);
+    vg = hn::IfThenElse(on, hg, vg);
+    vb = hn::IfThenElse(on, hb, vb);
+  }
+  // Saturation around the lightness, no further than the chroma limit of that lightness.
+  {
+    const VI sum = hn::Add(mx, mn);
+    const VF m = hn::Mul(hn::ConvertTo(df, sum), hn::Set(df, 0.5f));
+    const VF limit =
+        hn::ConvertTo(df, hn::Sub(hn::Set(di, 255), hn::Abs(hn::Sub(sum, hn::Set(di, 255)))));
+    const VF s = hn::Div(hn::Min(hn::Mul(cf, k), limit), divisor);
+    const auto on = hn::Ne(k, one);
+    vr = hn::IfThenElse(on, hn::Add(m, hn::Mul(hn::Sub(vr, m), s)), vr);
+    vg = hn::IfThenElse(on, hn::Add(m, hn::Mul(hn::Sub(vg, m), s)), vg);
+    vb = hn::IfThenElse(on, hn::Add(m, hn::Mul(hn::Sub(vb, m), s)), vb);
+  }
+  // Lightness towards white or black, faded out towards grey. c / 64 is exact as c * 2^-6.
+  {
+    const VF fade = hn::Min(one, hn::Mul(cf, hn::Set(df, 1.0f / 64.0f)));
+    const VF l = hn::Mul(light, fade);
+    const auto on = hn::Ne(l, zero);
+    const auto up = hn::Gt(l, zero);
+    const VF white = hn::Set(df, 255.0f);
+    vr =
+        hn::IfThenElse(on, hn::Add(vr, hn::Mul(hn::IfThenElse(up, hn::Sub(white, vr), vr), l)), vr);
+    vg =
+        hn::IfThenElse(on, hn::Add(vg, hn::Mul(hn::IfThenElse(up, hn::Sub(white, vg), vg), l)), vg);
+    vb =
+        hn::IfThenElse(on, hn::Add(vb, hn::Mul(hn::IfThenElse(up, hn::Sub(white, vb), vb), l)), vb);
+  }
+  const auto round = [&](VF v) {
+    const VF rounded = hn::Add(v, hn::Set(df, 0.5f));
+    return hn::BitCast(du, hn::ConvertTo(di, hn::Min(hn::Max(rounded, zero), hn::Set(df, 255.0f))));
+  };
+  const VU out =
+      hn::Or(hn::Or(hn::And(px, hn::Set(du, 0xff000000u)), hn::ShiftLeft<8>(round(vg))),
+             hn::Or(hn::ShiftLeft<kRed>(round(vr)), hn::ShiftLeft<16 - kRed>(round(vb))));
+  return hn::IfThenElse(hn::RebindMask(du, keep), px, out);
+}
+
+template <int kRed>
+void AdjustRowsOf(uint8_t* bits, size_t rows, size_t count, size_t stride, const float* table) {
+  const DU du;
+  const size_t lanes = hn::Lanes(du);
+  for (size_t y = 0; y < rows; ++y) {
+    uint8_t* row = bits + y * stride;
+    size_t i = 0;
+    for (; i + lanes <= count; i += lanes) {
+      uint32_t* p = reinterpret_cast<uint32_t*>(row + 4 * i);
+      hn::StoreU(AdjustPixels<kRed>(hn::LoadU(du, p), table), du, p);
+    }
+    if (i < count) {
+      // The tail through a full vector, so that it sees the very same operations.
+      alignas(64) uint32_t tail[HWY_MAX_BYTES / 4] = {};
+      std::memcpy(tail, row + 4 * i, 4 * (count - i));
+      hn::Store(AdjustPixels<kRed>(hn::Load(du, tail), table), du, tail);
+      std::memcpy(row + 4 * i, tail, 4 * (count - i));
+    }
+  }
+}
+
+// `rows` rows of `count` packed 4-byte pixels, `stride` bytes apart; red is byte 0 in RGBA
+// order, byte 2 otherwise.
+void AdjustRows(uint8_t* bits, size_t rows, size_t count, size_t stride, const float* table,
+                bool rgba) {
+  if (rgba) {
+    AdjustRowsOf<0>(bits, rows, count, stride, table);
+  } else {
+    AdjustRowsOf<16>(bits, rows, count, stride, table);
+  }
+}
+
+}  // namespace HWY_NAMESPACE
+}  // namespace tfx
+HWY_AFTER_NAMESPACE();
+
+#if HWY_ONCE
+namespace tfx {
+
+HWY_EXPORT(AdjustRows);
+
+namespace {
+
+constexpr double kCentres[kHSLBandCount] = {0, 30, 60, 120, 180, 240, 270, 300};
+
+// Band values are clamped to -100..100 and NaN reads as 0.
+double Clamped(float v) {
+  if (std::isnan(v)) return 0.0;
+  return std::min(100.0, std::max(-100.0, static_cast<double>(v)));
+}
+
+struct BandShape {
+  double centre;
+  double edge[2];  // towards lower, higher hues
+  double fade[2];
+  double shift;  // degrees
+  double sat;
+  double light;
+};
+
+BandShape Shape(int i, const HSLBandValues& v) {
+  const int prev = (i + kHSLBandCount - 1) % kHSLBandCount;
+  const int next = (i + 1) % kHSLBandCount;
+  const double gapPrev = std::fmod(kCentres[i] - kCentres[prev] + 360.0, 360.0);
+  const double gapNext = std::fmod(kCentres[next] - kCentres[i] + 360.0, 360.0);
+  const double scale = std::exp2(Clamped(v.width) / 100.0);
+  const double soft = Clamped(v.soft);
+  const double f = soft >= 0.0 ? 0.5 + 0.5 * soft / 100.0 : 0.5 + 0.4 * soft / 100.0;
+  const double hue = Clamped(v.hue);
+  BandShape s;
+  s.centre = kCentres[i];
+  s.edge[0] = gapPrev / 2.0 * scale;
+  s.edge[1] = gapNext / 2.0 * scale;
+  s.fade[0] = f * s.edge[0];
+  s.fade[1] = f * s.edge[1];
+  s.shift = hue / 100.0 * (hue >= 0.0 ? gapNext : gapPrev);
+  s.sat = Clamped(v.sat) / 100.0;
+  s.light = Clamped(v.light) / 100.0;
+  return s;
+}
+
+double Weight(const BandShape& s, double angle) {
+  double d = angle - s.centre;
+  if (d >= 180.0) d -= 360.0;
+  if (d < -180.0) d += 360.0;
+  const int side = d < 0.0 ? 0 : 1;
+  double t = (s.edge[side] + s.fade[side] - std::fabs(d)) / (2.0 * s.fade[side]);
+  t = std::min(1.0, std::max(0.0, t));
+  return t * t * (3.0 - 2.0 * t);
+}
+
+void Build(const HSLBands& bands, Tables* t) {
+  t->bands = bands;
+  BandShape shapes[kHSLBandCount];
+  t->active = false;
+  for (int i = 0; i < kHSLBandCount; ++i) {
+    shapes[i] = Shape(i, bands.band[i]);
+    t->active |= shapes[i].shift != 0.0 || shapes[i].sat != 0.0 || shapes[i].light != 0.0;
+  }
+  for (int j = 0; j < kHueSteps; ++j) {
+    const double angle = j * (360.0 / kHueSteps);
+    double shift = 0.0, sat = 0.0, light = 0.0;
+    for (const BandShape& s : shapes) {
+      const double w = Weight(s, angle);
+      shift += w * s.shift;
+      sat += w * s.sat;
+      light += w * s.light;
+    }
+    shift -= 360.0 * std::floor((shift + 180.0) / 360.0);
+    float* entry = t->hue + 4 * j;
+    entry[0] = static_cast<float>(shift / 60.0);
+    entry[1] = static_cast<float>(std::max(0.0, 1.0 + sat));
+    entry[2] = static_cast<float>(std::min(1.0, std::max(-1.0, light)));
+    entry[3] = 0.0f;
+  }
+}
+
+// The last parameter set's tables, one per thread: effects on different threads never share
+// them, and a filter that keeps its settings builds them once.
+const Tables& TablesFor(const HSLBands& bands) {
+  thread_local std::unique_ptr<Tables> cache;
+  if (!cache) {
+    cache = std::make_unique<Tables>();
+    Build(bands, cache.get());
+  } else if (std::memcmp(&cache->bands, &bands, sizeof(HSLBands)) != 0) {
+    Build(bands, cache.get());
+  }
+  return *cache;
+}
+
+uint8_t RoundToByte(float v) {
+  const float rounded = v + 0.5f;
+  if (!(rounded >= 0.0f)) return 0;
+  if (rounded >= 255.0f) return 255;
+  return static_cast<uint8_t>(static_cast<int>(rounded));
+}
+
+// One pixel in place, for layouts the kernel does not take; the same operations as its lanes.
+// False when the pixel stays as it is.
+bool AdjustPixel(uint8_t& red, uint8_t& green, uint8_t& blue, const Tables& t) {
+  const int r = red, g = green, b = blue;
+  const int mx = std::max(r, std::max(g, b));
+  const int mn = std::min(r, std::min(g, b));
+  const int c = mx - mn;
+  if (c == 0) return false;
+  int p;
+  if (r == mx) {
+    p = g - b + (g < b ? 6 * c : 0);
+  } else if (g == mx) {
+    p = 2 * c + b - r;
+  } else {
+    p = 4 * c + r - g;
+  }
+  const float* e = t.hue + 4 * (256 * p / c);
+  const float shift = e[0], k = e[1], light = e[2];
+  if (shift == 0.0f && k == 1.0f && light == 0.0f) return false;
+
+  const float cf = static_cast<float>(c);
+  float v[3] = {static_cast<float>(r), static_cast<float>(g), static_cast<float>(b)};
+  if (shift != 0.0f) {
+    float q = static_cast<float>(p) + shift * cf;
+    const float turn = static_cast<float>(6 * c);
+    if (q < 0.0f) {
+      q += turn;
+    } else if (q >= turn) {
+      q -= turn;
+    }
+    int sector = 0;
+    for (int n = 1; n <= 5; ++n) sector += q >= static_cast<float>(n * c) ? 1 : 0;
+    const float x = q - static_cast<float>(sector * c);
+    // mx, mn, rise, fall for each channel, by sextant.
+    static constexpr uint8_t kPick[6][3] = {{0, 2, 1}, {3, 0, 1}, {1, 0, 2},
+                                            {1, 3, 0}, {2, 1, 0}, {0, 1, 3}};
+    const float values[4] = {static_cast<float>(mx), static_cast<float>(mn),
+                             static_cast<float>(mn) + x, static_cast<float>(mx) - x};
+    for (int i = 0; i < 3; ++i) v[i] = values[kPick[sector][i]];
+  }
+  if (k != 1.0f) {
+    const int sum = mx + mn;
+    const float m = static_cast<float>(sum) * 0.5f;
+    const float limit = static_cast<float>(255 - std::abs(sum - 255));
+    const float s = std::min(cf * k, limit) / cf;
+    for (float& x : v) x = m + (x - m) * s;
+  }
+  const float l = light * std::min(1.0f, cf * (1.0f / 64.0f));
+  if (l != 0.0f) {
+    for (float& x : v) x = x + (l > 0.0f ? 255.0f - x : x) * l;
+  }
+  red = RoundToByte(v[0]);
+  green = RoundToByte(v[1]);
+  blue = RoundToByte(v[2]);
+  return true;
+}
+
+}  // namespace
+}  // namespace tfx
+
+CxImage* hslAdjustment(CxImage* image, const HSLBands& bands) {
+  if (!image || !image->GetBits()) return image;
+  const tfx::Tables& t = tfx::TablesFor(bands);
+  if (!t.active) return image;
+
+  const _ImagePixelFormat format = image->getFormat();
+  if (image->GetBpp() == 32 && (format == IPF_BGRA || format == IPF_RGBA)) {
+    const size_t width = image->GetWidth();
+    const size_t height = image->GetHeight();
+    const size_t stride = image->GetEffWidth();
+    const bool packed = stride == width * 4;
+    HWY_DYNAMIC_DISPATCH(tfx::AdjustRows)
+    (image->GetBits(), packed ? 1 : height, packed ? width * height : width, stride, t.hue,
+     format == IPF_RGBA);
+    return image;
+  }
+  for (unsigned long y = 0; y < image->GetHeight(); ++y) {
+    for (unsigned long x = 0; x < image->GetWidth(); ++x) {
+      tagRGBQUAD c = image->GetPixelColor(x, y, true);
+      if (tfx::AdjustPixel(c.rgbRed, c.rgbGreen, c.rgbBlue, t)) image->SetPixelColor(x, y, c);
+    }
+  }
+  return image;
+}
+#endif  // HWY_ONCE

@@ -1,0 +1,410 @@
+#include "tessarofx/HSLAdjust.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <cstdint>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include <hwy/targets.h>
+
+#include "adjust/ColorAdjustReference.h"
+
+namespace {
+
+using tfx_test::NoiseBytes;
+using tfx_test::SameBuffer;
+using Image = std::unique_ptr<CxImage>;
+
+Image Clone(const CxImage& src) {
+  Image copy = std::make_unique<CxImage>();
+  copy->Copy(src);
+  return copy;
+}
+
+Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
+                 unsigned effWidth, uint32_t salt) {
+  std::vector<uint8_t> frame(size_t{effWidth} * height);
+  uint8_t* bits = frame.data();
+  Image image = Clone(CxImage(&bits, width, height, bpp, effWidth, format));
+  const std::vector<uint8_t> noise = NoiseBytes(image->GetSize(), salt);
+  std::memcpy(image->GetBits(), noise.data(), noise.size());
+  return image;
+}
+
+// Every 24-bit colour once (every seventh under the sanitizers) with varying alpha.
+const CxImage& EveryColour() {
+#if defined(TFX_SANITIZE_BUILD)
+  constexpr uint32_t kStep = 7;
+#else
+  constexpr uint32_t kStep = 1;
+#endif
+  static const Image image = [] {
+    const uint32_t count = ((1u << 24) + kStep - 1) / kStep;
+    Image all = std::make_unique<CxImage>(4096, (count + 4095) / 4096, 32, IPF_BGRA);
+    uint8_t* p = all->GetBits();
+    for (uint32_t i = 0; i < all->GetWidth() * all->GetHeight(); ++i, p += 4) {
+      const uint32_t colour = (i * kStep) & 0xffffff;
+      const uint8_t pixel[4] = {uint8_t(colour), uint8_t(colour >> 8), uint8_t(colour >> 16),
+                                uint8_t((i * 2654435761u) >> 24)};
+      std::memcpy(p, pixel, 4);
+    }
+    return all;
+  }();
+  return *image;
+}
+
+// ---- The per-pixel reference, from the formulas in HSLAdjust.h. Band shapes are derived once
+// per setting; the weights are evaluated afresh for every pixel.
+
+struct RefBand {
+  double centre, edgePrev, edgeNext, fadePrev, fadeNext, shift, sat, light;
+};
+
+double Limit(float v) { return std::isnan(v) ? 0.0 : std::clamp<double>(v, -100.0, 100.0); }
+
+std::vector<RefBand> RefBands(const HSLBands& bands) {
+  const double centres[8] = {0, 30, 60, 120, 180, 240, 270, 300};
+  std::vector<RefBand> out;
+  for (int i = 0; i < 8; ++i) {
+    const double prev = i == 0 ? 60.0 : centres[i] - centres[i - 1];
+    const double next = i == 7 ? 60.0 : centres[i + 1] - centres[i];
+    const HSLBandValues& v = bands.band[i];
+    const double scale = std::exp2(Limit(v.width) / 100.0);
+    const double soft = Limit(v.soft);
+    const double f = soft >= 0 ? 0.5 + 0.5 * soft / 100.0 : 0.5 + 0.4 * soft / 100.0;
+    RefBand b;
+    b.centre = centres[i];
+    b.edgePrev = prev / 2.0 * scale;
+    b.edgeNext = next / 2.0 * scale;
+    b.fadePrev = f * b.edgePrev;
+    b.fadeNext = f * b.edgeNext;
+    b.shift = Limit(v.hue) / 100.0 * (Limit(v.hue) >= 0 ? next : prev);
+    b.sat = Limit(v.sat) / 100.0;
+    b.light = Limit(v.light) / 100.0;
+    out.push_back(b);
+  }
+  return out;
+}
+
+struct HueValues {
+  float s, k, l;
+};
+
+HueValues RefHueValues(const std::vector<RefBand>& bands, int j) {
+  const double angle = j * 360.0 / 1536.0;
+  double shift = 0, sat = 0, light = 0;
+  for (const RefBand& b : bands) {
+    double d = angle - b.centre;
+    if (d >= 180) d -= 360;
+    if (d < -180) d += 360;
+    const double edge = d < 0 ? b.edgePrev : b.edgeNext;
+    const double fade = d < 0 ? b.fadePrev : b.fadeNext;
+    const double t = std::clamp((edge + fade - std::abs(d)) / (2 * fade), 0.0, 1.0);
+    const double w = t * t * (3 - 2 * t);
+    shift += w * b.shift;
+    sat += w * b.sat;
+    light += w * b.light;
+  }
+  while (shift >= 180) shift -= 360;
+  while (shift < -180) shift += 360;
+  return {static_cast<float>(shift / 60), static_cast<float>(std::max(0.0, 1 + sat)),
+          static_cast<float>(std::clamp(light, -1.0, 1.0))};
+}
+
+uint8_t RefRound(float v) {
+  return static_cast<uint8_t>(std::clamp(static_cast<int>(std::trunc(v + 0.5f)), 0, 255));
+}
+
+tagRGBQUAD RefPixel(tagRGBQUAD c, const std::vector<RefBand>& bands) {
+  const int r = c.rgbRed, g = c.rgbGreen, b = c.rgbBlue;
+  const int mx = std::max({r, g, b}), mn = std::min({r, g, b}), chroma = mx - mn;
+  if (chroma == 0) return c;
+  int p;
+  if (r == mx) {
+    p = g >= b ? g - b : 6 * chroma + g - b;
+  } else if (g == mx) {
+    p = 2 * chroma + b - r;
+  } else {
+    p = 4 * chroma + r - g;
+  }
+  const HueValues h = RefHueValues(bands, 256 * p / chroma);
+  if (h.s == 0 && h.k == 1 && h.l == 0) return c;
+  const float cf = static_cast<float>(chroma);
+  float v[3] = {float(r), float(g), float(b)};
+  if (h.s != 0) {
+    float q = static_cast<float>(p) + h.s * cf;
+    if (q < 0) {
+      q += static_cast<float>(6 * chroma);
+    } else if (q >= static_cast<float>(6 * chroma)) {
+      q -= static_cast<float>(6 * chroma);
+    }
+    int k = 0;
+    for (int n = 1; n <= 5; ++n) {
+      if (q >= static_cast<float>(n * chroma)) k = n;
+    }
+    const float x = q - static_cast<float>(k * chroma);
+    const float hi = float(mx), lo = float(mn), rise = lo + x, fall = hi - x;
+    const float sectors[6][3] = {{hi, rise, lo}, {fall, hi, lo}, {lo, hi, rise},
+                                 {lo, fall, hi}, {rise, lo, hi}, {hi, lo, fall}};
+    std::copy(sectors[k], sectors[k] + 3, v);
+  }
+  if (h.k != 1) {
+    const float m = static_cast<float>(mx + mn) / 2;
+    const float s = std::min(cf * h.k, static_cast<float>(255 - std::abs(mx + mn - 255))) / cf;
+    for (float& x : v) x = m + (x - m) * s;
+  }
+  const float l = h.l * std::min(1.0f, cf / 64);
+  if (l != 0) {
+    for (float& x : v) x = l > 0 ? x + (255 - x) * l : x + x * l;
+  }
+  c.rgbRed = RefRound(v[0]);
+  c.rgbGreen = RefRound(v[1]);
+  c.rgbBlue = RefRound(v[2]);
+  return c;
+}
+
+void ReferenceHsl(CxImage* image, const HSLBands& bands) {
+  const std::vector<RefBand> ref = RefBands(bands);
+  for (unsigned long y = 0; y < image->GetHeight(); ++y) {
+    for (unsigned long x = 0; x < image->GetWidth(); ++x) {
+      image->SetPixelColor(x, y, RefPixel(image->GetPixelColor(x, y, true), ref));
+    }
+  }
+}
+
+// ---- Settings
+
+HSLBands Bands(std::initializer_list<std::pair<int, HSLBandValues>> values) {
+  HSLBands b{};
+  for (const auto& [band, v] : values) b.band[band] = v;
+  return b;
+}
+
+// hue, sat, light, width, soft
+const HSLBands kRedOnly = Bands({{kHSLRed, {100, -40, 25, 0, 0}}});
+const HSLBands kEveryBand = Bands({{kHSLRed, {-100, 100, -60, 100, -100}},
+                                   {kHSLOrange, {40, -100, 30, -50, 20}},
+                                   {kHSLYellow, {100, 35, -100, 0, 100}},
+                                   {kHSLGreen, {-55, 60, 15, -100, -40}},
+                                   {kHSLAqua, {20, -20, 100, 60, 0}},
+                                   {kHSLBlue, {-80, 100, -35, 30, 70}},
+                                   {kHSLPurple, {65, -70, 45, -25, -100}},
+                                   {kHSLMagenta, {-30, 10, -80, 100, 50}}});
+// Widest reach and beyond-range values: shifts of several bands pile up and wrap.
+const HSLBands kWide = [] {
+  HSLBands b{};
+  for (HSLBandValues& v : b.band) v = {250, 100, 100, 100, 300};
+  b.band[kHSLGreen] = {-100, -100, -100, 100, 100};
+  return b;
+}();
+
+struct SweepCase {
+  const HSLBands* bands;
+  const char* label;
+};
+
+void PrintTo(const SweepCase& c, std::ostream* os) { *os << c.label; }
+
+class HSLAdjustAllColours : public testing::TestWithParam<SweepCase> {};
+
+// Runs `body` once with the kernels of each instruction set compiled in and run by this CPU.
+template <class Body>
+void ForEveryTarget(Body body) {
+  for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
+    SCOPED_TRACE(hwy::TargetName(target));
+    hwy::SetSupportedTargetsForTest(target);
+    body();
+  }
+  hwy::SetSupportedTargetsForTest(0);
+}
+
+TEST_P(HSLAdjustAllColours, MatchesThePerPixelFormulasOnEveryTarget) {
+  const Image expected = Clone(EveryColour());
+  ReferenceHsl(expected.get(), *GetParam().bands);
+  ForEveryTarget([&] {
+    const Image actual = Clone(EveryColour());
+    EXPECT_EQ(hslAdjustment(actual.get(), *GetParam().bands), actual.get());
+    EXPECT_TRUE(SameBuffer(*expected, *actual));
+  });
+}
+
+INSTANTIATE_TEST_SUITE_P(HSLAdjust, HSLAdjustAllColours,
+                         testing::Values(SweepCase{&kRedOnly, "RedOnly"},
+                                         SweepCase{&kEveryBand, "EveryBand"},
+                                         SweepCase{&kWide, "Wide"}),
+                         [](const testing::TestParamInfo<SweepCase>& p) {
+                           return std::string(p.param.label);
+                         });
+
+TEST(HSLAdjust, MatchesTheFormulasInEveryLayoutWidthAndPadding) {
+  // Rows shorter than a vector, tails, padded rows (left alone) and packed frames taken as one
+  // run; other layouts go through the accessors.
+  const struct {
+    unsigned bpp;
+    _ImagePixelFormat format;
+  } layouts[] = {{32, IPF_BGRA}, {32, IPF_RGBA}, {24, IPF_BGR},
+                 {24, IPF_RGB},  {16, IPF_RGB},  {8, IPF_Gray8}};
+  ForEveryTarget([&] {
+    for (const auto& l : layouts) {
+      for (const unsigned width : {1u, 5u, 17u, 40u}) {
+        for (const unsigned pad : {0u, 12u}) {
+          SCOPED_TRACE(testing::Message() << l.bpp << " bpp, format " << l.format << ", width "
+                                          << width << ", padding " << pad);
+          const unsigned effWidth = (width * l.bpp / 8 + 3) / 4 * 4 + pad;
+          const Image actual = NoiseImage(width, 6, l.bpp, l.format, effWidth, width + pad);
+          const Image expected = Clone(*actual);
+          ReferenceHsl(expected.get(), kEveryBand);
+          hslAdjustment(actual.get(), kEveryBand);
+          ASSERT_TRUE(SameBuffer(*expected, *actual));
+        }
+      }
+    }
+  });
+}
+
+TEST(HSLAdjust, LeavesWhatNoBandTouchesExactlyAlone) {
+  // Zero hue, sat and light: a no-op whatever the shapes.
+  HSLBands shapesOnly{};
+  for (HSLBandValues& v : shapesOnly.band) v = {0, 0, 0, 70, -90};
+  const Image image = Clone(EveryColour());
+  hslAdjustment(image.get(), shapesOnly);
+  EXPECT_TRUE(SameBuffer(EveryColour(), *image));
+
+  // A red band leaves hues from yellow round to purple, and every grey, as they were.
+  hslAdjustment(image.get(), kRedOnly);
+  const uint8_t* in = EveryColour().GetBits();
+  const uint8_t* out = image->GetBits();
+  for (size_t i = 0; i < image->GetSize(); i += 4) {
+    const int b = in[i], g = in[i + 1], r = in[i + 2];
+    const bool grey = r == g && g == b;
+    const bool farFromRed = std::max(g, b) > r;  // hue between 60 and 300 degrees
+    if (grey || farFromRed) {
+      ASSERT_EQ(std::memcmp(in + i, out + i, 4), 0) << i;
+    }
+  }
+
+  CxImage empty;
+  uint8_t* none = nullptr;
+  CxImage headerOnly(&none, 8, 8, 32, 32, IPF_BGRA);
+  EXPECT_EQ(hslAdjustment(nullptr, kEveryBand), nullptr);
+  EXPECT_EQ(hslAdjustment(&empty, kEveryBand), &empty);
+  EXPECT_EQ(hslAdjustment(&headerOnly, kEveryBand), &headerOnly);
+}
+
+TEST(HSLAdjust, BandsMoveTheirOwnColours) {
+  const auto apply = [](tagRGBQUAD c, const HSLBands& bands) {
+    CxImage image(1, 1, 32, IPF_BGRA);
+    image.SetPixelColor(0, 0, c);
+    hslAdjustment(&image, bands);
+    return image.GetPixelColor(0, 0, true);
+  };
+  const auto expect = [](tagRGBQUAD got, int r, int g, int b) {
+    EXPECT_EQ(got.rgbRed, r);
+    EXPECT_EQ(got.rgbGreen, g);
+    EXPECT_EQ(got.rgbBlue, b);
+    EXPECT_EQ(got.rgbReserved, 77);
+  };
+  const tagRGBQUAD red{0, 0, 255, 77}, green{0, 255, 0, 77}, blue{255, 0, 0, 77};
+  // Hue +-100 lands on the neighbouring centres: orange at 30, magenta at 300 degrees.
+  expect(apply(red, Bands({{kHSLRed, {100, 0, 0, 0, 0}}})), 255, 128, 0);
+  expect(apply(red, Bands({{kHSLRed, {-100, 0, 0, 0, 0}}})), 255, 0, 255);
+  expect(apply(green, Bands({{kHSLRed, {-100, 0, 0, 0, 0}}})), 0, 255, 0);
+  expect(apply(green, Bands({{kHSLGreen, {0, -100, 0, 0, 0}}})), 128, 128, 128);
+  expect(apply(blue, Bands({{kHSLBlue, {0, 0, 100, 0, 0}}})), 255, 255, 255);
+  expect(apply(red, Bands({{kHSLRed, {0, 0, -100, 0, 0}}})), 0, 0, 0);
+  // Lightness fades out towards grey: chroma 16 gets a quarter.
+  expect(apply(tagRGBQUAD{100, 100, 116, 77}, Bands({{kHSLRed, {0, 0, -100, 0, 0}}})), 87, 75, 75);
+
+  // Neighbouring weights add up to 1 whatever the common softness, so desaturating every band
+  // greys every colour.
+  for (const float soft : {-100.0f, 0.0f, 100.0f}) {
+    HSLBands all{};
+    for (HSLBandValues& v : all.band) v = {0, -100, 0, 0, soft};
+    const Image image = NoiseImage(64, 16, 32, IPF_BGRA, 256, 3);
+    hslAdjustment(image.get(), all);
+    for (size_t i = 0; i < image->GetSize(); i += 4) {
+      const uint8_t* p = image->GetBits() + i;
+      ASSERT_TRUE(p[0] == p[1] && p[1] == p[2]) << soft << ' ' << i;
+    }
+  }
+}
+
+// The colours of the hexcone's hue circle at one chroma, in hue order.
+std::vector<tagRGBQUAD> HueCircle(int mx, int mn) {
+  std::vector<tagRGBQUAD> ring;
+  const int c = mx - mn;
+  for (int p = 0; p < 6 * c; ++p) {
+    const int sector = p / c, x = p % c;
+    const int rise = mn + x, fall = mx - x;
+    const int rgb[6][3] = {{mx, rise, mn}, {fall, mx, mn}, {mn, mx, rise},
+                           {mn, fall, mx}, {rise, mn, mx}, {mx, mn, fall}};
+    const int* v = rgb[sector];
+    ring.push_back(tagRGBQUAD{uint8_t(v[2]), uint8_t(v[1]), uint8_t(v[0]), 255});
+  }
+  return ring;
+}
+
+// Largest change of any channel between neighbouring colours of the ring, after the bands.
+int WorstStep(const std::vector<tagRGBQUAD>& ring, const HSLBands& bands) {
+  CxImage image(static_cast<unsigned>(ring.size()), 1, 32, IPF_BGRA);
+  std::memcpy(image.GetBits(), ring.data(), ring.size() * 4);
+  hslAdjustment(&image, bands);
+  int worst = 0;
+  for (size_t i = 0; i < ring.size(); ++i) {
+    const uint8_t* a = image.GetBits() + 4 * i;
+    const uint8_t* b = image.GetBits() + 4 * ((i + 1) % ring.size());
+    for (int ch = 0; ch < 3; ++ch) worst = std::max(worst, std::abs(a[ch] - b[ch]));
+  }
+  return worst;
+}
+
+TEST(HSLAdjust, HueSweepHasNoSeams) {
+  // Neighbouring colours of a ring differ by one level in one channel (0.24 to 1 degree of hue).
+  // Bands pulling opposite ways stretch that to several levels where their fades are steepest;
+  // a seam would jump by the whole difference between two bands: their lightness alone differs
+  // by 0.35 to 0.55 here, 40 levels and more.
+  const HSLBands moderate = Bands({{kHSLRed, {30, 40, -20, 0, 0}},
+                                   {kHSLOrange, {-25, -30, 20, 30, 40}},
+                                   {kHSLYellow, {40, 20, 25, -30, -50}},
+                                   {kHSLGreen, {-35, 50, -25, 0, 0}},
+                                   {kHSLAqua, {25, -40, 30, 50, 20}},
+                                   {kHSLBlue, {-40, 35, -30, 0, -30}},
+                                   {kHSLPurple, {30, -25, 20, -20, 60}},
+                                   {kHSLMagenta, {-20, 30, -15, 0, 0}}});
+  for (const auto& [mx, mn] : {std::pair{255, 0}, std::pair{200, 80}, std::pair{90, 30}}) {
+    EXPECT_LE(WorstStep(HueCircle(mx, mn), moderate), 16) << mx << ' ' << mn;
+  }
+}
+
+TEST(HSLAdjust, ThreadsWithDifferentSettingsKeepTheirOwnTables) {
+  const Image source = NoiseImage(128, 32, 32, IPF_BGRA, 512, 12);
+  const HSLBands* settings[2] = {&kEveryBand, &kRedOnly};
+  Image expected[2];
+  for (int t = 0; t < 2; ++t) {
+    expected[t] = Clone(*source);
+    hslAdjustment(expected[t].get(), *settings[t]);
+  }
+  bool same[2] = {true, true};
+  std::thread threads[2];
+  for (int t = 0; t < 2; ++t) {
+    threads[t] = std::thread([&, t] {
+      for (int round = 0; round < 30; ++round) {
+        const Image image = Clone(*source);
+        hslAdjustment(image.get(), *settings[(t + round) % 2]);
+        same[t] = same[t] && SameBuffer(*expected[(t + round) % 2], *image);
+      }
+    });
+  }
+  for (std::thread& t : threads) t.join();
+  EXPECT_TRUE(same[0]);
+  EXPECT_TRUE(same[1]);
+}
+
+}  // namespace
