@@ -1,0 +1,267 @@
+#include "tessarofx/Vignette.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <cstdint>
+#include <cstring>
+#include <memory>
+#include <utility>
+#include <vector>
+
+#include "adjust/ColorAdjustReference.h"
+#include "adjust/VignetteRows.h"
+
+namespace {
+
+using tfx_test::NoiseBytes;
+using tfx_test::SameBuffer;
+using Image = std::unique_ptr<CxImage>;
+
+// The mask straight from its definition, pixel by pixel over the whole frame.
+std::vector<float> ReferenceMask(int width, int height, float F, float S, float R) {
+  const float cx = float(width >> 1), cy = float(height >> 1);
+  float A = cx * 0.2f * (4.0f * S + 1.0f), B = cy * 0.2f * (4.0f * S + 1.0f);
+  if (R >= 0.0f) {
+    const float d = std::fabs(A - B) * R;
+    if (A > B) {
+      A -= d;
+    } else if (B > A) {
+      B -= d;
+    }
+  }
+  const float W = std::max(A, B) * 0.5f * F + 3.0f, A2 = A + W, B2 = B + W;
+  std::vector<float> mask(size_t(width) * size_t(height));
+  for (int y = 0; y < height; ++y) {
+    for (int x = 0; x < width; ++x) {
+      const float dx = std::fabs(float(x) - cx), dy = std::fabs(float(y) - cy);
+      float value = 0.0f;
+      if ((dx / A) * (dx / A) + (dy / B) * (dy / B) - 1.0f <= 0.0f) {
+        value = 1.0f;
+      } else if ((dx / A2) * (dx / A2) + (dy / B2) * (dy / B2) - 1.0f < 0.0f) {
+        const float t = (dy / (dx + 0.000001f)) * (dy / (dx + 0.000001f));
+        const float q = 1.0f / (t / (B2 * B2) + 1.0f / (A2 * A2));
+        const float edge = std::sqrt(t * q + q);
+        const float dist =
+            std::sqrt((cx - float(x)) * (cx - float(x)) + (cy - float(y)) * (cy - float(y)));
+        value = float((std::cos(double((W - (edge - dist)) * (3.1415927f / W))) + 1.0) * 0.5);
+      }
+      mask[size_t(y) * size_t(width) + size_t(x)] = value;
+    }
+  }
+  return mask;
+}
+
+// The blend straight from its definition.
+tagRGBQUAD ReferencePixel(tagRGBQUAD c, float g, float a, float e, float b) {
+  const float gain = (1.0f + a) * (1.0f - g) + e * g;
+  float ch[3] = {c.rgbRed * gain, c.rgbGreen * gain, c.rgbBlue * gain};
+  if (g < 1.0f) {
+    const float w =
+        (1.0f - (ch[0] + ch[1] + ch[2]) / 3.0f / 255.0f) * ((1.0f - g) * (1.0f - g)) * b;
+    for (float& v : ch) v = 255.0f - (255.0f - v) * (255.0f - w * v) / 255.0f;
+  }
+  uint8_t out[3];
+  for (int i = 0; i < 3; ++i) out[i] = ch[i] < 0.0f ? 0 : uint8_t(int(std::min(255.0f, ch[i])));
+  return tagRGBQUAD{out[2], out[1], out[0], c.rgbReserved};
+}
+
+bool SameQuad(tagRGBQUAD x, tagRGBQUAD y) { return std::memcmp(&x, &y, 4) == 0; }
+
+struct Setting {
+  float amount, feather, highlights, size, roundness, exposure;
+};
+
+// Both signs of amount and exposure, the curve on and off (highlights 50 makes b = 0), the
+// extremes of every control, and roundness on either side of 0.
+const Setting kSettings[] = {
+    {-60, 50, 50, 100, 0, 0},      {45, 30, 80, 40, 30, -70}, {-100, 100, 0, 0, 100, 35},
+    {100, 0, 100, 100, -50, -100}, {0, 70, 20, 60, 10, 25},   {-25, 50, 65, 75, 250, 150},
+};
+
+Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
+                 unsigned effWidth, uint32_t salt) {
+  std::vector<uint8_t> frame(size_t{effWidth} * height);
+  uint8_t* bits = frame.data();
+  Image image = std::make_unique<CxImage>();
+  image->Copy(CxImage(&bits, width, height, bpp, effWidth, format));
+  const std::vector<uint8_t> noise = NoiseBytes(image->GetSize(), salt);
+  std::memcpy(image->GetBits(), noise.data(), noise.size());
+  return image;
+}
+
+TEST(VignetteGradient, MatchesTheDefinitionOnEveryPixel) {
+  // Odd and even sizes put the centre on or off the middle; tiny frames make A or B zero.
+  const int sizes[][2] = {{1, 1}, {2, 3}, {17, 9}, {64, 48}, {101, 37}, {40, 1}, {9, 120}};
+  for (const auto& size : sizes) {
+    for (const Setting& s : kSettings) {
+      SCOPED_TRACE(testing::Message() << size[0] << 'x' << size[1] << " size " << s.size
+                                      << " feather " << s.feather << " round " << s.roundness);
+      const std::vector<float> expected =
+          ReferenceMask(size[0], size[1], s.feather / 100, s.size / 100, s.roundness / 100);
+      std::vector<float> actual(expected.size(), -1.0f);
+      generateGradient(size[0], size[1], s.feather / 100, s.size / 100, s.roundness / 100,
+                       actual.data());
+      ASSERT_EQ(0, std::memcmp(expected.data(), actual.data(), expected.size() * 4));
+    }
+  }
+}
+
+TEST(VignetteGradient, FollowsTheEllipseAtItsLandmarks) {
+  // 200 x 100: cx = 100, cy = 50. Size 0 gives semi-axes 20 and 10.
+  std::vector<float> mask(200 * 100);
+  const auto at = [&](int x, int y) { return mask[size_t(y) * 200 + size_t(x)]; };
+  generateGradient(200, 100, 0.5f, 0.0f, -1.0f, mask.data());
+  EXPECT_EQ(at(100, 50), 1.0f);
+  EXPECT_EQ(at(120, 50), 1.0f);
+  EXPECT_LT(at(121, 50), 1.0f);
+  EXPECT_EQ(at(100, 60), 1.0f);
+  EXPECT_LT(at(100, 61), 1.0f);
+  EXPECT_EQ(at(0, 0), 0.0f);
+  // Roundness 1 pulls the long axis down to the short one: a circle of radius 10.
+  generateGradient(200, 100, 0.5f, 0.0f, 1.0f, mask.data());
+  EXPECT_EQ(at(110, 50), 1.0f);
+  EXPECT_LT(at(111, 50), 1.0f);
+  EXPECT_EQ(at(100, 60), 1.0f);
+  // The feather band falls monotonically from 1 to 0 along a ray.
+  for (int x = 111; x < 199; ++x) EXPECT_LE(at(x + 1, 50), at(x, 50)) << x;
+  // A null mask is ignored.
+  generateGradient(200, 100, 0.5f, 0.0f, 1.0f, nullptr);
+  EXPECT_FLOAT_EQ(distance(1, 2, 4, 6), 5.0f);
+}
+
+// Every 24-bit colour once, with an alpha that varies on its own. Sanitizer builds take every
+// seventh colour.
+const std::vector<uint8_t>& EveryColour() {
+#if defined(TFX_SANITIZE_BUILD)
+  constexpr uint32_t kStep = 7;
+#else
+  constexpr uint32_t kStep = 1;
+#endif
+  static const std::vector<uint8_t> pixels = [] {
+    std::vector<uint8_t> all(size_t((1u << 24) + kStep - 1) / kStep * 4);
+    for (uint32_t i = 0; i < all.size() / 4; ++i) {
+      const uint32_t c = i * kStep;
+      const uint8_t px[4] = {uint8_t(c), uint8_t(c >> 8), uint8_t(c >> 16),
+                             uint8_t((i * 2654435761u) >> 24)};
+      std::memcpy(&all[size_t(i) * 4], px, 4);
+    }
+    return all;
+  }();
+  return pixels;
+}
+
+TEST(VignetteRow, MatchesThePixelFormOnEveryColour) {
+  // g = 1 takes a table, g = 0 another where b = 0 (highlights 50); everything else, g = 0 with
+  // a tone curve included, goes through the blended blocks.
+  const float darken = 1.0f, under = std::pow(2.0f, -0.7f), over = std::pow(2.0f, 0.35f);
+  const struct {
+    float a, e, b, g;
+  } cases[] = {{-0.6f, darken, 0.0f, 0.0f},  {-0.6f, darken, 0.0f, 1.0f},
+               {-0.6f, darken, 0.0f, 0.5f},  {-0.45f, under, 0.27f, 0.0f},
+               {-0.45f, under, 0.27f, 1.0f}, {-0.45f, under, 0.27f, 0.99999994f},
+               {0.8f, over, -0.8f, 0.0f},    {0.8f, over, -0.8f, 0.0173f}};
+  const std::vector<uint8_t>& all = EveryColour();
+  for (const auto& p : cases) {
+    SCOPED_TRACE(testing::Message() << "a " << p.a << " b " << p.b << " g " << p.g);
+    std::vector<uint8_t> expected = all;
+    for (size_t i = 0; i < all.size(); i += 4) {
+      tagRGBQUAD in;
+      std::memcpy(&in, &all[i], 4);
+      const tagRGBQUAD out = vignettePixel(in, p.g, p.a, p.e, p.b);
+      std::memcpy(&expected[i], &out, 4);
+      // The pixel form against the definition, on a sample of the colours.
+      if (i % 64 == 0) {
+        ASSERT_TRUE(SameQuad(out, ReferencePixel(in, p.g, p.a, p.e, p.b))) << "colour " << i / 4;
+      }
+    }
+    const std::vector<float> weights(4096, p.g);
+    for (const tfx::VignetteKernel* kernel : tfx::SupportedVignetteKernels()) {
+      SCOPED_TRACE(kernel->name);
+      const tfx::VignetteBlend blend = tfx::MakeVignetteBlend(p.a, p.e, p.b, *kernel);
+      ASSERT_EQ(blend.outsideByTable, p.b == 0.0f);
+      std::vector<uint8_t> actual = all;
+      for (size_t i = 0; i < actual.size() / 4; i += 4096) {
+        const size_t n = std::min<size_t>(4096, actual.size() / 4 - i);
+        tfx::VignetteRow(actual.data() + 4 * i, weights.data(), n, blend);
+      }
+      const auto diff = std::mismatch(expected.begin(), expected.end(), actual.begin());
+      ASSERT_TRUE(diff.first == expected.end())
+          << "colour " << (diff.first - expected.begin()) / 4 << " byte "
+          << (diff.first - expected.begin()) % 4 << ": " << int(*diff.second) << " instead of "
+          << int(*diff.first);
+    }
+  }
+}
+
+// The image function against the exported pieces, pixel by pixel through the accessors.
+void ReferenceFilter(CxImage* image, const Setting& s) {
+  if (s.amount == 0.0f && s.exposure == 0.0f) return;
+  const int w = int(image->GetWidth()), h = int(image->GetHeight());
+  std::vector<float> mask(size_t(w) * size_t(h));
+  generateGradient(w, h, s.feather / 100.0f, s.size / 100.0f, s.roundness / 100.0f, mask.data());
+  const float e = std::pow(2.0f, s.exposure / 100.0f);
+  const float a = s.amount / 100.0f;
+  const float b = std::fabs(a) * (2.0f * s.highlights / 100.0f - 1.0f);
+  for (int y = 0; y < h; ++y) {
+    for (int x = 0; x < w; ++x) {
+      const tagRGBQUAD c = image->GetPixelColor(x, y, true);
+      image->SetPixelColor(x, y, vignettePixel(c, mask[size_t(y) * size_t(w) + x], a, e, b));
+    }
+  }
+}
+
+TEST(Vignette, MatchesMaskAndPixelFormOnEveryLayout) {
+  const struct {
+    unsigned width, height, bpp, effWidth;
+    _ImagePixelFormat format;
+  } layouts[] = {{1, 1, 32, 4, IPF_BGRA},     {2, 3, 32, 8, IPF_BGRA},
+                 {67, 41, 32, 280, IPF_BGRA}, {130, 77, 32, 520, IPF_BGRA},
+                 {64, 48, 32, 256, IPF_RGBA}, {33, 20, 24, 100, IPF_BGR},
+                 {21, 13, 8, 24, IPF_Gray8}};
+  for (const auto& l : layouts) {
+    for (const Setting& s : kSettings) {
+      SCOPED_TRACE(testing::Message() << l.width << 'x' << l.height << '/' << l.bpp << " amount "
+                                      << s.amount << " exposure " << s.exposure);
+      const Image actual = NoiseImage(l.width, l.height, l.bpp, l.format, l.effWidth, l.width);
+      Image expected = std::make_unique<CxImage>();
+      expected->Copy(*actual);
+      ReferenceFilter(expected.get(), s);
+      EXPECT_EQ(vignetteAdjustFilter(actual.get(), s.amount, s.feather, s.highlights, s.size,
+                                     s.roundness, s.exposure),
+                actual.get());
+      ASSERT_TRUE(SameBuffer(*expected, *actual));
+    }
+  }
+}
+
+TEST(Vignette, LeavesImageUntouchedWithoutStrengthOrPixels) {
+  const Image image = NoiseImage(31, 17, 32, IPF_BGRA, 124, 4);
+  Image original = std::make_unique<CxImage>();
+  original->Copy(*image);
+  vignetteAdjustFilter(image.get(), 0.0f, 80.0f, 90.0f, 10.0f, 50.0f, 0.0f);
+  EXPECT_TRUE(SameBuffer(*original, *image));
+  CxImage empty;
+  uint8_t* none = nullptr;
+  CxImage headerOnly(&none, 8, 8, 32, 32, IPF_BGRA);
+  EXPECT_EQ(vignetteAdjustFilter(nullptr, 50, 50, 50, 50, 0, 50), nullptr);
+  EXPECT_EQ(vignetteAdjustFilter(&empty, 50, 50, 50, 50, 0, 50), &empty);
+  EXPECT_EQ(vignetteAdjustFilter(&headerOnly, 50, 50, 50, 50, 0, 50), &headerOnly);
+}
+
+TEST(Vignette, FullDarkeningBlackensTheOutsideAndKeepsAlpha) {
+  // Size 0 and no feather: the corners lie far outside. Exposure 0 keeps the centre.
+  const Image image = NoiseImage(80, 60, 32, IPF_BGRA, 320, 8);
+  Image original = std::make_unique<CxImage>();
+  original->Copy(*image);
+  vignetteAdjustFilter(image.get(), -100.0f, 0.0f, 50.0f, 0.0f, 0.0f, 0.0f);
+  for (const auto& [x, y] : {std::pair{0, 0}, std::pair{79, 59}, std::pair{0, 59}}) {
+    const tagRGBQUAD c = image->GetPixelColor(x, y, true);
+    EXPECT_EQ(c.rgbRed | c.rgbGreen | c.rgbBlue, 0);
+    EXPECT_EQ(c.rgbReserved, original->GetPixelColor(x, y, true).rgbReserved);
+  }
+  EXPECT_TRUE(SameQuad(image->GetPixelColor(40, 30, true), original->GetPixelColor(40, 30, true)));
+}
+
+}  // namespace
