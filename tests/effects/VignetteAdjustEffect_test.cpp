@@ -1,0 +1,91 @@
+#include <gtest/gtest.h>
+
+#include <random>
+#include <vector>
+
+#include "support/TestFrame.h"
+#include "tessarofx/NLEHost.h"
+#include "tessarofx/TessaroFx.h"
+#include "tessarofx/Vignette.h"
+
+namespace {
+
+namespace Key = NLEKey::Filter;
+using Params = std::vector<std::pair<const wchar_t*, double>>;
+
+NLEComPtr<INLECGFilter> CreateVignette(const Params& values) {
+  NLEComPtr<INLEProperties> props;
+  NLECommon::CreateProperties(&props);
+  int i = 0;
+  for (const auto& [name, value] : values) {
+    NLEComPtr<INLEProperties> p;
+    NLECommon::CreateProperties(&p);
+    p->SetString(Key::Property::kVariantName, name);
+    p->SetString(Key::Property::kFriendName, name);
+    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
+    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
+  }
+  props->SetInt(Key::Property::kCount, i);
+  NLEComPtr<INLECGFilter> filter;
+  EXPECT_EQ(CreateFilterFromGUID(nullptr, L"8622FC58-4DF1-44BD-9B37-2F633D4D3368", props, nullptr,
+                                 reinterpret_cast<void**>(&filter)),
+            NLE_S_OK);
+  return filter;
+}
+
+TEST(VignetteAdjustEffect, PassesEachParameterToItsArgumentWithItsDefault) {
+  // Distinct values show the argument order; the short lists show the values of missing
+  // parameters (size 100, feather 50, highlights 50, roundness and exposure 0).
+  const struct {
+    Params params;
+    float amount, feather, highlights, size, roundness, exposure;
+  } cases[] = {
+      {{{L"amount", -40},
+        {L"size", 30},
+        {L"roundness", 60},
+        {L"feather", 80},
+        {L"exposure", 25},
+        {L"highlights", 70}},
+       -40,
+       80,
+       70,
+       30,
+       60,
+       25},
+      {{{L"amount", -70}}, -70, 50, 50, 100, 0, 0},
+      {{{L"exposure", -60}, {L"roundness", 20}}, 0, 50, 50, 100, 20, -60},
+      {{{L"feather", 10}, {L"size", 5}}, 0, 10, 50, 5, 0, 0},  // no strength: passed through
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(testing::Message() << "amount " << c.amount << " exposure " << c.exposure);
+    NLEComPtr<INLECGFilter> filter = CreateVignette(c.params);
+    TestFrame* fg = new TestFrame(61, 35);
+    TestFrame* dst = new TestFrame(61, 35, 260);  // padded rows go through a private copy
+    NLEComPtr<INLEFrame> h1(fg), h2(dst);
+    std::mt19937 rng(61);
+    for (auto& b : fg->pixels) b = static_cast<uint8_t>(rng());
+    filter->SetForeground(fg);
+    ASSERT_EQ(filter->Running(dst), NLE_S_OK);
+
+    std::vector<uint8_t> expected = fg->pixels;
+    uint8_t* bits = expected.data();
+    CxImage image(&bits, 61, 35, 32, 61 * 4, IPF_BGRA);
+    vignetteAdjustFilter(&image, c.amount, c.feather, c.highlights, c.size, c.roundness,
+                         c.exposure);
+    for (int y = 0; y < 35; ++y) {
+      ASSERT_TRUE(std::equal(dst->Row(y), dst->Row(y) + 61 * 4, bits + y * 61 * 4)) << y;
+    }
+  }
+}
+
+TEST(VignetteAdjustEffect, MissingForegroundIsABadArgument) {
+  NLEComPtr<INLECGFilter> filter = CreateVignette({{L"amount", -50}});
+  TestFrame* bg = new TestFrame(2, 2);
+  TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
+  NLEComPtr<INLEFrame> h1(bg), h2(dst);
+  filter->SetBackground(bg);
+  EXPECT_EQ(filter->Running(dst), NLE_E_INVALIDARG);
+  EXPECT_EQ(dst->pixels[0], 9);
+}
+
+}  // namespace
