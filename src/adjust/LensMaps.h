@@ -1,0 +1,75 @@
+// The coordinate maps behind distortFilter and fringingFilter, and the cache that holds them, for
+// tests to inspect.
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <memory>
+#include <utility>
+
+#include "tessarofx/CxImage.h"
+
+namespace tfx {
+
+// A source coordinate, truncated to 16 bits.
+struct LensPoint {
+  int16_t x;
+  int16_t y;
+};
+
+// width * height points per plane, row-major. Distortion uses plane 0 only; fringing uses all
+// three: blue, green (and alpha), red.
+struct LensMaps {
+  float ratio = 0.0f;
+  int width = 0;
+  int height = 0;
+  std::unique_ptr<LensPoint[]> plane[3];
+  std::atomic<int> holders{1};  // the cache and the calls using the set
+};
+
+// A counted reference to a map set, which lives while the cache or any call holds one. (A
+// std::shared_ptr would do, but its control block's type information would leak out of the
+// plug-in as exported symbols.)
+class LensMapsRef {
+ public:
+  LensMapsRef() = default;
+  explicit LensMapsRef(LensMaps* adopt) : maps_(adopt) {}
+  LensMapsRef(const LensMapsRef& other) : maps_(other.maps_) {
+    if (maps_) maps_->holders.fetch_add(1, std::memory_order_relaxed);
+  }
+  LensMapsRef(LensMapsRef&& other) noexcept : maps_(std::exchange(other.maps_, nullptr)) {}
+  LensMapsRef& operator=(LensMapsRef other) noexcept {
+    std::swap(maps_, other.maps_);
+    return *this;
+  }
+  ~LensMapsRef() {
+    if (maps_ && maps_->holders.fetch_sub(1, std::memory_order_acq_rel) == 1) delete maps_;
+  }
+
+  const LensMaps* get() const { return maps_; }
+  const LensMaps* operator->() const { return maps_; }
+  explicit operator bool() const { return maps_ != nullptr; }
+  bool operator==(const LensMapsRef& other) const { return maps_ == other.maps_; }
+  bool operator!=(const LensMapsRef& other) const { return maps_ != other.maps_; }
+
+ private:
+  LensMaps* maps_ = nullptr;
+};
+
+// The cached maps for these settings, built (and cached) when missing; empty when the memory is
+// not available. The result stays valid while held, whatever other threads do to the cache.
+LensMapsRef DistortMaps(float d, int width, int height);
+LensMapsRef FringingMaps(float f, int width, int height);
+
+// Maps built since the library was loaded.
+uint64_t LensMapBuilds();
+
+// The resampling steps of distortFilter and fringingFilter (which pass a copy of the image),
+// reading from `source`, which must be laid out like `target`. Every pixel the step covers is
+// written, so `target` need not hold the source's pixels beforehand; row padding is not touched.
+// False, with `target` untouched, for a zero strength, a missing buffer, differing layouts or
+// maps that cannot be allocated.
+bool DistortFrom(const CxImage& source, CxImage* target, float d);
+bool FringeFrom(const CxImage& source, CxImage* target, float f);
+
+}  // namespace tfx

@@ -1,0 +1,259 @@
+#include "tessarofx/LensAdjust.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <cmath>
+#include <cstdint>
+#include <cstring>
+#include <memory>
+#include <thread>
+#include <vector>
+
+#include "adjust/ColorAdjustReference.h"
+#include "adjust/LensMaps.h"
+
+namespace {
+
+using tfx_test::NoiseBytes;
+using tfx_test::SameBuffer;
+using Image = std::unique_ptr<CxImage>;
+using Map = std::vector<tfx::LensPoint>;
+
+// The maps straight from their definitions, pixel by pixel.
+Map ReferenceDistortMap(float d, int w, int h) {
+  const float k = d / 100.0f, cx = float(w >> 1), cy = float(h >> 1);
+  const float diagonal = std::sqrt(cx * cx + cy * cy);
+  const float nx = k < 0.0f ? float(w) : diagonal, ny = k < 0.0f ? float(h) : diagonal;
+  const double e = k > 0.0f ? 3.0 : 6.0;
+  Map map;
+  for (int y = 0; y < h; ++y) {
+    for (int x = 0; x < w; ++x) {
+      const float u = (float(x) - cx) / nx, v = (float(y) - cy) / ny;
+      const float r = std::sqrt(u * u + v * v);
+      const float c = r == 0.0f ? 0.0f : u / r, s = r == 0.0f ? 0.0f : v / r;
+      const float rp =
+          (float(std::pow(double(r), e)) * k + r) * (k >= 0.0f ? 1.0f / (k + 1.0f) : 1.0f);
+      map.push_back({int16_t(int(c * rp * nx + cx)), int16_t(int(s * rp * ny + cy))});
+    }
+  }
+  return map;
+}
+
+// Blue, green, red.
+std::vector<Map> ReferenceFringingMaps(float f, int w, int h) {
+  const float k = f / 100.0f, cx = float(w >> 1), cy = float(h >> 1);
+  const double s = 1 + 0.03 * k, t = 1 - 0.03 * k, m = k > 0.0f ? 2.0 : 1.0;
+  const auto clamp = [](double v, double hi) {
+    return int16_t(int(std::max(0.0, std::min(v, hi))));
+  };
+  std::vector<Map> maps(3);
+  for (int y = 0; y < h; ++y) {
+    for (int x = 0; x < w; ++x) {
+      const float u = (float(x) - cx) / float(w), v = (float(y) - cy) / float(h);
+      const float r = std::sqrt(u * u + v * v);
+      const float c = r == 0.0f ? 0.0f : u / r, sn = r == 0.0f ? 0.0f : v / r;
+      const double R = (std::pow(double(r), 10.0) * k + r) * s;
+      maps[0].push_back({clamp(t * c * R * w + cx, w - m), clamp(t * sn * R * h + cy, h - m)});
+      maps[1].push_back({clamp(c * R * w + cx, w - m), clamp(sn * R * h + cy, h - m)});
+      maps[2].push_back({clamp(s * c * R * w + cx, w - m), clamp(s * sn * R * h + cy, h - m)});
+    }
+  }
+  return maps;
+}
+
+// width * height pixels from the first byte; the horizontal source is a byte offset.
+void ReferenceDistort(CxImage* image, const Map& map) {
+  const size_t bytes = image->GetBpp() / 8, row = image->GetWidth() * bytes;
+  const std::vector<uint8_t> copy(image->GetBits(), image->GetBits() + image->GetSize());
+  for (size_t i = 0; i < map.size(); ++i) {
+    const int64_t pos = int64_t(map[i].y) * int64_t(row) + map[i].x;
+    if (pos < 0 || size_t(pos) + bytes > copy.size()) continue;
+    std::memcpy(image->GetBits() + i * bytes, &copy[size_t(pos)], bytes);
+  }
+}
+
+void ReferenceFringing(CxImage* image, const std::vector<Map>& maps) {
+  CxImage copy;
+  copy.Copy(*image);
+  for (unsigned y = 0, i = 0; y < image->GetHeight(); ++y) {
+    for (unsigned x = 0; x < image->GetWidth(); ++x, ++i) {
+      const auto at = [&](int plane) {
+        return copy.GetPixelColor(maps[plane][i].x, maps[plane][i].y, true);
+      };
+      const tagRGBQUAD g = at(1);
+      image->SetPixelColor(x, y, {at(0).rgbBlue, g.rgbGreen, at(2).rgbRed, g.rgbReserved});
+    }
+  }
+}
+
+bool SameMap(const tfx::LensPoint* actual, const Map& expected) {
+  return std::memcmp(actual, expected.data(), expected.size() * sizeof(tfx::LensPoint)) == 0;
+}
+
+Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
+                 unsigned effWidth, uint32_t salt) {
+  std::vector<uint8_t> frame(size_t{effWidth} * height);
+  uint8_t* bits = frame.data();
+  Image image = std::make_unique<CxImage>();
+  image->Copy(CxImage(&bits, width, height, bpp, effWidth, format));
+  const std::vector<uint8_t> noise = NoiseBytes(image->GetSize(), salt);
+  std::memcpy(image->GetBits(), noise.data(), noise.size());
+  return image;
+}
+
+Image Clone(const CxImage& image) {
+  Image copy = std::make_unique<CxImage>();
+  copy->Copy(image);
+  return copy;
+}
+
+const int kSizes[][2] = {{1, 1}, {2, 2}, {3, 5}, {17, 9}, {64, 48}, {101, 37}};
+
+TEST(LensMaps, MatchTheDefinitionsAndStayInTheFrame) {
+  // Beyond +-100 the distortion map is still built as defined; only sampling is guarded.
+  const float distortions[] = {-100, -37.5f, 10, 100, 250};
+  const float fringings[] = {-100, -20, 15, 100, 400};
+  for (const auto& size : kSizes) {
+    const int w = size[0], h = size[1];
+    for (const float d : distortions) {
+      SCOPED_TRACE(testing::Message() << w << 'x' << h << " distortion " << d);
+      const auto maps = tfx::DistortMaps(d, w, h);
+      ASSERT_TRUE(maps);
+      ASSERT_TRUE(SameMap(maps->plane[0].get(), ReferenceDistortMap(d, w, h)));
+      const tfx::LensPoint centre = maps->plane[0][size_t(h >> 1) * w + (w >> 1)];
+      EXPECT_EQ(centre.x, w >> 1);
+      EXPECT_EQ(centre.y, h >> 1);
+    }
+    for (const float f : fringings) {
+      SCOPED_TRACE(testing::Message() << w << 'x' << h << " fringing " << f);
+      const auto maps = tfx::FringingMaps(f, w, h);
+      ASSERT_TRUE(maps);
+      const std::vector<Map> expected = ReferenceFringingMaps(f, w, h);
+      const int margin = f > 0 ? 2 : 1;
+      for (int p = 0; p < 3; ++p) {
+        ASSERT_TRUE(SameMap(maps->plane[p].get(), expected[p])) << "plane " << p;
+        const tfx::LensPoint centre = maps->plane[p][size_t(h >> 1) * w + (w >> 1)];
+        if (w > margin && h > margin) {
+          EXPECT_EQ(centre.x, w >> 1);
+          EXPECT_EQ(centre.y, h >> 1);
+        }
+        for (size_t i = 0; i < size_t(w) * h; ++i) {
+          ASSERT_GE(maps->plane[p][i].x, 0);
+          ASSERT_LE(maps->plane[p][i].x, std::max(0, w - margin));
+          ASSERT_GE(maps->plane[p][i].y, 0);
+          ASSERT_LE(maps->plane[p][i].y, std::max(0, h - margin));
+        }
+      }
+    }
+  }
+}
+
+TEST(Lens, ResamplesLikeTheDefinitionsOnEveryLayout) {
+  // Padded BGRA rows show that distortion walks packed pixels while fringing honours the
+  // stride; 24- and 8-bit images take the byte walk and the accessors with other pixel sizes.
+  // A distortion of -2000 sends sources outside the buffer, where the walk must not read; past
+  // 32767 pixels coordinates wrap negative and read as zero.
+  const struct {
+    unsigned width, height, bpp, effWidth;
+    _ImagePixelFormat format;
+  } layouts[] = {{64, 48, 32, 256, IPF_BGRA},     {67, 41, 32, 300, IPF_BGRA},
+                 {40, 30, 32, 160, IPF_RGBA},     {33, 20, 24, 100, IPF_BGR},
+                 {21, 13, 8, 24, IPF_Gray8},      {3, 2, 32, 12, IPF_BGRA},
+                 {32800, 2, 32, 131200, IPF_BGRA}};
+  for (const auto& l : layouts) {
+    const int w = int(l.width), h = int(l.height);
+    for (const float s : {-2000.0f, -100.0f, -30.0f, 45.0f, 100.0f, 180.0f}) {
+      SCOPED_TRACE(testing::Message() << w << 'x' << h << '/' << l.bpp << " strength " << s);
+      const Image original = NoiseImage(l.width, l.height, l.bpp, l.format, l.effWidth, l.width);
+      Image actual = Clone(*original), expected = Clone(*original);
+      EXPECT_EQ(distortFilter(actual.get(), s), actual.get());
+      ReferenceDistort(expected.get(), ReferenceDistortMap(s, w, h));
+      ASSERT_TRUE(SameBuffer(*expected, *actual));
+
+      actual = Clone(*original);
+      expected = Clone(*original);
+      EXPECT_EQ(fringingFilter(actual.get(), s), actual.get());
+      ReferenceFringing(expected.get(), ReferenceFringingMaps(s, w, h));
+      ASSERT_TRUE(SameBuffer(*expected, *actual));
+    }
+  }
+}
+
+TEST(LensCache, ReusesMapsUntilStrengthSizeOrReleaseChanges) {
+  releaseLensVariables();
+  const uint64_t start = tfx::LensMapBuilds();
+  const auto builds = [&] { return tfx::LensMapBuilds() - start; };
+
+  // Zero strengths, null and empty images: untouched, nothing built.
+  const Image image = NoiseImage(40, 30, 32, IPF_BGRA, 160, 3);
+  const Image original = Clone(*image);
+  EXPECT_EQ(distortFilter(image.get(), 0.0f), image.get());
+  EXPECT_EQ(fringingFilter(image.get(), 0.0f), image.get());
+  CxImage empty;
+  EXPECT_EQ(distortFilter(&empty, 10.0f), &empty);
+  EXPECT_EQ(fringingFilter(nullptr, 10.0f), nullptr);
+  EXPECT_TRUE(SameBuffer(*original, *image));
+  EXPECT_EQ(builds(), 0u);
+
+  const auto first = tfx::DistortMaps(10.0f, 40, 30);
+  EXPECT_EQ(builds(), 1u);
+  distortFilter(image.get(), 10.0f);
+  EXPECT_EQ(tfx::DistortMaps(10.0f, 40, 30), first);
+  EXPECT_EQ(builds(), 1u);
+  const auto changed = tfx::DistortMaps(10.5f, 40, 30);
+  EXPECT_NE(changed, first);
+  EXPECT_NE(tfx::DistortMaps(10.5f, 41, 30), changed);
+  EXPECT_EQ(builds(), 3u);
+
+  // Two sets are kept: the most recently used survives a third setting, the other goes.
+  EXPECT_EQ(tfx::DistortMaps(10.5f, 40, 30), changed);
+  EXPECT_EQ(builds(), 3u);
+  tfx::DistortMaps(20.0f, 40, 30);
+  EXPECT_EQ(tfx::DistortMaps(10.5f, 40, 30), changed);
+  EXPECT_EQ(builds(), 4u);
+
+  const auto fringing = tfx::FringingMaps(10.0f, 40, 30);
+  EXPECT_EQ(tfx::FringingMaps(10.0f, 40, 30), fringing);
+  EXPECT_EQ(builds(), 5u);
+
+  // After a release every setting is rebuilt; maps still held stay readable.
+  releaseLensVariables();
+  EXPECT_NE(tfx::DistortMaps(10.5f, 40, 30), changed);
+  EXPECT_NE(tfx::FringingMaps(10.0f, 40, 30), fringing);
+  EXPECT_EQ(builds(), 7u);
+  EXPECT_EQ(changed->plane[0][0].x, ReferenceDistortMap(10.5f, 40, 30)[0].x);
+}
+
+TEST(LensCache, FiltersOnTwoThreadsGetTheSingleThreadedResults) {
+  // Four settings over two threads keep evicting each other's maps, and one thread keeps
+  // releasing them; every frame must still come out as it does alone.
+  const struct {
+    unsigned width, height;
+    float distortion, fringing;
+  } jobs[] = {{64, 40, 30, 45}, {64, 40, -20, -60}, {48, 36, 80, 15}, {80, 50, -75, 90}};
+  std::vector<Image> inputs, expected;
+  releaseLensVariables();
+  for (const auto& job : jobs) {
+    inputs.push_back(NoiseImage(job.width, job.height, 32, IPF_BGRA, job.width * 4, job.width));
+    expected.push_back(Clone(*inputs.back()));
+    fringingFilter(distortFilter(expected.back().get(), job.distortion), job.fringing);
+  }
+  constexpr int kIterations = 300;
+  std::atomic<int> mismatches{0};
+  const auto worker = [&](int firstJob, bool release) {
+    for (int i = 0; i < kIterations; ++i) {
+      const int j = firstJob + i % 2;
+      const Image frame = Clone(*inputs[j]);
+      fringingFilter(distortFilter(frame.get(), jobs[j].distortion), jobs[j].fringing);
+      if (!SameBuffer(*expected[j], *frame)) ++mismatches;
+      if (release && i % 16 == 15) releaseLensVariables();
+    }
+  };
+  std::thread a(worker, 0, false), b(worker, 2, true);
+  a.join();
+  b.join();
+  EXPECT_EQ(mismatches.load(), 0);
+}
+
+}  // namespace
