@@ -47,7 +47,7 @@ std::vector<DemoStep> DemoSteps(const std::string& lutPath) {
        ""},
       {"DistortionFringingAdjust", {{"distortion", "30"}, {"fringing", "60"}}, "", ""},
       {"ColorLut3dAdjust", {{"lut3dPath", lutPath}}, "", ""},
-      {"HSLAdjust", {}, "", ""},
+      {"HSLAdjust", {{"u_green_hue", "60"}, {"u_red_sat", "40"}, {"u_blue_light", "-30"}}, "", ""},
       {"ChromeKeyLut3d",
        {{"red", std::to_string(key.r)},
         {"green", std::to_string(key.g)},

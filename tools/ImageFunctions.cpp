@@ -1,6 +1,5 @@
 #include "ImageFunctions.h"
 
-#include <memory>
 #include <new>
 #include <opencv2/imgproc.hpp>
 #include <type_traits>
@@ -9,6 +8,12 @@
 #include "Text.h"
 #include "tessarofx/ColorAdjust.h"
 #include "tessarofx/CxImage.h"
+#include "tessarofx/HSLAdjust.h"
+#include "tessarofx/HueAdjust.h"
+#include "tessarofx/LensAdjust.h"
+#include "tessarofx/LightAdjust.h"
+#include "tessarofx/Vignette.h"
+#include "tessarofx/WhiteBalance.h"
 
 namespace tfxtool {
 namespace {
@@ -23,11 +28,25 @@ using ImageFloatFn = CxImage* (*)(CxImage*, float);
 using ImageLongFn = CxImage* (*)(CxImage*, long);
 using ImageFloat6Fn = CxImage* (*)(CxImage*, float, float, float, float, float, float);
 using NewImageFn = CxImage* (*)(int, int);
+using HslFn = CxImage* (*)(CxImage*, const HSLBands&);
 static_assert(std::is_same_v<decltype(&exposureAdjustment), ImageFloatFn>);
 static_assert(std::is_same_v<decltype(&brightnessAdjustment), ImageFloatFn>);
 static_assert(std::is_same_v<decltype(&contrastAdjustment), ImageFloatFn>);
 static_assert(std::is_same_v<decltype(&vibranceAdjustment), ImageFloatFn>);
 static_assert(std::is_same_v<decltype(&saturationAdjustment), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&hdrHighlight), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&hdrShadow), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&hdrWhiteLevel), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&hdrBlackLevel), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&whiteBalanceAdjustment), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&tintAdjustment), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&temperatureAdjustment), ImageLongFn>);
+static_assert(std::is_same_v<decltype(&createTemperateColor), NewImageFn>);
+static_assert(std::is_same_v<decltype(&vignetteAdjustFilter), ImageFloat6Fn>);
+static_assert(std::is_same_v<decltype(&distortFilter), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&fringingFilter), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&hueAdjustment), ImageFloatFn>);
+static_assert(std::is_same_v<decltype(&hslAdjustment), HslFn>);
 
 // The functions take a CxImage, whose constructor and destructor also live in the plug-in.
 // Rather than asking the library for a factory it does not have, the tool does what the
@@ -41,6 +60,13 @@ using WrapCtorFn = void (*)(CxImage*, unsigned char**, unsigned, unsigned, unsig
 using DtorFn = void (*)(CxImage*);
 constexpr const char* kWrapCtorSymbol = "_ZN7CxImageC1EPPhjjjj17_ImagePixelFormat";
 constexpr const char* kDtorSymbol = "_ZN7CxImageD1Ev";
+// An image the plug-in made is read and freed through its own code as well: the pixel reader
+// and the deleting destructor (D0), called like the constructor with `this` first. The tool
+// never calls a CxImage member itself, as that would need the class's type information.
+using GetPixelFn = tagRGBQUAD (*)(const CxImage*, unsigned long, unsigned long, bool);
+using DeleteFn = void (*)(CxImage*);
+constexpr const char* kGetPixelSymbol = "_ZNK7CxImage13GetPixelColorEmmb";
+constexpr const char* kDeleteSymbol = "_ZN7CxImageD0Ev";
 
 // A non-owning CxImage over a BGRA matrix, alive for one call.
 class WrappedImage {
@@ -68,6 +94,33 @@ Status Resolve(const PluginLibrary& plugin, const char* symbol, Fn* fn) {
   void* p = plugin.Symbol(symbol, &why);
   if (!p) return Status::Error(std::string("the plug-in does not export ") + symbol + ": " + why);
   *fn = reinterpret_cast<Fn>(p);
+  return Status::Ok();
+}
+
+// Calls an image-making function with the input's size and copies the new image, read pixel by
+// pixel, into `bgra` (opaque). Such images are 24-bit and tagged RGB.
+Status MakeNewImage(const PluginLibrary& plugin, const ImageFunction& fn, cv::Mat* bgra) {
+  NewImageFn create = nullptr;
+  GetPixelFn getPixel = nullptr;
+  DeleteFn destroy = nullptr;
+  if (Status s = Resolve(plugin, fn.symbol, &create); !s.ok()) return s;
+  if (Status s = Resolve(plugin, kGetPixelSymbol, &getPixel); !s.ok()) return s;
+  if (Status s = Resolve(plugin, kDeleteSymbol, &destroy); !s.ok()) return s;
+  CxImage* made = create(bgra->cols, bgra->rows);
+  if (!made) return Status::Error(std::string(fn.function) + " made no image");
+  for (int y = 0; y < bgra->rows; ++y) {
+    uint8_t* row = bgra->ptr<uint8_t>(y);
+    for (int x = 0; x < bgra->cols; ++x) {
+      const tagRGBQUAD c =
+          getPixel(made, static_cast<unsigned long>(x), static_cast<unsigned long>(y), false);
+      // Made images store blue, green, red under an RGB tag, so the reader's red is blue.
+      row[4 * x] = c.rgbRed;
+      row[4 * x + 1] = c.rgbGreen;
+      row[4 * x + 2] = c.rgbBlue;
+      row[4 * x + 3] = 255;
+    }
+  }
+  destroy(made);
   return Status::Ok();
 }
 
@@ -107,6 +160,94 @@ const std::vector<ImageFunction>& ImageFunctions() {
        FxKind::kImageFloat,
        {{"VALUE", -1000, 1000}},
        "-100 gives grey, above 0 strengthens colour"},
+      {"highlight",
+       "hdrHighlight",
+       "_Z12hdrHighlightP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -100, 100}},
+       "brightens (or darkens) pixels by their brightest channel"},
+      {"shadow",
+       "hdrShadow",
+       "_Z9hdrShadowP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -100, 100}},
+       "lifts (or deepens) dark pixels; the lift is 4x the cut"},
+      {"white-level",
+       "hdrWhiteLevel",
+       "_Z13hdrWhiteLevelP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -100, 100}},
+       "moves the white point: above 0 the curve is applied twice"},
+      {"black-level",
+       "hdrBlackLevel",
+       "_Z13hdrBlackLevelP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -100, 100}},
+       "moves the black point, weighted towards dark pixels"},
+      {"auto-white",
+       "whiteBalanceAdjustment",
+       "_Z22whiteBalanceAdjustmentP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -500, 500}},
+       "scales channels so the brightest v/500 of the pixels average to white"},
+      {"temperature",
+       "temperatureAdjustment",
+       "_Z21temperatureAdjustmentP7CxImagel",
+       FxKind::kImageLong,
+       {{"VALUE", 0, 30000}},
+       "tints towards a black-body colour; 11500 is neutral, the mapping jumps there"},
+      {"tint",
+       "tintAdjustment",
+       "_Z14tintAdjustmentP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -100, 100}},
+       "above 0 towards magenta, below 0 towards green"},
+      {"temperature-colors",
+       "createTemperateColor",
+       "_Z20createTemperateColorii",
+       FxKind::kNewImage,
+       {},
+       "a black-body gradient of the input's size, 30000 K down by 100 K a column"},
+      {"vignette",
+       "vignetteAdjustFilter",
+       "_Z20vignetteAdjustFilterP7CxImageffffff",
+       FxKind::kImageFloat6,
+       {{"AMOUNT", -100, 100},
+        {"FEATHER", 0, 100},
+        {"HIGHLIGHTS", 0, 100},
+        {"SIZE", 0, 100},
+        {"ROUNDNESS", -100, 100},
+        {"EXPOSURE", -100, 100}},
+       "darkens or lightens outside a centred ellipse (arguments in the function's order)"},
+      {"distort",
+       "distortFilter",
+       "_Z13distortFilterP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -100, 100}},
+       "above 0 barrel, below 0 pincushion"},
+      {"fringing",
+       "fringingFilter",
+       "_Z14fringingFilterP7CxImagef",
+       FxKind::kImageFloat,
+       {{"VALUE", -100, 100}},
+       "red and blue drift apart towards the edges"},
+      {"hue",
+       "hueAdjustment",
+       "_Z13hueAdjustmentP7CxImagef",
+       FxKind::kImageFloat,
+       {{"DEGREES", -360, 360}},
+       "rotates hue about the grey axis"},
+      {"hsl",
+       "hslAdjustment",
+       "_Z13hslAdjustmentP7CxImageRK8HSLBands",
+       FxKind::kHslBand,
+       {{"BAND", 0, 7},
+        {"HUE", -100, 100},
+        {"SAT", -100, 100},
+        {"LIGHT", -100, 100},
+        {"WIDTH", -100, 100},
+        {"SOFT", -100, 100}},
+       "one colour band (0 red, 1 orange, 2 yellow, 3 green, 4 aqua, 5 blue, 6 purple, 7 magenta)"},
   };
   return kFunctions;
 }
@@ -115,6 +256,8 @@ const std::vector<SupportSymbol>& ImageSupportSymbols() {
   static const std::vector<SupportSymbol> kSymbols = {
       {"CxImage wrapping constructor", kWrapCtorSymbol},
       {"CxImage destructor", kDtorSymbol},
+      {"CxImage pixel reader", kGetPixelSymbol},
+      {"CxImage deleting destructor", kDeleteSymbol},
   };
   return kSymbols;
 }
@@ -158,20 +301,7 @@ Status CallImageFunction(const PluginLibrary& plugin, const ImageCall& call, cv:
   const ImageFunction& fn = *call.function;
   const std::vector<double>& v = call.values;
   const auto f = [&](size_t i) { return static_cast<float>(v[i]); };
-  if (fn.kind == FxKind::kNewImage) {
-    NewImageFn create = nullptr;
-    if (Status s = Resolve(plugin, fn.symbol, &create); !s.ok()) return s;
-    // The new image belongs to the caller; its virtual destructor frees it through the plug-in.
-    std::unique_ptr<CxImage> made(create(bgra->cols, bgra->rows));
-    if (!made || !made->GetBits() || made->GetBpp() != 24) {
-      return Status::Error(std::string(fn.function) + " made no image");
-    }
-    // The maker stores blue, green, red whatever its format tag says.
-    const cv::Mat bgr(static_cast<int>(made->GetHeight()), static_cast<int>(made->GetWidth()),
-                      CV_8UC3, made->GetBits(), made->GetEffWidth());
-    cv::cvtColor(bgr, *bgra, cv::COLOR_BGR2BGRA);
-    return Status::Ok();
-  }
+  if (fn.kind == FxKind::kNewImage) return MakeNewImage(plugin, fn, bgra);
 
   WrapCtorFn ctor = nullptr;
   DtorFn dtor = nullptr;
@@ -195,6 +325,14 @@ Status CallImageFunction(const PluginLibrary& plugin, const ImageCall& call, cv:
       ImageFloat6Fn call6 = nullptr;
       if (Status s = Resolve(plugin, fn.symbol, &call6); !s.ok()) return s;
       call6(image.image(), f(0), f(1), f(2), f(3), f(4), f(5));
+      return Status::Ok();
+    }
+    case FxKind::kHslBand: {
+      HslFn callHsl = nullptr;
+      if (Status s = Resolve(plugin, fn.symbol, &callHsl); !s.ok()) return s;
+      HSLBands bands{};
+      bands.band[static_cast<int>(v[0])] = HSLBandValues{f(1), f(2), f(3), f(4), f(5)};
+      callHsl(image.image(), bands);
       return Status::Ok();
     }
     case FxKind::kNewImage:

@@ -18,6 +18,7 @@ enum class FxKind {
   kImageLong,    // CxImage* f(CxImage*, long), in place
   kImageFloat6,  // CxImage* f(CxImage*, float, float, float, float, float, float), in place
   kNewImage,     // CxImage* f(int width, int height): a new image of the input's size
+  kHslBand,      // CxImage* f(CxImage*, const HSLBands&), one band set from five arguments
 };
 
 // One numeric argument: its name in the usage text and the range where the function's
