@@ -45,7 +45,9 @@ std::vector<DemoStep> DemoSteps(const std::string& lutPath) {
        {{"amount", "-60"}, {"size", "40"}, {"roundness", "50"}, {"feather", "60"}},
        "",
        ""},
-      {"DistortionFringingAdjust", {{"distortion", "30"}, {"fringing", "60"}}, "", ""},
+      // The distortion resamples with a byte offset and so scrambles channels at any strength;
+      // the demo shows the fringing, which resamples whole pixels.
+      {"DistortionFringingAdjust", {{"distortion", "0"}, {"fringing", "100"}}, "", ""},
       {"ColorLut3dAdjust", {{"lut3dPath", lutPath}}, "", ""},
       {"HSLAdjust", {{"u_green_hue", "60"}, {"u_red_sat", "40"}, {"u_blue_light", "-30"}}, "", ""},
       {"ChromeKeyLut3d",
