@@ -7,7 +7,12 @@
 #include <cstdint>
 #include <cstring>
 #include <random>
+#include <string>
+#include <utility>
 #include <vector>
+
+#include "tessarofx/NLEHost.h"
+#include "tessarofx/TessaroFx.h"
 
 struct BenchSize {
   int width;
@@ -34,4 +39,94 @@ inline void BM_Memcpy(benchmark::State& state, BenchSize size) {
     benchmark::ClobberMemory();
   }
   state.SetItemsProcessed(state.iterations() * size.width * size.height);
+}
+
+// Registers a benchmark timed in milliseconds of real time, as every benchmark here is.
+template <class... Args>
+benchmark::internal::Benchmark* RegisterTimed(const std::string& name, Args&&... args) {
+  return benchmark::RegisterBenchmark(name.c_str(), std::forward<Args>(args)...)
+      ->Unit(benchmark::kMillisecond)
+      ->UseRealTime();
+}
+
+inline void RegisterMemcpy(BenchSize size) {
+  RegisterTimed(std::string("BM_Memcpy/") + size.label, BM_Memcpy, size);
+}
+
+using Params = std::vector<std::pair<std::wstring, double>>;
+
+// The effect `guid` with double parameters, created the way a host creates it.
+inline NLEComPtr<INLECGFilter> CreateEffect(const wchar_t* guid, const Params& params) {
+  namespace Key = NLEKey::Filter;
+  GetFilterCount();
+  NLEComPtr<INLEProperties> props;
+  NLECommon::CreateProperties(&props);
+  int i = 0;
+  for (const auto& [name, value] : params) {
+    NLEComPtr<INLEProperties> p;
+    NLECommon::CreateProperties(&p);
+    p->SetString(Key::Property::kVariantName, name.c_str());
+    p->SetString(Key::Property::kFriendName, name.c_str());
+    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
+    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
+  }
+  props->SetInt(Key::Property::kCount, i);
+  NLEComPtr<INLECGFilter> filter;
+  CreateFilterFromGUID(nullptr, guid, props, nullptr, reinterpret_cast<void**>(&filter));
+  return filter;
+}
+
+// An effect with a random foreground wrapped as a host memory frame, and its destination.
+struct EffectRun {
+  NLEComPtr<INLECGFilter> filter;
+  std::vector<uint8_t> input;
+  NLEComPtr<INLEMemoryFrame> fg, dst;
+
+  // False (and the benchmark skipped) when the filter or the frames cannot be made.
+  bool Prepare(benchmark::State& state, BenchSize size, const wchar_t* guid, const Params& params) {
+    filter = CreateEffect(guid, params);
+    input = RandomBgra(size.width, size.height);
+    NLECommon::CreateMemoryFrame(size.width, size.height, 0, &fg);
+    NLECommon::CreateMemoryFrame(size.width, size.height, 0, &dst);
+    if (!filter || !fg || !dst) {
+      state.SkipWithError("cannot create the filter or frames");
+      return false;
+    }
+    fg->Wrap(input.data(), size.width, size.height, size.width * 4, kNLEFrameTopDown);
+    filter->SetForeground(fg);
+    return true;
+  }
+
+  // One frame through Running; false (and the benchmark skipped) when it fails.
+  bool Run(benchmark::State& state) {
+    if (filter->Running(dst) != NLE_S_OK) {
+      state.SkipWithError("Running failed");
+      return false;
+    }
+    benchmark::ClobberMemory();
+    return true;
+  }
+};
+
+// The effect through Running, frame after frame with the same settings.
+inline void BM_EffectRunning(benchmark::State& state, BenchSize size, const wchar_t* guid,
+                             Params params) {
+  EffectRun run;
+  if (!run.Prepare(state, size, guid, params)) return;
+  for (auto _ : state) {
+    if (!run.Run(state)) return;
+  }
+  state.SetItemsProcessed(state.iterations() * size.width * size.height);
+}
+
+// Registers BM_<name>/<size>/<label> for every size and case, each beside memcpy of the frame.
+inline void RegisterEffectCases(const char* name, const wchar_t* guid,
+                                const std::vector<std::pair<const char*, Params>>& cases) {
+  for (const BenchSize& size : kBenchSizes) {
+    RegisterMemcpy(size);
+    for (const auto& [label, params] : cases) {
+      RegisterTimed(std::string("BM_") + name + "/" + size.label + "/" + label, BM_EffectRunning,
+                    size, guid, params);
+    }
+  }
 }

@@ -1,89 +1,25 @@
 // ColorAdjust through the plug-in interface (Running on host memory frames), all five operations
 // and each alone, beside memcpy of the same frame.
-#include <string>
-#include <utility>
-#include <vector>
-
 #include "BenchCommon.h"
-#include "tessarofx/NLEHost.h"
-#include "tessarofx/TessaroFx.h"
 
 namespace {
 
-namespace Key = NLEKey::Filter;
-
-using Params = std::vector<std::pair<const wchar_t*, double>>;
-
-NLEComPtr<INLECGFilter> CreateColorAdjust(const Params& params) {
-  NLEComPtr<INLEProperties> props;
-  NLECommon::CreateProperties(&props);
-  int i = 0;
-  for (const auto& [name, value] : params) {
-    NLEComPtr<INLEProperties> p;
-    NLECommon::CreateProperties(&p);
-    p->SetString(Key::Property::kVariantName, name);
-    p->SetString(Key::Property::kFriendName, name);
-    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
-    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
-  }
-  props->SetInt(Key::Property::kCount, i);
-  NLEComPtr<INLECGFilter> filter;
-  CreateFilterFromGUID(nullptr, L"18C6E879-4138-42D0-B0B9-6B4401AA97E6", props, nullptr,
-                       reinterpret_cast<void**>(&filter));
-  return filter;
-}
-
-void BM_ColorAdjust(benchmark::State& state, BenchSize size, Params params) {
-  GetFilterCount();
-  NLEComPtr<INLECGFilter> filter = CreateColorAdjust(params);
-  std::vector<uint8_t> input = RandomBgra(size.width, size.height);
-  NLEComPtr<INLEMemoryFrame> fg, dst;
-  NLECommon::CreateMemoryFrame(size.width, size.height, 0, &fg);
-  NLECommon::CreateMemoryFrame(size.width, size.height, 0, &dst);
-  fg->Wrap(input.data(), size.width, size.height, size.width * 4, kNLEFrameTopDown);
-  if (!filter || !fg || !dst) {
-    state.SkipWithError("cannot create the filter or frames");
-    return;
-  }
-  filter->SetForeground(fg);
-  for (auto _ : state) {
-    if (filter->Running(dst) != NLE_S_OK) {
-      state.SkipWithError("Running failed");
-      return;
-    }
-    benchmark::ClobberMemory();
-  }
-  state.SetItemsProcessed(state.iterations() * size.width * size.height);
-}
-
 const struct Registrar {
   Registrar() {
-    const std::pair<const char*, Params> cases[] = {
-        {"all5",
-         {{L"u_exposure", 20},
-          {L"u_brightness", 15},
-          {L"u_contrast", 30},
-          {L"u_vib", 40},
-          {L"u_sat", 25}}},
-        {"exposure", {{L"u_exposure", 20}}},
-        {"brightness", {{L"u_brightness", 15}}},
-        {"contrast", {{L"u_contrast", 30}}},
-        {"vibrance", {{L"u_vib", 40}}},
-        {"saturation", {{L"u_sat", 25}}},
-    };
-    for (const BenchSize& size : kBenchSizes) {
-      benchmark::RegisterBenchmark((std::string("BM_Memcpy/") + size.label).c_str(), BM_Memcpy,
-                                   size)
-          ->Unit(benchmark::kMillisecond)
-          ->UseRealTime();
-      for (const auto& [label, params] : cases) {
-        benchmark::RegisterBenchmark(
-            (std::string("BM_ColorAdjust/") + size.label + "/" + label).c_str(), BM_ColorAdjust,
-            size, params)
-            ->Unit(benchmark::kMillisecond)
-            ->UseRealTime();
-      }
-    }
+    RegisterEffectCases("ColorAdjust", L"18C6E879-4138-42D0-B0B9-6B4401AA97E6",
+                        {
+                            {"all5",
+                             {{L"u_exposure", 20},
+                              {L"u_brightness", 15},
+                              {L"u_contrast", 30},
+                              {L"u_vib", 40},
+                              {L"u_sat", 25}}},
+                            {"exposure", {{L"u_exposure", 20}}},
+                            {"brightness", {{L"u_brightness", 15}}},
+                            {"contrast", {{L"u_contrast", 30}}},
+                            {"vibrance", {{L"u_vib", 40}}},
+                            {"saturation", {{L"u_sat", 25}}},
+                        });
   }
 } registrar;
 

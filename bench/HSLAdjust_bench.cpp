@@ -3,39 +3,15 @@
 // frame.
 #include <cstring>
 #include <string>
-#include <utility>
 #include <vector>
 
 #include "BenchCommon.h"
 #include "tessarofx/CxImage.h"
 #include "tessarofx/HueAdjust.h"
-#include "tessarofx/NLEHost.h"
-#include "tessarofx/TessaroFx.h"
 
 namespace {
 
-namespace Key = NLEKey::Filter;
-
-using Params = std::vector<std::pair<std::wstring, double>>;
-
-NLEComPtr<INLECGFilter> CreateHSLAdjust(const Params& params) {
-  NLEComPtr<INLEProperties> props;
-  NLECommon::CreateProperties(&props);
-  int i = 0;
-  for (const auto& [name, value] : params) {
-    NLEComPtr<INLEProperties> p;
-    NLECommon::CreateProperties(&p);
-    p->SetString(Key::Property::kVariantName, name.c_str());
-    p->SetString(Key::Property::kFriendName, name.c_str());
-    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
-    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
-  }
-  props->SetInt(Key::Property::kCount, i);
-  NLEComPtr<INLECGFilter> filter;
-  CreateFilterFromGUID(nullptr, L"AF91FF05-6577-4A4B-C81E-652EE7D6596E", props, nullptr,
-                       reinterpret_cast<void**>(&filter));
-  return filter;
-}
+constexpr const wchar_t* kHSLAdjust = L"AF91FF05-6577-4A4B-C81E-652EE7D6596E";
 
 // Every band with all five values set, each band differently.
 Params EveryBand() {
@@ -52,29 +28,6 @@ Params EveryBand() {
     params.push_back({prefix + L"soft", 40.0 - 10 * b});
   }
   return params;
-}
-
-void BM_HSLAdjust(benchmark::State& state, BenchSize size, Params params) {
-  GetFilterCount();
-  NLEComPtr<INLECGFilter> filter = CreateHSLAdjust(params);
-  std::vector<uint8_t> input = RandomBgra(size.width, size.height);
-  NLEComPtr<INLEMemoryFrame> fg, dst;
-  NLECommon::CreateMemoryFrame(size.width, size.height, 0, &fg);
-  NLECommon::CreateMemoryFrame(size.width, size.height, 0, &dst);
-  fg->Wrap(input.data(), size.width, size.height, size.width * 4, kNLEFrameTopDown);
-  if (!filter || !fg || !dst) {
-    state.SkipWithError("cannot create the filter or frames");
-    return;
-  }
-  filter->SetForeground(fg);
-  for (auto _ : state) {
-    if (filter->Running(dst) != NLE_S_OK) {
-      state.SkipWithError("Running failed");
-      return;
-    }
-    benchmark::ClobberMemory();
-  }
-  state.SetItemsProcessed(state.iterations() * size.width * size.height);
 }
 
 // Each iteration restores the frame, then rotates it: repeated rotation in place would drift
@@ -98,21 +51,12 @@ const struct Registrar {
         {"red", {{L"u_red_hue", 30}, {L"u_red_sat", 20}, {L"u_red_light", -10}}},
     };
     for (const BenchSize& size : kBenchSizes) {
-      benchmark::RegisterBenchmark((std::string("BM_Memcpy/") + size.label).c_str(), BM_Memcpy,
-                                   size)
-          ->Unit(benchmark::kMillisecond)
-          ->UseRealTime();
+      RegisterMemcpy(size);
       for (const auto& [label, params] : cases) {
-        benchmark::RegisterBenchmark(
-            (std::string("BM_HSLAdjust/") + size.label + "/" + label).c_str(), BM_HSLAdjust, size,
-            params)
-            ->Unit(benchmark::kMillisecond)
-            ->UseRealTime();
+        RegisterTimed(std::string("BM_HSLAdjust/") + size.label + "/" + label, BM_EffectRunning,
+                      size, kHSLAdjust, params);
       }
-      benchmark::RegisterBenchmark((std::string("BM_HueAdjust/") + size.label + "/30deg").c_str(),
-                                   BM_HueAdjust, size)
-          ->Unit(benchmark::kMillisecond)
-          ->UseRealTime();
+      RegisterTimed(std::string("BM_HueAdjust/") + size.label + "/30deg", BM_HueAdjust, size);
     }
   }
 } registrar;

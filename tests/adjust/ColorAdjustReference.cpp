@@ -123,43 +123,4 @@ void ReferenceSaturation(CxImage* image, float s) {
   });
 }
 
-::testing::AssertionResult SameBuffer(const CxImage& expected, const CxImage& actual) {
-  if (expected.GetSize() != actual.GetSize()) {
-    return ::testing::AssertionFailure()
-           << "sizes differ: " << expected.GetSize() << " vs " << actual.GetSize();
-  }
-  const uint8_t* e = expected.GetBits();
-  const uint8_t* a = actual.GetBits();
-  if (std::memcmp(e, a, expected.GetSize()) == 0) return ::testing::AssertionSuccess();
-  size_t i = 0;
-  while (e[i] == a[i]) ++i;
-  const size_t row = i / expected.GetEffWidth();
-  const size_t column = i % expected.GetEffWidth();
-  const size_t pixelBytes = std::max<size_t>(1, expected.GetBpp() / 8);
-  const size_t pixelStart = row * expected.GetEffWidth() + column / pixelBytes * pixelBytes;
-  auto bytes = [&](const uint8_t* p) {
-    std::string s;
-    for (size_t j = 0; j < pixelBytes && pixelStart + j < expected.GetSize(); ++j) {
-      s += (j ? " " : "") + std::to_string(p[pixelStart + j]);
-    }
-    return s;
-  };
-  return ::testing::AssertionFailure()
-         << "first difference at byte " << i << " (row " << row << ", pixel " << column / pixelBytes
-         << ", byte " << column % pixelBytes << "): expected pixel [" << bytes(e) << "], got ["
-         << bytes(a) << "]";
-}
-
-std::vector<uint8_t> NoiseBytes(size_t count, uint32_t salt) {
-  std::vector<uint8_t> bytes(count);
-  uint32_t state = salt * 2654435761u + 1;
-  for (uint8_t& b : bytes) {
-    state ^= state << 13;
-    state ^= state >> 17;
-    state ^= state << 5;
-    b = static_cast<uint8_t>(state >> 7);
-  }
-  return bytes;
-}
-
 }  // namespace tfx_test

@@ -3,12 +3,7 @@
 // code with the library beyond CxImage.
 #pragma once
 
-#include <gtest/gtest.h>
-
-#include <cstdint>
-#include <vector>
-
-#include "tessarofx/CxImage.h"
+#include "support/ImageBuilders.h"
 
 namespace tfx_test {
 
@@ -17,11 +12,5 @@ void ReferenceBrightness(CxImage* image, float b);
 void ReferenceContrast(CxImage* image, float c);
 void ReferenceVibrance(CxImage* image, float v);
 void ReferenceSaturation(CxImage* image, float s);
-
-// Equal buffers, or the first differing byte with its pixel coordinates.
-::testing::AssertionResult SameBuffer(const CxImage& expected, const CxImage& actual);
-
-// Deterministic pseudo-random bytes.
-std::vector<uint8_t> NoiseBytes(size_t count, uint32_t salt);
 
 }  // namespace tfx_test

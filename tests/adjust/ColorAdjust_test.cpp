@@ -18,9 +18,12 @@
 
 namespace {
 
+using tfx_test::Clone;
+using tfx_test::EveryColour;
+using tfx_test::Image;
 using tfx_test::NoiseBytes;
+using tfx_test::NoiseImage;
 using tfx_test::SameBuffer;
-using Image = std::unique_ptr<CxImage>;
 
 struct Operation {
   const char* name;
@@ -42,47 +45,6 @@ const Operation kSaturation = {"Saturation", tfx::SaturationAdjust, saturationAd
                                tfx_test::ReferenceSaturation, 45.0f};
 const Operation* const kOperations[] = {&kExposure, &kBrightness, &kContrast, &kVibrance,
                                         &kSaturation};
-
-Image Clone(const CxImage& src) {
-  Image copy = std::make_unique<CxImage>();
-  copy->Copy(src);
-  return copy;
-}
-
-// Noise in every byte, padding included. Strides beyond Create()'s 4-byte padding come from
-// wrapping, as frames arrive.
-Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
-                 unsigned effWidth, uint32_t salt) {
-  std::vector<uint8_t> frame(size_t{effWidth} * height);
-  uint8_t* bits = frame.data();
-  Image image = Clone(CxImage(&bits, width, height, bpp, effWidth, format));
-  const std::vector<uint8_t> noise = NoiseBytes(image->GetSize(), salt);
-  std::memcpy(image->GetBits(), noise.data(), noise.size());
-  return image;
-}
-
-// Every 24-bit colour once, in a 4096-wide BGRA image, with an alpha that varies independently.
-// Sanitizer builds, being many times slower, take every seventh colour.
-const CxImage& EveryColour() {
-#if defined(TFX_SANITIZE_BUILD)
-  constexpr uint32_t kStep = 7;
-#else
-  constexpr uint32_t kStep = 1;
-#endif
-  static const Image image = [] {
-    const uint32_t count = ((1u << 24) + kStep - 1) / kStep;
-    Image all = std::make_unique<CxImage>(4096, (count + 4095) / 4096, 32, IPF_BGRA);
-    uint8_t* p = all->GetBits();
-    for (uint32_t i = 0; i < all->GetWidth() * all->GetHeight(); ++i, p += 4) {
-      const uint32_t colour = (i * kStep) & 0xffffff;
-      const uint8_t pixel[4] = {uint8_t(colour), uint8_t(colour >> 8), uint8_t(colour >> 16),
-                                uint8_t((i * 2654435761u) >> 24)};
-      std::memcpy(p, pixel, 4);
-    }
-    return all;
-  }();
-  return *image;
-}
 
 struct SweepCase {
   const Operation* op;

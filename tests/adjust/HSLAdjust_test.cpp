@@ -7,58 +7,21 @@
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
-#include <memory>
 #include <string>
 #include <thread>
 #include <vector>
 
-#include <hwy/targets.h>
-
-#include "adjust/ColorAdjustReference.h"
+#include "support/EveryTarget.h"
+#include "support/ImageBuilders.h"
 
 namespace {
 
-using tfx_test::NoiseBytes;
+using tfx_test::Clone;
+using tfx_test::EveryColour;
+using tfx_test::ForEveryTarget;
+using tfx_test::Image;
+using tfx_test::NoiseImage;
 using tfx_test::SameBuffer;
-using Image = std::unique_ptr<CxImage>;
-
-Image Clone(const CxImage& src) {
-  Image copy = std::make_unique<CxImage>();
-  copy->Copy(src);
-  return copy;
-}
-
-Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
-                 unsigned effWidth, uint32_t salt) {
-  std::vector<uint8_t> frame(size_t{effWidth} * height);
-  uint8_t* bits = frame.data();
-  Image image = Clone(CxImage(&bits, width, height, bpp, effWidth, format));
-  const std::vector<uint8_t> noise = NoiseBytes(image->GetSize(), salt);
-  std::memcpy(image->GetBits(), noise.data(), noise.size());
-  return image;
-}
-
-// Every 24-bit colour once (every seventh under the sanitizers) with varying alpha.
-const CxImage& EveryColour() {
-#if defined(TFX_SANITIZE_BUILD)
-  constexpr uint32_t kStep = 7;
-#else
-  constexpr uint32_t kStep = 1;
-#endif
-  static const Image image = [] {
-    const uint32_t count = ((1u << 24) + kStep - 1) / kStep;
-    Image all = std::make_unique<CxImage>(4096, (count + 4095) / 4096, 32, IPF_BGRA);
-    uint8_t* p = all->GetBits();
-    for (uint32_t i = 0; i < all->GetWidth() * all->GetHeight(); ++i, p += 4) {
-      const uint32_t colour = (i * kStep) & 0xffffff;
-      const uint8_t pixel[4] = {uint8_t(colour), uint8_t(colour >> 8), uint8_t(colour >> 16),
-                                uint8_t((i * 2654435761u) >> 24)};
-      std::memcpy(p, pixel, 4);
-    }
-    return all;
-  }();
-  return *image;
-}
 
 // ---- The per-pixel reference, from the formulas in HSLAdjust.h. Band shapes are derived once
 // per setting; the weights are evaluated afresh for every pixel.
@@ -213,17 +176,6 @@ struct SweepCase {
 void PrintTo(const SweepCase& c, std::ostream* os) { *os << c.label; }
 
 class HSLAdjustAllColours : public testing::TestWithParam<SweepCase> {};
-
-// Runs `body` once with the kernels of each instruction set compiled in and run by this CPU.
-template <class Body>
-void ForEveryTarget(Body body) {
-  for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
-    SCOPED_TRACE(hwy::TargetName(target));
-    hwy::SetSupportedTargetsForTest(target);
-    body();
-  }
-  hwy::SetSupportedTargetsForTest(0);
-}
 
 TEST_P(HSLAdjustAllColours, MatchesThePerPixelFormulasOnEveryTarget) {
   const Image expected = Clone(EveryColour());

@@ -6,18 +6,18 @@
 #include <cmath>
 #include <cstdint>
 #include <cstring>
-#include <memory>
 #include <thread>
 #include <vector>
 
-#include "adjust/ColorAdjustReference.h"
 #include "adjust/LensMaps.h"
+#include "support/ImageBuilders.h"
 
 namespace {
 
-using tfx_test::NoiseBytes;
+using tfx_test::Clone;
+using tfx_test::Image;
+using tfx_test::NoiseImage;
 using tfx_test::SameBuffer;
-using Image = std::unique_ptr<CxImage>;
 using Map = std::vector<tfx::LensPoint>;
 
 // The maps straight from their definitions, pixel by pixel.
@@ -89,23 +89,6 @@ void ReferenceFringing(CxImage* image, const std::vector<Map>& maps) {
 
 bool SameMap(const tfx::LensPoint* actual, const Map& expected) {
   return std::memcmp(actual, expected.data(), expected.size() * sizeof(tfx::LensPoint)) == 0;
-}
-
-Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
-                 unsigned effWidth, uint32_t salt) {
-  std::vector<uint8_t> frame(size_t{effWidth} * height);
-  uint8_t* bits = frame.data();
-  Image image = std::make_unique<CxImage>();
-  image->Copy(CxImage(&bits, width, height, bpp, effWidth, format));
-  const std::vector<uint8_t> noise = NoiseBytes(image->GetSize(), salt);
-  std::memcpy(image->GetBits(), noise.data(), noise.size());
-  return image;
-}
-
-Image Clone(const CxImage& image) {
-  Image copy = std::make_unique<CxImage>();
-  copy->Copy(image);
-  return copy;
 }
 
 const int kSizes[][2] = {{1, 1}, {2, 2}, {3, 5}, {17, 9}, {64, 48}, {101, 37}};

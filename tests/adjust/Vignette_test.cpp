@@ -10,14 +10,14 @@
 #include <utility>
 #include <vector>
 
-#include "adjust/ColorAdjustReference.h"
 #include "adjust/VignetteRows.h"
+#include "support/ImageBuilders.h"
 
 namespace {
 
-using tfx_test::NoiseBytes;
+using tfx_test::Image;
+using tfx_test::NoiseImage;
 using tfx_test::SameBuffer;
-using Image = std::unique_ptr<CxImage>;
 
 // The mask straight from its definition, pixel by pixel over the whole frame.
 std::vector<float> ReferenceMask(int width, int height, float F, float S, float R) {
@@ -79,17 +79,6 @@ const Setting kSettings[] = {
     {-60, 50, 50, 100, 0, 0},      {45, 30, 80, 40, 30, -70}, {-100, 100, 0, 0, 100, 35},
     {100, 0, 100, 100, -50, -100}, {0, 70, 20, 60, 10, 25},   {-25, 50, 65, 75, 250, 150},
 };
-
-Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
-                 unsigned effWidth, uint32_t salt) {
-  std::vector<uint8_t> frame(size_t{effWidth} * height);
-  uint8_t* bits = frame.data();
-  Image image = std::make_unique<CxImage>();
-  image->Copy(CxImage(&bits, width, height, bpp, effWidth, format));
-  const std::vector<uint8_t> noise = NoiseBytes(image->GetSize(), salt);
-  std::memcpy(image->GetBits(), noise.data(), noise.size());
-  return image;
-}
 
 TEST(VignetteGradient, MatchesTheDefinitionOnEveryPixel) {
   // Odd and even sizes put the centre on or off the middle; tiny frames make A or B zero.

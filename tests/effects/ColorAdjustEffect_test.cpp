@@ -1,54 +1,23 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
-#include <random>
 #include <vector>
 
-#include "support/TestFrame.h"
+#include "support/EffectHarness.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"
 
 namespace {
 
 namespace Key = NLEKey::Filter;
+using tfx_test::CreateEffect;
+using tfx_test::FillRandom;
+using tfx_test::Settings;
 constexpr const wchar_t* kColorAdjust = L"18C6E879-4138-42D0-B0B9-6B4401AA97E6";
 
-// Host settings carrying double parameters the way a host's UI writes them.
-NLEComPtr<INLEProperties> Settings(
-    std::initializer_list<std::pair<const wchar_t*, double>> values) {
-  NLEComPtr<INLEProperties> props;
-  NLECommon::CreateProperties(&props);
-  int i = 0;
-  for (const auto& [name, value] : values) {
-    NLEComPtr<INLEProperties> p;
-    NLECommon::CreateProperties(&p);
-    p->SetString(Key::Property::kVariantName, name);
-    p->SetString(Key::Property::kFriendName, name);
-    p->SetInt(Key::Property::kType, NLEFilterPropertyType_Double);
-    p->SetValue(Key::Property::kValue_Default, CNLEValue(0.0));
-    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
-    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
-  }
-  props->SetInt(Key::Property::kCount, i);
-  return props;
-}
-
-NLEComPtr<INLECGFilter> Create(INLEProperties* settings) {
-  NLEComPtr<INLECGFilter> filter;
-  EXPECT_EQ(CreateFilterFromGUID(nullptr, kColorAdjust, settings, nullptr,
-                                 reinterpret_cast<void**>(&filter)),
-            NLE_S_OK);
-  return filter;
-}
-
-void FillRandom(TestFrame* f, unsigned salt) {
-  std::mt19937 rng(salt);
-  for (auto& b : f->pixels) b = static_cast<uint8_t>(rng());
-}
-
 TEST(ColorAdjustEffect, ZeroParametersGiveTheForegroundBack) {
-  NLEComPtr<INLECGFilter> filter =
-      Create(Settings({{L"u_exposure", 0}, {L"u_brightness", 0}, {L"u_contrast", 0}}));
+  NLEComPtr<INLECGFilter> filter = CreateEffect(
+      kColorAdjust, Settings({{L"u_exposure", 0}, {L"u_brightness", 0}, {L"u_contrast", 0}}));
   TestFrame* fg = new TestFrame(17, 9);
   TestFrame* dst = new TestFrame(17, 9);
   NLEComPtr<INLEFrame> h1(fg), h2(dst);
@@ -59,7 +28,7 @@ TEST(ColorAdjustEffect, ZeroParametersGiveTheForegroundBack) {
 }
 
 TEST(ColorAdjustEffect, BrightnessDoublesChannelsAndKeepsAlpha) {
-  NLEComPtr<INLECGFilter> filter = Create(Settings({{L"u_brightness", 100}}));
+  NLEComPtr<INLECGFilter> filter = CreateEffect(kColorAdjust, Settings({{L"u_brightness", 100}}));
   TestFrame* fg = new TestFrame(64, 4);
   TestFrame* bg = new TestFrame(64, 4, 0, false, 0x55);
   TestFrame* dst = new TestFrame(64, 4, 300);  // padded rows go through a private copy
@@ -79,7 +48,7 @@ TEST(ColorAdjustEffect, BrightnessDoublesChannelsAndKeepsAlpha) {
 }
 
 TEST(ColorAdjustEffect, ParametersChangedAfterCreationTakeEffect) {
-  NLEComPtr<INLECGFilter> filter = Create(Settings({{L"u_exposure", 0}}));
+  NLEComPtr<INLECGFilter> filter = CreateEffect(kColorAdjust, Settings({{L"u_exposure", 0}}));
   NLEComPtr<INLEProperties> exposure;
   ASSERT_EQ(filter->GetParamPropertyFromName(L"u_exposure", &exposure), NLE_S_OK);
   exposure->SetValue(Key::Property::kValue_Current, CNLEValue(50.0));
@@ -99,7 +68,7 @@ TEST(ColorAdjustEffect, ParametersChangedAfterCreationTakeEffect) {
 }
 
 TEST(ColorAdjustEffect, MissingForegroundIsABadArgument) {
-  NLEComPtr<INLECGFilter> filter = Create(nullptr);
+  NLEComPtr<INLECGFilter> filter = CreateEffect(kColorAdjust, nullptr);
   TestFrame* bg = new TestFrame(2, 2);
   TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
   NLEComPtr<INLEFrame> h1(bg), h2(dst);

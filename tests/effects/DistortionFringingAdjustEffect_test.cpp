@@ -1,38 +1,19 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <random>
 #include <vector>
 
-#include "support/TestFrame.h"
+#include "support/EffectHarness.h"
 #include "tessarofx/LensAdjust.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"
 
 namespace {
 
-namespace Key = NLEKey::Filter;
-
 NLEComPtr<INLECGFilter> CreateLens(double distortion, double fringing) {
-  NLEComPtr<INLEProperties> props;
-  NLECommon::CreateProperties(&props);
-  const std::pair<const wchar_t*, double> values[] = {{L"distortion", distortion},
-                                                      {L"fringing", fringing}};
-  int i = 0;
-  for (const auto& [name, value] : values) {
-    NLEComPtr<INLEProperties> p;
-    NLECommon::CreateProperties(&p);
-    p->SetString(Key::Property::kVariantName, name);
-    p->SetString(Key::Property::kFriendName, name);
-    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
-    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
-  }
-  props->SetInt(Key::Property::kCount, i);
-  NLEComPtr<INLECGFilter> filter;
-  EXPECT_EQ(CreateFilterFromGUID(nullptr, L"CFAAD60B-AC2B-4B39-A8E1-D25E35A6F735", props, nullptr,
-                                 reinterpret_cast<void**>(&filter)),
-            NLE_S_OK);
-  return filter;
+  return tfx_test::CreateEffect(
+      L"CFAAD60B-AC2B-4B39-A8E1-D25E35A6F735",
+      tfx_test::Settings({{L"distortion", distortion}, {L"fringing", fringing}}));
 }
 
 TEST(DistortionFringingAdjustEffect, DistortsThenFringesTheForeground) {
@@ -50,8 +31,7 @@ TEST(DistortionFringingAdjustEffect, DistortsThenFringesTheForeground) {
     TestFrame* fg = new TestFrame(50, c.fgHeight);
     TestFrame* dst = new TestFrame(50, 30, 216);
     NLEComPtr<INLEFrame> h1(fg), h2(dst);
-    std::mt19937 rng(5);
-    for (auto& b : fg->pixels) b = static_cast<uint8_t>(rng());
+    tfx_test::FillRandom(fg, 5);
     filter->SetForeground(fg);
     ASSERT_EQ(filter->Running(dst), NLE_S_OK);
 

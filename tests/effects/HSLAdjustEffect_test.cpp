@@ -1,10 +1,9 @@
 #include <gtest/gtest.h>
 
-#include <random>
 #include <string>
 #include <vector>
 
-#include "support/TestFrame.h"
+#include "support/EffectHarness.h"
 #include "tessarofx/CxImage.h"
 #include "tessarofx/HSLAdjust.h"
 #include "tessarofx/NLEHost.h"
@@ -13,37 +12,10 @@
 namespace {
 
 namespace Key = NLEKey::Filter;
+using tfx_test::CreateEffect;
+using tfx_test::FillRandom;
+using tfx_test::Settings;
 constexpr const wchar_t* kHSLAdjust = L"AF91FF05-6577-4A4B-C81E-652EE7D6596E";
-
-NLEComPtr<INLEProperties> Settings(const std::vector<std::pair<std::wstring, double>>& values) {
-  NLEComPtr<INLEProperties> props;
-  NLECommon::CreateProperties(&props);
-  int i = 0;
-  for (const auto& [name, value] : values) {
-    NLEComPtr<INLEProperties> p;
-    NLECommon::CreateProperties(&p);
-    p->SetString(Key::Property::kVariantName, name.c_str());
-    p->SetString(Key::Property::kFriendName, name.c_str());
-    p->SetInt(Key::Property::kType, NLEFilterPropertyType_Double);
-    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
-    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
-  }
-  props->SetInt(Key::Property::kCount, i);
-  return props;
-}
-
-NLEComPtr<INLECGFilter> Create(INLEProperties* settings) {
-  NLEComPtr<INLECGFilter> filter;
-  EXPECT_EQ(CreateFilterFromGUID(nullptr, kHSLAdjust, settings, nullptr,
-                                 reinterpret_cast<void**>(&filter)),
-            NLE_S_OK);
-  return filter;
-}
-
-void FillRandom(TestFrame* f, unsigned salt) {
-  std::mt19937 rng(salt);
-  for (auto& b : f->pixels) b = static_cast<uint8_t>(rng());
-}
 
 // The frame through the exported function, rows packed.
 std::vector<uint8_t> Expected(TestFrame* fg, const HSLBands& bands) {
@@ -87,7 +59,7 @@ TEST(HSLAdjustEffect, ReadsEveryBandValueByItsName) {
     for (const auto& c : cases) {
       const std::wstring& name = c.params.back().first;
       SCOPED_TRACE(std::string(name.begin(), name.end()));
-      NLEComPtr<INLECGFilter> filter = Create(Settings(c.params));
+      NLEComPtr<INLECGFilter> filter = CreateEffect(kHSLAdjust, Settings(c.params));
       TestFrame* dst = new TestFrame(64, 8, 300);
       NLEComPtr<INLEFrame> h(dst);
       filter->SetForeground(fg);
@@ -102,7 +74,7 @@ TEST(HSLAdjustEffect, ReadsEveryBandValueByItsName) {
 }
 
 TEST(HSLAdjustEffect, FollowsChangesAndPassesTheFrameThroughAtZero) {
-  NLEComPtr<INLECGFilter> filter = Create(Settings({{L"u_green_sat", 0}}));
+  NLEComPtr<INLECGFilter> filter = CreateEffect(kHSLAdjust, Settings({{L"u_green_sat", 0}}));
   TestFrame* fg = new TestFrame(33, 7);
   TestFrame* dst = new TestFrame(33, 7);
   NLEComPtr<INLEFrame> h1(fg), h2(dst);
@@ -122,7 +94,7 @@ TEST(HSLAdjustEffect, FollowsChangesAndPassesTheFrameThroughAtZero) {
 
   TestFrame* bg = new TestFrame(33, 7);
   NLEComPtr<INLEFrame> h3(bg);
-  NLEComPtr<INLECGFilter> noForeground = Create(nullptr);
+  NLEComPtr<INLECGFilter> noForeground = CreateEffect(kHSLAdjust, nullptr);
   noForeground->SetBackground(bg);
   EXPECT_EQ(noForeground->Running(dst), NLE_E_INVALIDARG);
 }

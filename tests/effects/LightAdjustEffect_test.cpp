@@ -1,9 +1,8 @@
 #include <gtest/gtest.h>
 
-#include <random>
 #include <vector>
 
-#include "support/TestFrame.h"
+#include "support/EffectHarness.h"
 #include "tessarofx/LightAdjust.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"
@@ -11,47 +10,17 @@
 namespace {
 
 namespace Key = NLEKey::Filter;
+using tfx_test::CreateEffect;
+using tfx_test::FillRandom;
+using tfx_test::Settings;
 constexpr const wchar_t* kLightAdjust = L"D8651B53-F47A-4B98-B8E9-35B491D5EADC";
-
-// Host settings carrying double parameters the way a host's UI writes them.
-NLEComPtr<INLEProperties> Settings(
-    std::initializer_list<std::pair<const wchar_t*, double>> values) {
-  NLEComPtr<INLEProperties> props;
-  NLECommon::CreateProperties(&props);
-  int i = 0;
-  for (const auto& [name, value] : values) {
-    NLEComPtr<INLEProperties> p;
-    NLECommon::CreateProperties(&p);
-    p->SetString(Key::Property::kVariantName, name);
-    p->SetString(Key::Property::kFriendName, name);
-    p->SetInt(Key::Property::kType, NLEFilterPropertyType_Double);
-    p->SetValue(Key::Property::kValue_Default, CNLEValue(0.0));
-    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
-    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
-  }
-  props->SetInt(Key::Property::kCount, i);
-  return props;
-}
-
-NLEComPtr<INLECGFilter> Create(INLEProperties* settings) {
-  NLEComPtr<INLECGFilter> filter;
-  EXPECT_EQ(CreateFilterFromGUID(nullptr, kLightAdjust, settings, nullptr,
-                                 reinterpret_cast<void**>(&filter)),
-            NLE_S_OK);
-  return filter;
-}
-
-void FillRandom(TestFrame* f, unsigned salt) {
-  std::mt19937 rng(salt);
-  for (auto& b : f->pixels) b = static_cast<uint8_t>(rng());
-}
 
 TEST(LightAdjustEffect, ZeroParametersGiveTheForegroundBack) {
   const NLEComPtr<INLEProperties> zeros =
       Settings({{L"u_highLight", 0}, {L"u_shadow", 0}, {L"u_whiteLevel", 0}});
   // Zeros, and no parameters at all.
   for (INLEProperties* settings : {zeros.get(), static_cast<INLEProperties*>(nullptr)}) {
-    NLEComPtr<INLECGFilter> filter = Create(settings);
+    NLEComPtr<INLECGFilter> filter = CreateEffect(kLightAdjust, settings);
     TestFrame* fg = new TestFrame(17, 9);
     TestFrame* dst = new TestFrame(17, 9);
     NLEComPtr<INLEFrame> h1(fg), h2(dst);
@@ -65,8 +34,10 @@ TEST(LightAdjustEffect, ZeroParametersGiveTheForegroundBack) {
 TEST(LightAdjustEffect, AppliesTheFourOperationsInOrder) {
   // Highlight, shadow, white level, black level, each seeing the previous one's output; the
   // padded output goes through a private copy, the background is never read.
-  NLEComPtr<INLECGFilter> filter = Create(Settings(
-      {{L"u_blackLevel", -35}, {L"u_highLight", 60}, {L"u_shadow", 80}, {L"u_whiteLevel", 0}}));
+  NLEComPtr<INLECGFilter> filter = CreateEffect(
+      kLightAdjust,
+      Settings(
+          {{L"u_blackLevel", -35}, {L"u_highLight", 60}, {L"u_shadow", 80}, {L"u_whiteLevel", 0}}));
   NLEComPtr<INLEProperties> white;
   ASSERT_EQ(filter->GetParamPropertyFromName(L"u_whiteLevel", &white), NLE_S_OK);
   white->SetValue(Key::Property::kValue_Current, CNLEValue(-45.0));
@@ -93,7 +64,7 @@ TEST(LightAdjustEffect, AppliesTheFourOperationsInOrder) {
 }
 
 TEST(LightAdjustEffect, MissingForegroundIsABadArgument) {
-  NLEComPtr<INLECGFilter> filter = Create(Settings({{L"u_highLight", 50}}));
+  NLEComPtr<INLECGFilter> filter = CreateEffect(kLightAdjust, Settings({{L"u_highLight", 50}}));
   TestFrame* bg = new TestFrame(2, 2);
   TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
   NLEComPtr<INLEFrame> h1(bg), h2(dst);

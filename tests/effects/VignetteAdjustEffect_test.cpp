@@ -1,36 +1,19 @@
 #include <gtest/gtest.h>
 
-#include <random>
 #include <vector>
 
-#include "support/TestFrame.h"
+#include "support/EffectHarness.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"
 #include "tessarofx/Vignette.h"
 
 namespace {
 
-namespace Key = NLEKey::Filter;
-using Params = std::vector<std::pair<const wchar_t*, double>>;
+using Params = tfx_test::EffectParams;
 
 NLEComPtr<INLECGFilter> CreateVignette(const Params& values) {
-  NLEComPtr<INLEProperties> props;
-  NLECommon::CreateProperties(&props);
-  int i = 0;
-  for (const auto& [name, value] : values) {
-    NLEComPtr<INLEProperties> p;
-    NLECommon::CreateProperties(&p);
-    p->SetString(Key::Property::kVariantName, name);
-    p->SetString(Key::Property::kFriendName, name);
-    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
-    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
-  }
-  props->SetInt(Key::Property::kCount, i);
-  NLEComPtr<INLECGFilter> filter;
-  EXPECT_EQ(CreateFilterFromGUID(nullptr, L"8622FC58-4DF1-44BD-9B37-2F633D4D3368", props, nullptr,
-                                 reinterpret_cast<void**>(&filter)),
-            NLE_S_OK);
-  return filter;
+  return tfx_test::CreateEffect(L"8622FC58-4DF1-44BD-9B37-2F633D4D3368",
+                                tfx_test::Settings(values));
 }
 
 TEST(VignetteAdjustEffect, PassesEachParameterToItsArgumentWithItsDefault) {
@@ -62,8 +45,7 @@ TEST(VignetteAdjustEffect, PassesEachParameterToItsArgumentWithItsDefault) {
     TestFrame* fg = new TestFrame(61, 35);
     TestFrame* dst = new TestFrame(61, 35, 260);  // padded rows go through a private copy
     NLEComPtr<INLEFrame> h1(fg), h2(dst);
-    std::mt19937 rng(61);
-    for (auto& b : fg->pixels) b = static_cast<uint8_t>(rng());
+    tfx_test::FillRandom(fg, 61);
     filter->SetForeground(fg);
     ASSERT_EQ(filter->Running(dst), NLE_S_OK);
 

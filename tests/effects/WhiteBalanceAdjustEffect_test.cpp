@@ -2,55 +2,26 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <random>
 #include <string>
 #include <vector>
 
-#include "support/TestFrame.h"
+#include "support/EffectHarness.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"
 
 namespace {
 
 namespace Key = NLEKey::Filter;
+using tfx_test::CreateEffect;
+using tfx_test::FillRandom;
+using tfx_test::Settings;
 constexpr const wchar_t* kWhiteBalance = L"39509FB9-39FB-4516-9464-3D891DD61D62";
-
-NLEComPtr<INLEProperties> Settings(
-    std::initializer_list<std::pair<const wchar_t*, double>> values) {
-  NLEComPtr<INLEProperties> props;
-  NLECommon::CreateProperties(&props);
-  int i = 0;
-  for (const auto& [name, value] : values) {
-    NLEComPtr<INLEProperties> p;
-    NLECommon::CreateProperties(&p);
-    p->SetString(Key::Property::kVariantName, name);
-    p->SetString(Key::Property::kFriendName, name);
-    p->SetInt(Key::Property::kType, NLEFilterPropertyType_Double);
-    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
-    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
-  }
-  props->SetInt(Key::Property::kCount, i);
-  return props;
-}
-
-NLEComPtr<INLECGFilter> Create(INLEProperties* settings) {
-  NLEComPtr<INLECGFilter> filter;
-  EXPECT_EQ(CreateFilterFromGUID(nullptr, kWhiteBalance, settings, nullptr,
-                                 reinterpret_cast<void**>(&filter)),
-            NLE_S_OK);
-  return filter;
-}
 
 void Set(INLECGFilter* filter, const wchar_t* name, double value) {
   NLEComPtr<INLEProperties> p;
   ASSERT_EQ(filter->GetParamPropertyFromName(name, &p), NLE_S_OK);
   p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
   filter->ParamValueChanged();
-}
-
-void FillRandom(TestFrame* f, unsigned salt) {
-  std::mt19937 rng(salt);
-  for (auto& b : f->pixels) b = static_cast<uint8_t>(rng());
 }
 
 // The balance per byte, from the formulas: factor in double, then float; product in float,
@@ -77,7 +48,8 @@ TEST(WhiteBalanceAdjustEffect, EveryColourMatchesTheFactors) {
                               uint8_t((i * 2654435761u) >> 24)};
     std::copy(pixel, pixel + 4, &fg->pixels[4 * size_t{i}]);
   }
-  NLEComPtr<INLECGFilter> filter = Create(Settings({{L"u_temperature", 0}, {L"u_tint", 0}}));
+  NLEComPtr<INLECGFilter> filter =
+      CreateEffect(kWhiteBalance, Settings({{L"u_temperature", 0}, {L"u_tint", 0}}));
   filter->SetForeground(fg);
   const double settings[][2] = {{100, 0}, {-100, 37}, {0, -100}, {-33.3, 71.1}, {-900, 650}};
   for (const auto& s : settings) {
@@ -111,7 +83,7 @@ TEST(WhiteBalanceAdjustEffect, ZeroCopiesAndTheRangeEndsDoubleAndRemoveChannels)
   NLEComPtr<INLEFrame> h1(fg), h2(dst);
   FillRandom(fg, 3);
   // No settings at all: the registered defaults, temperature and tint 0.
-  NLEComPtr<INLECGFilter> filter = Create(nullptr);
+  NLEComPtr<INLECGFilter> filter = CreateEffect(kWhiteBalance, nullptr);
   filter->SetForeground(fg);
   const auto run = [&](auto check) {
     ASSERT_EQ(filter->Running(dst), NLE_S_OK);
@@ -154,7 +126,7 @@ TEST(WhiteBalanceAdjustEffect, ZeroCopiesAndTheRangeEndsDoubleAndRemoveChannels)
 }
 
 TEST(WhiteBalanceAdjustEffect, MissingForegroundIsABadArgument) {
-  NLEComPtr<INLECGFilter> filter = Create(Settings({{L"u_temperature", 50}}));
+  NLEComPtr<INLECGFilter> filter = CreateEffect(kWhiteBalance, Settings({{L"u_temperature", 50}}));
   TestFrame* bg = new TestFrame(2, 2, 0, false, 40);
   TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
   NLEComPtr<INLEFrame> h1(bg), h2(dst);

@@ -1,0 +1,42 @@
+#include "support/EffectHarness.h"
+
+#include <gtest/gtest.h>
+
+#include <random>
+
+namespace tfx_test {
+
+namespace Key = NLEKey::Filter;
+
+NLEComPtr<INLEProperties> Settings(const EffectParams& values) {
+  NLEComPtr<INLEProperties> props;
+  NLECommon::CreateProperties(&props);
+  int i = 0;
+  for (const auto& [name, value] : values) {
+    NLEComPtr<INLEProperties> p;
+    NLECommon::CreateProperties(&p);
+    p->SetString(Key::Property::kVariantName, name.c_str());
+    p->SetString(Key::Property::kFriendName, name.c_str());
+    p->SetInt(Key::Property::kType, NLEFilterPropertyType_Double);
+    p->SetValue(Key::Property::kValue_Default, CNLEValue(0.0));
+    p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
+    props->SetInterface(Key::Property::kParamsArray[i++], p.get());
+  }
+  props->SetInt(Key::Property::kCount, i);
+  return props;
+}
+
+NLEComPtr<INLECGFilter> CreateEffect(const wchar_t* guid, INLEProperties* settings) {
+  NLEComPtr<INLECGFilter> filter;
+  EXPECT_EQ(
+      CreateFilterFromGUID(nullptr, guid, settings, nullptr, reinterpret_cast<void**>(&filter)),
+      NLE_S_OK);
+  return filter;
+}
+
+void FillRandom(TestFrame* frame, unsigned salt) {
+  std::mt19937 rng(salt);
+  for (auto& b : frame->pixels) b = static_cast<uint8_t>(rng());
+}
+
+}  // namespace tfx_test

@@ -1,0 +1,25 @@
+// Creating an effect the way a host does: settings carrying double parameters, then the filter
+// by its GUID.
+#pragma once
+
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "support/TestFrame.h"
+#include "tessarofx/NLEHost.h"
+#include "tessarofx/TessaroFx.h"
+
+namespace tfx_test {
+
+using EffectParams = std::vector<std::pair<std::wstring, double>>;
+
+// Host settings carrying double parameters (default 0) the way a host's UI writes them.
+NLEComPtr<INLEProperties> Settings(const EffectParams& values);
+
+// The effect `guid` built from `settings`; a failure to create it fails the running test.
+NLEComPtr<INLECGFilter> CreateEffect(const wchar_t* guid, INLEProperties* settings);
+
+void FillRandom(TestFrame* frame, unsigned salt);
+
+}  // namespace tfx_test

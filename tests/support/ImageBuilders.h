@@ -1,0 +1,34 @@
+// Images the adjustment tests feed to the fast paths and their references, and the byte-exact
+// comparison between the two.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <memory>
+#include <vector>
+
+#include "tessarofx/CxImage.h"
+
+namespace tfx_test {
+
+using Image = std::unique_ptr<CxImage>;
+
+Image Clone(const CxImage& src);
+
+// Deterministic pseudo-random bytes.
+std::vector<uint8_t> NoiseBytes(size_t count, uint32_t salt);
+
+// Noise in every byte, padding included. Strides beyond Create()'s 4-byte padding come from
+// wrapping, as frames arrive.
+Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
+                 unsigned effWidth, uint32_t salt);
+
+// Every 24-bit colour once, in a 4096-wide BGRA image, with an alpha that varies independently.
+// Sanitizer builds, being many times slower, take every seventh colour.
+const CxImage& EveryColour();
+
+// Equal buffers, or the first differing byte with its pixel coordinates.
+::testing::AssertionResult SameBuffer(const CxImage& expected, const CxImage& actual);
+
+}  // namespace tfx_test
