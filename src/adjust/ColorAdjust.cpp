@@ -12,6 +12,7 @@
 #include <cstdint>
 
 #include "adjust/ColorAdjustRows.h"
+#include "adjust/ImageWalk.h"
 
 namespace tfx {
 namespace {
@@ -87,35 +88,6 @@ tagRGBQUAD MapColour(tagRGBQUAD c, const uint8_t table[256]) {
   c.rgbGreen = table[c.rgbGreen];
   c.rgbRed = table[c.rgbRed];
   return c;
-}
-
-// Packed 4-byte pixels whose first three bytes are colour: both orders qualify because every
-// operation here treats red, green and blue alike.
-bool HasPackedColour(const CxImage& image) {
-  return image.GetBits() && image.GetBpp() == 32 &&
-         (image.getFormat() == IPF_BGRA || image.getFormat() == IPF_RGBA);
-}
-
-template <class RowFn>
-void ForEachRow(CxImage* image, RowFn row) {
-  uint8_t* bits = image->GetBits();
-  const size_t width = image->GetWidth();
-  const size_t height = image->GetHeight();
-  const size_t stride = image->GetEffWidth();
-  if (stride == width * 4) {
-    row(bits, width * height);
-    return;
-  }
-  for (size_t y = 0; y < height; ++y) row(bits + y * stride, width);
-}
-
-template <class PixelFn>
-void ForEachPixel(CxImage* image, PixelFn pixel) {
-  for (unsigned long y = 0; y < image->GetHeight(); ++y) {
-    for (unsigned long x = 0; x < image->GetWidth(); ++x) {
-      image->SetPixelColor(x, y, pixel(image->GetPixelColor(x, y, true)));
-    }
-  }
 }
 
 void ApplyTable(CxImage* image, const uint8_t table[256], const ColorAdjustRows& rows) {

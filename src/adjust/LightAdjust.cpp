@@ -11,6 +11,7 @@
 #include <cstring>
 #include <vector>
 
+#include "adjust/ImageWalk.h"
 #include "adjust/LightAdjustTables.h"
 
 namespace tfx {
@@ -102,13 +103,7 @@ std::vector<Step> Steps(float h, float s, float w, float k0) {
   return steps;
 }
 
-// Packed 4-byte pixels whose first three bytes are colour: M and the curve treat red, green and
-// blue alike, so both orders qualify.
-bool HasPackedColour(const CxImage& image) {
-  return image.GetBits() && image.GetBpp() == 32 &&
-         (image.getFormat() == IPF_BGRA || image.getFormat() == IPF_RGBA);
-}
-
+// M and the curve treat red, green and blue alike, so both packed orders qualify.
 void ApplyRow(uint8_t* pixels, size_t count, const uint8_t* table) {
   for (size_t i = 0; i < count; ++i, pixels += 4) {
     uint32_t p;

@@ -15,7 +15,12 @@
 #include <new>
 #include <opencv2/core.hpp>
 
+#include "adjust/ImageWalk.h"
+
 namespace {
+
+using tfx::ForEachPixel;
+using tfx::ForEachRow;
 
 // Float to int toward zero; out-of-range values and NaN give INT_MIN, as the x86 conversion
 // does, instead of being undefined.
@@ -55,28 +60,6 @@ bool PackedPixels(const CxImage& image, Packing* packing) {
     return true;
   }
   return false;
-}
-
-template <class RowFn>
-void ForEachRow(CxImage* image, RowFn row) {
-  uint8_t* bits = image->GetBits();
-  const size_t width = image->GetWidth();
-  const size_t height = image->GetHeight();
-  const size_t stride = image->GetEffWidth();
-  if (stride == width * 4) {
-    row(bits, width * height);
-    return;
-  }
-  for (size_t y = 0; y < height; ++y) row(bits + y * stride, width);
-}
-
-template <class PixelFn>
-void ForEachPixel(CxImage* image, PixelFn pixel) {
-  for (unsigned long y = 0; y < image->GetHeight(); ++y) {
-    for (unsigned long x = 0; x < image->GetWidth(); ++x) {
-      image->SetPixelColor(x, y, pixel(image->GetPixelColor(x, y, true)));
-    }
-  }
 }
 
 template <class ColourFn>
