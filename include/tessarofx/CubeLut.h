@@ -1,0 +1,125 @@
+// One 3D colour look-up table: an N x N x N lattice of RGB outputs over the 8-bit input cube,
+// read from ".CUBE" or ".3DL" text files, written as ".CUBE", and applied to 8-bit BGR(A) pixels
+// with tetrahedral interpolation.
+//
+// The lattice has a fixed capacity of 64 points per axis whatever N is, so an object is about
+// 3 MiB and belongs on the heap. lattice[i][j][k] is the output (red, green, blue) for red index
+// i, green index j and blue index k, in 0..255 units (floats, not clamped). Files with more than
+// 64 points per axis are refused with status 23.
+//
+// File operations report small positive status codes, kept in the object and returned by the
+// readers:
+//    0 success                                 20 .CUBE: unknown or repeated keyword
+//    1 nothing loaded yet                      21 .CUBE: TITLE not followed by '"'
+//   10 a stream read failed                    22 .CUBE: a domain maximum not above its minimum
+//   12 end of file while looking for a line    23 size missing or outside 2..64 (doLUT: 1..64)
+//   13 no line end in the first 252 bytes      24 a row with fewer than three numbers
+// A failed read leaves the lattice zeroed up to the rows read before the error.
+//
+// Threading: an object is used by one thread at a time. getInstance() hands out a process-wide
+// object that every construction (clone() included) replaces, unsynchronised; code that may run
+// on several threads owns its objects and never uses the instance.
+#pragma once
+
+#include <cstdint>
+#include <fstream>
+#include <string>
+#include <vector>
+
+#include "tessarofx/Export.h"
+
+class TFX_API CubeLut {
+ public:
+  // One lattice point.
+  struct PR {
+    float red;
+    float green;
+    float blue;
+  };
+
+  static constexpr int kMaxSize = 64;  // points per axis the lattice holds
+
+  // Status 1, size 0: doLUT refuses to run (23) until something is loaded or generated.
+  CubeLut();
+  virtual ~CubeLut();
+  CubeLut(const CubeLut&) = delete;
+  CubeLut& operator=(const CubeLut&) = delete;
+
+  // The process-wide object: the last one constructed, or a new one if none is registered.
+  static CubeLut* getInstance();
+  // Destroys the registered object, if any, and forgets it.
+  static void releaseInstance();
+
+  int getLutSize() const { return size_; }
+  int getStatus() const { return status_; }
+  const char* getTitle() const { return title_.c_str(); }
+  // The domain of the last ".CUBE" read: (0,0,0)..(1,1,1) unless the file said otherwise.
+  void getDomain(float minimum[3], float maximum[3]) const;
+
+  // Reads a ".CUBE" or ".3DL" file (extension in any letter case). True only when the file
+  // opened and its reader returned 0.
+  bool loadFile(const wchar_t* path);
+  // The two readers on an open binary stream; they return the status code. A host can use the
+  // stream's position afterwards to tell where reading stopped.
+  int load3DlFile(std::ifstream& in);
+  int loadCubeFile(std::ifstream& in);
+  // The next line that is not empty, not a '#' comment and not a bare "\r".
+  std::string readLine(std::ifstream& in, char terminator);
+  // Cuts at every single space; empty pieces count.
+  void splitString(const std::string& line, std::vector<std::string>& out);
+  // Three floats from the line; status 24 if fewer than three convert.
+  std::vector<float> parseTableRow(const std::string& line);
+  // Writes the lattice as a ".CUBE" file over the domain 0..1, red fastest.
+  bool writeLUT3D2File(const char* path);
+
+  // Applies the table in place to `height` rows of `width` pixels, bytes 0, 1, 2 = blue, green,
+  // red; further bytes (alpha) are left as they are. bytesPerPixel must be at least 3. Returns 0,
+  // or 23 without touching the pixels when the size is outside 1..64.
+  int doLUT(unsigned char* pixels, int width, int height, int pitch, int bytesPerPixel);
+
+  // A deep copy without the row table. The copy becomes the process-wide instance.
+  CubeLut* clone();
+  // Size N with the lattice (i, j, k) * 255 / 31: the identity only for N = 32.
+  void generateLUT3DData(int n);
+  // Copies the byte atlas into the lattice, once, after something set the atlas state to 0.
+  void updateLUT3DData();
+  // generateLUT3DData's pattern again, in integer arithmetic, for the current size.
+  void reset();
+  // Writes one byte-atlas point; k is the blue index, i the red index.
+  void updateCalcuatedData(int k, int j, int i, const PR& p);
+
+  float* getFTData(int* count);
+  int* getGTData(int* count);
+  float* getLut3DData(int* width, int* height, int* depth, int* channels);
+  // The lattice as bytes in the OpenCL upload layout: 8*N texels wide, ceil(N/8)*N rows, three
+  // bytes per texel. Blue slice k is the tile at column k % 8, tile row k / 8; inside it x is the
+  // red index and y the green index. *bytes receives N^3 * 3.
+  const uint8_t* getAtlasData(int* bytes) const;
+
+  // Attaches a raw table of rows (allocated with array new; the object frees it). While one is
+  // attached the ".CUBE" reader fills its first N rows instead of the lattice, unscaled, and doLUT
+  // does nothing. Null detaches (and frees) it.
+  void setRowTable(float (*rows)[3]);
+  float (*getRowTable())[3] { return rowTable_; }
+
+ private:
+  void buildTables();  // fraction and grid index tables from size_
+  int atlasIndex(int i, int j, int k) const;
+  void allocateAtlas();  // frees the atlas and allocates pointCount_ * 3 zeroed bytes
+
+  int32_t status_;
+  std::string title_;
+  int32_t size_;
+  float ft_[256];    // position of each byte value inside its lattice cell
+  int32_t gt_[256];  // lower lattice index of each byte value
+  float lattice_[kMaxSize][kMaxSize][kMaxSize][3];
+  float (*rowTable_)[3];
+  uint8_t* atlas_;
+  int32_t pointCount_;
+  int32_t atlasState_;
+  float domainMin_[3];
+  float domainMax_[3];
+  int32_t atlasBytes_;  // what atlas_ was allocated with, which a kept atlas may not match
+
+  static CubeLut* mLut3d;
+};
