@@ -1,0 +1,211 @@
+#include "lut/ChromeKeyLut3dGenerator.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <array>
+#include <cstdlib>
+#include <memory>
+#include <vector>
+
+#include "tessarofx/CubeLut.h"
+
+namespace {
+
+using Rgb = std::array<int, 3>;
+
+constexpr Rgb kGreenScreen{40, 200, 60};
+constexpr Rgb kBlueScreen{30, 60, 200};
+
+lutParam Param(Rgb screen, double contrast = 50.0, double offset = 0.0) {
+  return NLEChromeKeyLut3dGenerator::DefaultParam(
+      static_cast<uint8_t>(screen[0]), static_cast<uint8_t>(screen[1]),
+      static_cast<uint8_t>(screen[2]), contrast, offset);
+}
+
+// The two tables as the effects hold them: 64-point CubeLuts filled by the generator.
+struct Tables {
+  explicit Tables(const lutParam& param) : beauty(new CubeLut), alpha(new CubeLut) {
+    beauty->generateLUT3DData(64);
+    alpha->generateLUT3DData(64);
+    NLEChromeKeyLut3dGenerator generator;
+    generator.setLutParam(param);
+    generator.getBeautyLut(beauty->getLut3DData(nullptr, nullptr, nullptr, nullptr));
+    generator.getAlphaLut(alpha->getLut3DData(nullptr, nullptr, nullptr, nullptr));
+  }
+
+  static Rgb Apply(CubeLut& lut, Rgb c) {
+    uint8_t px[4] = {static_cast<uint8_t>(c[2]), static_cast<uint8_t>(c[1]),
+                     static_cast<uint8_t>(c[0]), 77};
+    EXPECT_EQ(lut.doLUT(px, 1, 1, 4, 4), 0);
+    EXPECT_EQ(px[3], 77);
+    return {px[2], px[1], px[0]};
+  }
+  Rgb Beauty(Rgb c) { return Apply(*beauty, c); }
+  // The mask, checked to be the same in all three components.
+  int Alpha(Rgb c) {
+    const Rgb m = Apply(*alpha, c);
+    EXPECT_TRUE(m[0] == m[1] && m[1] == m[2]) << m[0] << " " << m[1] << " " << m[2];
+    return m[2];
+  }
+
+  std::unique_ptr<CubeLut> beauty, alpha;
+};
+
+Rgb Mix(Rgb a, Rgb b, double t) {  // (1 - t) * a + t * b
+  Rgb m;
+  for (int c = 0; c < 3; ++c) m[c] = static_cast<int>(a[c] + (b[c] - a[c]) * t + 0.5);
+  return m;
+}
+
+int MaxDiff(Rgb a, Rgb b) {
+  int d = 0;
+  for (int c = 0; c < 3; ++c) d = std::max(d, std::abs(a[c] - b[c]));
+  return d;
+}
+
+// Colours a keyer must never touch, whatever the screen: greys, skin, and hues far from both
+// screens used here.
+const Rgb kFarFromBoth[] = {{0, 0, 0},       {255, 255, 255}, {128, 128, 128}, {92, 60, 48},
+                            {198, 148, 122}, {234, 196, 176}, {214, 40, 40},   {230, 200, 30},
+                            {200, 60, 170},  {235, 130, 30},  {60, 38, 24},    {250, 170, 170}};
+
+TEST(ChromeKeyLut3dGenerator, AlphaKeysTheScreenAndKeepsWhatIsUnlikeIt) {
+  for (Rgb screen : {kGreenScreen, kBlueScreen}) {
+    SCOPED_TRACE(screen[2]);
+    Tables t(Param(screen));
+    EXPECT_EQ(t.Alpha(screen), 0);
+    // An unevenly lit screen stays keyed: 20 % darker, 10 % brighter, more saturated.
+    EXPECT_EQ(t.Alpha(Mix({0, 0, 0}, screen, 0.8)), 0);
+    EXPECT_EQ(t.Alpha(Mix({0, 0, 0}, screen, 1.1)), 0);
+    EXPECT_EQ(t.Alpha(Mix(screen, {255, 255, 255}, -0.1)), 0);
+    for (Rgb c : kFarFromBoth) EXPECT_EQ(t.Alpha(c), 255) << c[0] << "," << c[1] << "," << c[2];
+    for (int v = 0; v < 256; v += 5) EXPECT_EQ(t.Alpha({v, v, v}), 255);
+  }
+  // The lattice's red index is outermost: swapping red and blue of the blue screen gives an
+  // orange that must be kept.
+  Tables blue(Param(kBlueScreen));
+  EXPECT_EQ(blue.Alpha({200, 60, 30}), 255);
+}
+
+// A pixel that is part grey subject and part screen has that part of the screen's chroma, so the
+// mask follows the mix; contrast steepens the ramp around the middle and offset moves it.
+TEST(ChromeKeyLut3dGenerator, AlphaFollowsTheScreenShareShapedByContrastAndOffset) {
+  const Rgb grey{200, 200, 200};  // as bright as the screen, so no shadow allowance applies
+  const Rgb half = Mix(grey, kGreenScreen, 0.5), quarter = Mix(grey, kGreenScreen, 0.25),
+            most = Mix(grey, kGreenScreen, 0.75);
+  const struct {
+    double contrast, offset;
+    int quarter, half, most;  // expected alphas
+    int near;  // the steeper the ramp, the more interpolation between lattice points shows
+  } cases[] = {
+      {0, 0, 191, 128, 64, 3},  // linear: alpha = 1 - share
+      {50, 0, 255, 128, 0, 3},  // the default: the ramp runs from a quarter to three quarters
+      {50, 40, 255, 230, 102, 3}, {50, -40, 153, 26, 0, 3}, {90, 0, 255, 128, 0, 8},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(testing::Message() << "contrast " << c.contrast << " offset " << c.offset);
+    Tables t(Param(kGreenScreen, c.contrast, c.offset));
+    EXPECT_NEAR(t.Alpha(quarter), c.quarter, c.near);
+    EXPECT_NEAR(t.Alpha(half), c.half, c.near);
+    EXPECT_NEAR(t.Alpha(most), c.most, c.near);
+  }
+}
+
+TEST(ChromeKeyLut3dGenerator, FullContrastGivesAHardMatte) {
+  NLEChromeKeyLut3dGenerator generator;
+  generator.setLutParam(Param(kGreenScreen, 100.0));
+  std::vector<float> lattice(64 * 64 * 64 * 3);
+  generator.getAlphaLut(lattice.data());
+  for (float v : lattice) ASSERT_TRUE(v == 0.0f || v == 255.0f) << v;
+  EXPECT_EQ(lattice[(0 * 64 + 63) * 64 * 3], 0.0f);    // pure green
+  EXPECT_EQ(lattice[(63 * 64 + 0) * 64 * 3], 255.0f);  // pure red
+}
+
+TEST(ChromeKeyLut3dGenerator, WindowsAndHueRangeProtectColours) {
+  lutParam p = Param(kGreenScreen);
+  p.saturationHigh = 150;  // the screen's saturation is 204
+  EXPECT_EQ(Tables(p).Alpha(kGreenScreen), 255);
+  p = Param(kGreenScreen);
+  p.valueLow = 210;  // the screen's value is 200
+  EXPECT_EQ(Tables(p).Alpha(kGreenScreen), 255);
+  p.valueLow = 0;
+  p.valueHigh = 190;
+  Tables high(p);
+  EXPECT_EQ(high.Alpha(kGreenScreen), 255);
+  EXPECT_EQ(high.Alpha(Mix({0, 0, 0}, kGreenScreen, 0.8)), 0);
+
+  // Saturated colours more than 70 degrees either side of the screen's hue are never keyed,
+  // those 25 and 35 degrees away are.
+  Tables t(Param({0, 255, 0}));
+  EXPECT_EQ(t.Alpha({255, 202, 0}), 255);  // hue 48
+  EXPECT_EQ(t.Alpha({0, 195, 255}), 255);  // hue 194
+  EXPECT_EQ(t.Alpha({106, 255, 0}), 0);    // hue 95
+  EXPECT_EQ(t.Alpha({0, 255, 149}), 0);    // hue 155
+}
+
+TEST(ChromeKeyLut3dGenerator, GreyScreenKeysNothing) {
+  Tables t(Param({90, 90, 90}));
+  for (Rgb c : {Rgb{90, 90, 90}, kGreenScreen, kBlueScreen, Rgb{0, 0, 0}}) {
+    EXPECT_EQ(t.Alpha(c), 255);
+    EXPECT_LE(MaxDiff(t.Beauty(c), c), 1);
+  }
+}
+
+TEST(ChromeKeyLut3dGenerator, BeautyLeavesGreysAndFarColoursUnchanged) {
+  for (Rgb screen : {kGreenScreen, kBlueScreen}) {
+    Tables t(Param(screen));
+    for (int v = 0; v < 256; ++v) ASSERT_LE(MaxDiff(t.Beauty({v, v, v}), {v, v, v}), 1) << v;
+    for (Rgb c : kFarFromBoth) EXPECT_LE(MaxDiff(t.Beauty(c), c), 1);
+  }
+}
+
+// At full strength no colour keeps the screen's hue: for a green screen green never ends above
+// both red and blue, for a blue screen blue never ends above both red and green.
+TEST(ChromeKeyLut3dGenerator, BeautyLeavesNoColourWithTheScreensCast) {
+  std::vector<uint8_t> cube;  // every third level of each channel, as BGRA
+  for (int r = 0; r < 256; r += 3) {
+    for (int g = 0; g < 256; g += 3) {
+      for (int b = 0; b < 256; b += 3) {
+        cube.insert(cube.end(), {static_cast<uint8_t>(b), static_cast<uint8_t>(g),
+                                 static_cast<uint8_t>(r), 255});
+      }
+    }
+  }
+  const int pixels = static_cast<int>(cube.size() / 4);
+  std::vector<uint8_t> green = cube, blue = cube;
+  Tables(Param(kGreenScreen)).beauty->doLUT(green.data(), pixels, 1, pixels * 4, 4);
+  Tables(Param(kBlueScreen)).beauty->doLUT(blue.data(), pixels, 1, pixels * 4, 4);
+  int worstGreen = 0, worstBlue = 0;
+  for (size_t p = 0; p < cube.size(); p += 4) {
+    worstGreen = std::max(worstGreen, green[p + 1] - std::max(green[p + 2], green[p]));
+    worstBlue = std::max(worstBlue, blue[p] - std::max(blue[p + 2], blue[p + 1]));
+  }
+  // Interpolation between lattice points leaves a few levels.
+  EXPECT_LE(worstGreen, 3);
+  EXPECT_LE(worstBlue, 3);
+}
+
+TEST(ChromeKeyLut3dGenerator, SpillStrengthAndLuminanceRestore) {
+  const Rgb spilled{150, 200, 120};  // a warm colour with green spill, hue 98
+  lutParam p = Param(kGreenScreen);
+  p.spillStrength = 0.0;
+  EXPECT_LE(MaxDiff(Tables(p).Beauty(spilled), spilled), 1);
+
+  p = Param(kGreenScreen);
+  const Rgb halfRestore = Tables(p).Beauty(spilled);
+  p.lumaRestore = 100.0;
+  const Rgb fullRestore = Tables(p).Beauty(spilled);
+  p.lumaRestore = 0.0;
+  const Rgb noRestore = Tables(p).Beauty(spilled);
+  auto value = [](Rgb c) { return std::max({c[0], c[1], c[2]}); };
+  EXPECT_NEAR(value(fullRestore), 200, 1);
+  EXPECT_LT(value(noRestore), value(halfRestore));
+  EXPECT_LT(value(halfRestore), value(fullRestore));
+  for (Rgb c : {halfRestore, fullRestore, noRestore}) {
+    EXPECT_LE(c[1], std::max(c[0], c[2]) + 1);
+    EXPECT_GE(c[0], c[2]);  // pushed towards yellow, the side it came from
+  }
+}
+
+}  // namespace
