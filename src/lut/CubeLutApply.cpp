@@ -1,5 +1,7 @@
 #include "lut/CubeLutApply.h"
 
+#include "simd/lut_tetra_rows.h"
+
 namespace tfx {
 namespace {
 
@@ -54,7 +56,9 @@ void TetraRowReference(const TetraTable& t, uint8_t* row, int width, int bytesPe
 }
 
 void TetraRow(const TetraTable& table, uint8_t* row, int width, int bytesPerPixel) {
-  TetraRowReference(table, row, width, bytesPerPixel);
+  // Highway picks the instruction set on every call, so a row costs one indirect call and the
+  // choice follows hwy::SetSupportedTargetsForTest.
+  TetraRowVector(table, row, width, bytesPerPixel);
 }
 
 }  // namespace tfx

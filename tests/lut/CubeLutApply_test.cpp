@@ -1,0 +1,227 @@
+// The vector tetrahedral rows against the per-pixel reference, on every instruction set: random
+// and hostile lattices, every tail length, 3- and 4-byte pixels, and every colour.
+#include "lut/CubeLutApply.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <cstring>
+#include <limits>
+#include <memory>
+#include <random>
+#include <vector>
+
+#include <hwy/targets.h>
+
+#include "simd/lut_tetra_rows.h"
+#include "support/EveryTarget.h"
+#include "support/ImageBuilders.h"
+#include "tessarofx/CubeLut.h"
+
+namespace {
+
+using tfx_test::ForEveryTarget;
+
+// A CubeLut of size n whose tables come from generateLUT3DData and whose lattice is rewritten.
+struct Lattice {
+  std::unique_ptr<CubeLut> lut = std::make_unique<CubeLut>();
+
+  explicit Lattice(int n) { lut->generateLUT3DData(n); }
+
+  float* Point(int i, int j, int k) {
+    return lut->getLut3DData(nullptr, nullptr, nullptr, nullptr) + ((i * 64 + j) * 64 + k) * 3;
+  }
+
+  template <class Value>
+  void Fill(Value value) {
+    const int n = lut->getLutSize();
+    for (int i = 0; i < n; ++i) {
+      for (int j = 0; j < n; ++j) {
+        for (int k = 0; k < n; ++k) {
+          for (int c = 0; c < 3; ++c) Point(i, j, k)[c] = value();
+        }
+      }
+    }
+  }
+
+  tfx::TetraTable Table() {
+    return {lut->getLut3DData(nullptr, nullptr, nullptr, nullptr), lut->getFTData(nullptr),
+            lut->getGTData(nullptr), lut->getLutSize()};
+  }
+};
+
+// Values where the byte conversion changes behaviour: rounding at .5, the clamp at 255, the
+// wrap below 0, the float and int32 limits, NaN and the infinities.
+std::vector<float> EdgeValues() {
+  const float inf = std::numeric_limits<float>::infinity();
+  std::vector<float> values = {0.0f,
+                               -0.0f,
+                               0.5f,
+                               -0.5f,
+                               -1.0f,
+                               -1.5f,
+                               -2.0f,
+                               254.5f,
+                               255.0f,
+                               255.5f,
+                               300.0f,
+                               -300.0f,
+                               1e30f,
+                               -1e30f,
+                               -3e9f,
+                               3e9f,
+                               -2147483648.0f,
+                               2147483648.0f,
+                               -8388608.0f,
+                               -8388607.5f,
+                               -8388609.0f,
+                               -16777216.0f,
+                               -16777218.0f,
+                               8388608.5f,
+                               1e-45f,
+                               -1e-45f,
+                               inf,
+                               -inf,
+                               std::numeric_limits<float>::quiet_NaN()};
+  for (const float v : {-0.5f, 0.5f, 254.5f, -1.5f, 127.5f, -2147483648.0f, -8388608.0f}) {
+    values.push_back(std::nextafter(v, -inf));
+    values.push_back(std::nextafter(v, inf));
+  }
+  return values;
+}
+
+// TetraRow and TetraRowReference on the same random rows of every width from 0 to 67 (every
+// tail of every vector size) and one long row, with guard bytes behind each row.
+void ExpectSameRows(const tfx::TetraTable& table, int bytesPerPixel, uint32_t salt) {
+  std::mt19937 rng(salt);
+  for (int width = 0; width <= 68; ++width) {
+    const int pixels = width < 68 ? width : 4099;
+    std::vector<uint8_t> expected(static_cast<size_t>(pixels) * bytesPerPixel + 16);
+    for (auto& b : expected) b = static_cast<uint8_t>(rng());
+    std::vector<uint8_t> actual = expected;
+    tfx::TetraRowReference(table, expected.data(), pixels, bytesPerPixel);
+    tfx::TetraRow(table, actual.data(), pixels, bytesPerPixel);
+    if (expected != actual) {
+      size_t i = 0;
+      while (expected[i] == actual[i]) ++i;
+      ADD_FAILURE() << "width " << pixels << ", " << bytesPerPixel << " bytes per pixel: byte " << i
+                    << " (pixel " << i / bytesPerPixel << ") is " << int{actual[i]} << ", expected "
+                    << int{expected[i]};
+      return;
+    }
+  }
+}
+
+TEST(CubeLutApply, DispatchFollowsTheTargetsInForce) {
+  for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
+    hwy::SetSupportedTargetsForTest(target);
+    EXPECT_STREQ(hwy::TargetName(target), tfx::TetraRowVectorTarget());
+  }
+  hwy::SetSupportedTargetsForTest(0);
+}
+
+TEST(CubeLutApply, RandomLatticesMatchTheReference) {
+  for (const int n : {2, 3, 17, 33, 64}) {
+    SCOPED_TRACE(n);
+    Lattice lattice(n);
+    std::mt19937 rng(static_cast<uint32_t>(n));
+    std::uniform_real_distribution<float> value(-40.0f, 300.0f);
+    lattice.Fill([&] { return value(rng); });
+    ForEveryTarget([&] {
+      ExpectSameRows(lattice.Table(), 4, 1);
+      ExpectSameRows(lattice.Table(), 3, 2);
+    });
+  }
+}
+
+TEST(CubeLutApply, HostileLatticesMatchTheReference) {
+  const std::vector<float> edges = EdgeValues();
+  for (const int n : {2, 5, 33, 64}) {
+    SCOPED_TRACE(n);
+    Lattice lattice(n);
+    std::mt19937 rng(static_cast<uint32_t>(100 + n));
+    // Mostly ordinary values, so that some corners mix with an edge value and some do not.
+    lattice.Fill([&] {
+      return rng() % 3 == 0 ? edges[rng() % edges.size()]
+                            : std::ldexp(static_cast<float>(rng() % 4096) - 1024.0f, -2);
+    });
+    ForEveryTarget([&] {
+      ExpectSameRows(lattice.Table(), 4, 3);
+      ExpectSameRows(lattice.Table(), 3, 4);
+    });
+  }
+}
+
+// With N = 52 every multiple of 5 falls on a lattice point and gives C000 weight 1 and the other
+// corners weight 0. Those corners have an odd index, so keeping odd points at 0 lets every even
+// point's value reach the byte conversion unmixed, NaN and infinities included.
+TEST(CubeLutApply, LatticePointsConvertLikeTheScalarHelper) {
+  std::vector<float> values = EdgeValues();
+  const float inf = std::numeric_limits<float>::infinity();
+  for (int k = -300; k <= 300; ++k) {
+    for (const float v : {static_cast<float>(k), k + 0.5f}) {
+      values.insert(values.end(), {v, std::nextafter(v, -inf), std::nextafter(v, inf)});
+    }
+  }
+  std::mt19937 rng(52);
+  while (values.size() < 26 * 26 * 26 * 3) {
+    const uint32_t bits = rng();
+    float v;
+    std::memcpy(&v, &bits, sizeof v);
+    values.push_back(v);
+  }
+  Lattice lattice(52);
+  lattice.Fill([] { return 0.0f; });
+  std::vector<uint8_t> row, expected;
+  size_t next = 0;
+  for (int i = 0; i < 52; i += 2) {
+    for (int j = 0; j < 52; j += 2) {
+      for (int k = 0; k < 52; k += 2) {
+        float* point = lattice.Point(i, j, k);
+        for (int c = 0; c < 3; ++c) point[c] = values[next++];
+        const uint8_t alpha = static_cast<uint8_t>(next);
+        const uint8_t pixel[4] = {uint8_t(5 * k), uint8_t(5 * j), uint8_t(5 * i), alpha};
+        const uint8_t out[4] = {tfx::LutComponentToByte(point[2]),
+                                tfx::LutComponentToByte(point[1]),
+                                tfx::LutComponentToByte(point[0]), alpha};
+        row.insert(row.end(), pixel, pixel + 4);
+        expected.insert(expected.end(), out, out + 4);
+      }
+    }
+  }
+  ForEveryTarget([&] {
+    std::vector<uint8_t> actual = row;
+    tfx::TetraRow(lattice.Table(), actual.data(), static_cast<int>(actual.size() / 4), 4);
+    int failures = 0;
+    for (size_t p = 0; p < actual.size() && failures < 10; p += 4) {
+      for (int c = 0; c < 3; ++c) {
+        if (actual[p + 2 - c] == expected[p + 2 - c]) continue;
+        ++failures;
+        ADD_FAILURE() << "value " << values[p / 4 * 3 + c] << " gives " << int{actual[p + 2 - c]}
+                      << ", expected " << int{expected[p + 2 - c]};
+      }
+    }
+    EXPECT_TRUE(std::equal(expected.begin(), expected.end(), actual.begin()));
+  });
+}
+
+TEST(CubeLutApply, EveryColourMatchesTheReference) {
+  Lattice lattice(33);
+  std::mt19937 rng(33);
+  std::uniform_real_distribution<float> value(-20.0f, 280.0f);
+  lattice.Fill([&] { return value(rng); });
+  const CxImage& colours = tfx_test::EveryColour();
+  const auto apply = [&](void (*rowFunction)(const tfx::TetraTable&, uint8_t*, int, int)) {
+    tfx_test::Image image = tfx_test::Clone(colours);
+    for (unsigned y = 0; y < image->GetHeight(); ++y) {
+      rowFunction(lattice.Table(), image->GetBits() + size_t{y} * image->GetEffWidth(),
+                  static_cast<int>(image->GetWidth()), 4);
+    }
+    return image;
+  };
+  const tfx_test::Image expected = apply(&tfx::TetraRowReference);
+  ForEveryTarget([&] { EXPECT_TRUE(tfx_test::SameBuffer(*expected, *apply(&tfx::TetraRow))); });
+}
+
+}  // namespace
