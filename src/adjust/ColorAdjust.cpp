@@ -6,23 +6,15 @@
 // path gives the same bytes.
 #include "tessarofx/ColorAdjust.h"
 
-#include <climits>
-#include <cmath>
 #include <cstddef>
 #include <cstdint>
 
+#include "adjust/ColorAdjustFormulas.h"
 #include "adjust/ColorAdjustRows.h"
 #include "adjust/ImageWalk.h"
 
 namespace tfx {
 namespace {
-
-// Float to int toward zero; out-of-range values and NaN give INT_MIN, as the x86 conversion
-// instructions (and so the vector kernels) do, instead of being undefined.
-int TruncToInt(float v) {
-  if (v >= -2147483648.0f && v < 2147483648.0f) return static_cast<int>(v);
-  return INT_MIN;
-}
 
 // 0 below 0, else trunc(min(255, v)).
 uint8_t FloatToByte(float v) {
@@ -32,30 +24,6 @@ uint8_t FloatToByte(float v) {
 
 uint8_t ScaleChannel(int channel, float gain) {
   return FloatToByte(static_cast<float>(channel) * gain);
-}
-
-struct ContrastLimits {
-  int lo;
-  int hi;
-  int d;
-};
-
-ContrastLimits DeriveContrast(float c) {
-  // t and lo's product in float.
-  const float t = c > 0.0f ? 1.0f / (1.0f - c / 255.0f) - 1.0f : c / 255.0f;
-  ContrastLimits limits;
-  limits.lo = TruncToInt(t * 100.0f * 0.5f);
-  if (255 - static_cast<int64_t>(limits.lo) < limits.lo) {
-    limits.lo = 120;
-    limits.hi = 127;
-  } else {
-    // hi comes from lo before its lower clamp; when that clamp applies, hi goes unused. Unsigned,
-    // so that the INT_MIN of an infinite t wraps instead of overflowing.
-    limits.hi = static_cast<int>(static_cast<uint32_t>(255) - static_cast<uint32_t>(limits.lo));
-    if (limits.lo < -127) limits.lo = -120;
-  }
-  limits.d = limits.lo < 0 ? 255 + 2 * limits.lo : 255 - 2 * limits.lo;
-  return limits;
 }
 
 uint8_t ContrastChannel(int channel, int lo, int hi, int d) {
@@ -99,11 +67,6 @@ void ApplyTable(CxImage* image, const uint8_t table[256], const ColorAdjustRows&
   }
 }
 
-float VibranceStrength(float v) {
-  // v / 100 in float, the 0.8 scale in double, stored as float.
-  return static_cast<float>(static_cast<double>(v / 100.0f) * 0.8);
-}
-
 tagRGBQUAD VibrancePixel(tagRGBQUAD c, float strength) {
   const unsigned char luma = calLuma(c);
   // The byte negation is intended: a mask luma of 0 gives weight 0, any other L gives 256 - L.
@@ -112,23 +75,14 @@ tagRGBQUAD VibrancePixel(tagRGBQUAD c, float strength) {
 }
 
 void ExposureTable(float e, uint8_t table[256]) {
-  // The exponent and the power in double, the gain used as float.
-  const float gain = static_cast<float>(std::pow(2.0, static_cast<double>(e) / 50.0 * 0.6));
+  const float gain = ExposureGain(e);
   // ScaleChannel also floors at 0, which a positive gain never reaches.
   for (int v = 0; v < 256; ++v) table[v] = ScaleChannel(v, gain);
 }
 
 void BrightnessTable(float b, uint8_t table[256]) {
-  // Positive b in float; the negative curve in double (its constants are not exact in float),
-  // stored as float.
-  const float k = b > 0.0f
-                      ? b / 100.0f + 1.0f
-                      : static_cast<float>((1.0 / (static_cast<double>(b) / 253.0 + 0.99) - 1.0) *
-                                           -255.0 * 0.6);
-  // The sign of k, not of b, picks factor or offset: below b = -250.47 k turns positive.
-  for (int v = 0; v < 256; ++v) {
-    table[v] = FloatToByte(k > 0.0f ? static_cast<float>(v) * k : static_cast<float>(v) + k);
-  }
+  const float k = BrightnessFactor(b);
+  for (int v = 0; v < 256; ++v) table[v] = FloatToByte(BrightnessValue(static_cast<float>(v), k));
 }
 
 void ContrastTable(float c, uint8_t table[256]) {
@@ -286,19 +240,10 @@ tagRGBQUAD calNewColor(tagRGBQUAD c, float s) {
   const int mx = tfx::Max3(c.rgbRed, c.rgbGreen, c.rgbBlue);
   const int mn = tfx::Min3(c.rgbRed, c.rgbGreen, c.rgbBlue);
   if (mx == mn) return c;
-  // Everything below in float.
-  const float sum = static_cast<float>(mx + mn) / 255.0f;
-  const float l = sum / 2.0f;
-  const float delta = static_cast<float>(mx - mn) / 255.0f;
-  const float lv = l * 255.0f;
+  const tfx::SaturationSpread spread =
+      tfx::SpreadOf(static_cast<float>(mx), static_cast<float>(mn));
   const auto apply = [&](uint8_t channel) {
-    const float f = channel;
-    if (s >= 0.0f) {
-      const float sat = l < 0.5f ? delta / sum : delta / (2.0f - sum);
-      const float a = sat + s >= 1.0f ? 1.0f / sat - 1.0f : 1.0f / (1.0f - s) - 1.0f;
-      return tfx::FloatToByte(f + (f - lv) * a);
-    }
-    return tfx::FloatToByte(lv + (f - lv) * (1.0f + s));
+    return tfx::FloatToByte(tfx::SaturatedChannel(channel, spread, s));
   };
   c.rgbBlue = apply(c.rgbBlue);
   c.rgbGreen = apply(c.rgbGreen);

@@ -12,18 +12,11 @@
 #include <vector>
 
 #include "adjust/ImageWalk.h"
+#include "adjust/LightAdjustFormulas.h"
 #include "adjust/LightAdjustTables.h"
 
 namespace tfx {
 namespace {
-
-// Everything below is float: the curve, M and the weights.
-float Curve(float ch, float k) { return 255.0f - (255.0f - ch) * (255.0f - k * ch) / 255.0f; }
-
-float WhiteCurve(float ch, float k) {
-  const float t = Curve(ch, k);
-  return k > 0.0f ? Curve(t, k) : t;
-}
 
 // Float to int toward zero; out-of-range values and NaN give INT_MIN, the x86 conversion result,
 // instead of being undefined.
@@ -40,12 +33,6 @@ uint8_t LimitedByte(float v) {
   return static_cast<uint8_t>(static_cast<int>(v < 255.0f ? v : 255.0f));
 }
 
-float BrightWeight(int brightest, float a) { return static_cast<float>(brightest) / 255.0f * a; }
-
-float DarkWeight(int brightest, float a) {
-  return (1.0f - static_cast<float>(brightest) / 255.0f) * a;
-}
-
 int Brightest(tagRGBQUAD c) {
   const int bg = c.rgbBlue > c.rgbGreen ? c.rgbBlue : c.rgbGreen;
   return bg > c.rgbRed ? bg : c.rgbRed;
@@ -55,8 +42,8 @@ enum class Op { kHighlight, kShadow, kWhiteLevel, kBlackLevel };
 
 template <Op op>
 float Weight(int brightest, float a) {
-  return op == Op::kHighlight || op == Op::kWhiteLevel ? BrightWeight(brightest, a)
-                                                       : DarkWeight(brightest, a);
+  const auto m = static_cast<float>(brightest);
+  return op == Op::kHighlight || op == Op::kWhiteLevel ? BrightWeight(m, a) : DarkWeight(m, a);
 }
 
 template <Op op>
@@ -90,15 +77,12 @@ struct Step {
   float a;
 };
 
-float ShadowFactor(float s) { return s / 100.0f * (s > 0.0f ? 2.0f : 0.5f); }
-float BlackLevelFactor(float k0) { return k0 / 100.0f * (k0 > 0.0f ? 0.5f : 2.0f); }
-
 // The operations with a non-zero strength, in the effect's order.
 std::vector<Step> Steps(float h, float s, float w, float k0) {
   std::vector<Step> steps;
-  if (h != 0.0f) steps.push_back({BuildTable<Op::kHighlight>, h / 100.0f});
+  if (h != 0.0f) steps.push_back({BuildTable<Op::kHighlight>, HighlightFactor(h)});
   if (s != 0.0f) steps.push_back({BuildTable<Op::kShadow>, ShadowFactor(s)});
-  if (w != 0.0f) steps.push_back({BuildTable<Op::kWhiteLevel>, w / 100.0f});
+  if (w != 0.0f) steps.push_back({BuildTable<Op::kWhiteLevel>, WhiteLevelFactor(w)});
   if (k0 != 0.0f) steps.push_back({BuildTable<Op::kBlackLevel>, BlackLevelFactor(k0)});
   return steps;
 }
@@ -195,7 +179,7 @@ CxImage* LightAdjust(CxImage* image, float h, float s, float w, float k0) {
 
 CxImage* hdrHighlight(CxImage* image, float h) {
   if (!image || h == 0.0f || !image->GetBits()) return image;
-  return tfx::ApplyStep(image, {tfx::BuildTable<tfx::Op::kHighlight>, h / 100.0f});
+  return tfx::ApplyStep(image, {tfx::BuildTable<tfx::Op::kHighlight>, tfx::HighlightFactor(h)});
 }
 
 CxImage* hdrShadow(CxImage* image, float s) {
@@ -205,7 +189,7 @@ CxImage* hdrShadow(CxImage* image, float s) {
 
 CxImage* hdrWhiteLevel(CxImage* image, float w) {
   if (!image || w == 0.0f || !image->GetBits()) return image;
-  return tfx::ApplyStep(image, {tfx::BuildTable<tfx::Op::kWhiteLevel>, w / 100.0f});
+  return tfx::ApplyStep(image, {tfx::BuildTable<tfx::Op::kWhiteLevel>, tfx::WhiteLevelFactor(w)});
 }
 
 CxImage* hdrBlackLevel(CxImage* image, float k0) {

@@ -7,7 +7,6 @@
 #include "tessarofx/WhiteBalance.h"
 
 #include <algorithm>
-#include <climits>
 #include <cmath>
 #include <cstddef>
 #include <cstdint>
@@ -16,18 +15,12 @@
 #include <opencv2/core.hpp>
 
 #include "adjust/ImageWalk.h"
+#include "adjust/WhiteBalanceFormulas.h"
 
 namespace {
 
 using tfx::ForEachPixel;
 using tfx::ForEachRow;
-
-// Float to int toward zero; out-of-range values and NaN give INT_MIN, as the x86 conversion
-// does, instead of being undefined.
-int TruncToInt(float v) {
-  if (v >= -2147483648.0f && v < 2147483648.0f) return static_cast<int>(v);
-  return INT_MIN;
-}
 
 // Truncated and limited to 0..255; NaN gives 0.
 uint8_t FloatToByte(float v) {
@@ -115,15 +108,14 @@ double Clamp01(double v) { return v < 0.0 ? 0.0 : v > 1.0 ? 1.0 : v; }
 
 uint8_t UnitToByte(double v) { return static_cast<uint8_t>(static_cast<int>(v * 255.0)); }
 
-// t * w + c * (1 - w) in float.
 uint8_t MixChannel(int c, int t, float w) {
-  return FloatToByte(static_cast<float>(t) * w + static_cast<float>(c) * (1.0f - w));
+  return FloatToByte(tfx::MixValue(static_cast<float>(c), static_cast<float>(t), w));
 }
 
-// The channel pulled towards the black-body colour: trunc(ch / 255 * tch * 255) in float,
-// blended with weight w.
+// The channel pulled towards the black-body colour, truncated, then blended with weight w.
 uint8_t TemperatureChannel(int ch, float tch, float w) {
-  const auto tinted = static_cast<uint8_t>(static_cast<int>(ch / 255.0f * tch * 255.0f));
+  const auto tinted =
+      static_cast<uint8_t>(static_cast<int>(tfx::TintedChannel(static_cast<float>(ch), tch)));
   return MixChannel(ch, tinted, w);
 }
 
@@ -214,15 +206,12 @@ bool AdjustWhiteBalance::Process(cv::Mat& src, cv::Mat& dst, ColorGain gain, flo
   if (src.empty() || dst.empty() || src.depth() != CV_8U || dst.depth() != CV_8U || channels < 3) {
     return true;
   }
-  // The factors with a double 0.5, as written, stored as float; the products in float.
-  const auto fB = static_cast<float>(1 + 0.5 * b - a);
-  const auto fG = static_cast<float>(1 - b);
-  const auto fR = static_cast<float>(1 + 0.5 * b + a);
+  const tfx::BalanceFactors f = tfx::DeriveBalance(a, b);
   uint8_t blue[256], green[256], red[256];
   for (int v = 0; v < 256; ++v) {
-    blue[v] = FloatToByte(static_cast<float>(v) * fB);
-    green[v] = FloatToByte(static_cast<float>(v) * fG);
-    red[v] = FloatToByte(static_cast<float>(v) * fR);
+    blue[v] = FloatToByte(static_cast<float>(v) * f.blue);
+    green[v] = FloatToByte(static_cast<float>(v) * f.green);
+    red[v] = FloatToByte(static_cast<float>(v) * f.red);
   }
 
   const auto run = [&](const uint8_t* s, uint8_t* d, size_t bytes) {
@@ -345,19 +334,8 @@ tagRGBQUAD mixColorAndTmpColor(tagRGBQUAD c, tagRGBQUAD t, float w) {
 
 CxImage* temperatureAdjustment(CxImage* image, long t) {
   if (!image || t == 11500 || !image->GetBits()) return image;
-  long kelvin;
-  if (t < 11500) {
-    // Saturates instead of overflowing for t near LONG_MIN.
-    if (__builtin_sub_overflow(26000L, t, &kelvin)) kelvin = LONG_MAX;
-  } else {
-    kelvin = std::max(18100 - t, 1700L);
-  }
-  const tagRGBQUAD colour = temperatureToRGB(kelvin);
-  // The fractions in float; the weight in double, used as float.
-  const float tR = colour.rgbRed / 255.0f;
-  const float tG = colour.rgbGreen / 255.0f;
-  const float tB = colour.rgbBlue / 255.0f;
-  const auto w = static_cast<float>(std::fabs(1.0 - static_cast<double>(kelvin) / 11500.0) * 1.7);
+  const tfx::TemperatureBlend blend = tfx::DeriveTemperature(t);
+  const float tR = blend.red, tG = blend.green, tB = blend.blue, w = blend.w;
 
   // The blend is per channel, so the whole colour M is three lookups.
   uint8_t mixRed[256], mixGreen[256], mixBlue[256];
@@ -423,7 +401,7 @@ tagRGBQUAD calNewTintPixel(tagRGBQUAD c, int kr, int kg, int kb) {
 CxImage* tintAdjustment(CxImage* image, float t) {
   if (!image || t == 0.0f || !image->GetBits()) return image;
   // t * 100 in float; |k| <= 2^23, so Y * k stays within 32 bits.
-  const int k = TruncToInt(t * 100.0f) >> 8;
+  const int k = tfx::TintFactor(t);
   Packing pk;
   if (!PackedPixels(*image, &pk)) {
     ForEachPixel(image, [&](tagRGBQUAD c) { return calNewTintPixel(c, k, -k, k); });
