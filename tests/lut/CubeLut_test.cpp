@@ -1,0 +1,357 @@
+// The CubeLut lattice: the interpolation tables, the identity-like lattices and their byte atlas,
+// doLUT's refusals and byte conversion, the process-wide instance and clone.
+#include "tessarofx/CubeLut.h"
+
+#include <gtest/gtest.h>
+
+#include <array>
+#include <cmath>
+#include <cstring>
+#include <limits>
+#include <memory>
+#include <vector>
+
+#include "lut/CubeLutApply.h"
+#include "support/EveryTarget.h"
+#include "support/ImageBuilders.h"
+
+namespace {
+
+using tfx_test::ForEveryTarget;
+
+float* Point(CubeLut& lut, int i, int j, int k) {
+  return lut.getLut3DData(nullptr, nullptr, nullptr, nullptr) + ((i * 64 + j) * 64 + k) * 3;
+}
+
+std::unique_ptr<CubeLut> Generated(int n) {
+  auto lut = std::make_unique<CubeLut>();
+  lut->generateLUT3DData(n);
+  return lut;
+}
+
+// One BGRA pixel through doLUT.
+std::vector<uint8_t> Apply(CubeLut& lut, std::vector<uint8_t> pixel) {
+  EXPECT_EQ(0, lut.doLUT(pixel.data(), 1, 1, 4, 4));
+  return pixel;
+}
+
+int AtlasIndex(int n, int i, int j, int k) { return ((k % 8 + (k / 8 * n + j) * 8) * n + i) * 3; }
+
+TEST(CubeLut, TablesPlaceEveryByteInItsCell) {
+  for (const int n : {2, 17, 32, 33, 64}) {
+    SCOPED_TRACE(n);
+    const auto lut = Generated(n);
+    int count = 0;
+    const float* ft = lut->getFTData(&count);
+    EXPECT_EQ(256, count);
+    const int* gt = lut->getGTData(&count);
+    EXPECT_EQ(256, count);
+    EXPECT_EQ(n - 1, gt[255]);
+    if (n == 64) {
+      // 255 / (255 / 63.0f) rounds below 63.
+      EXPECT_GT(ft[255], 0.0f);
+      EXPECT_LT(ft[255], 1e-5f);
+    } else {
+      EXPECT_EQ(0.0f, ft[255]);
+    }
+    const float cell = 255.0f / static_cast<float>(n - 1);
+    for (int v = 0; v < 256; ++v) {
+      const float s = static_cast<float>(v) / cell;
+      ASSERT_EQ(static_cast<int>(std::floor(s)), gt[v]) << v;
+      ASSERT_EQ(s - std::floor(s), ft[v]) << v;
+      ASSERT_GE(ft[v], 0.0f);
+      ASSERT_LT(ft[v], 1.0f);
+    }
+  }
+  // A 33-point cell spans 7.96875 levels: 8 is just past the first point, 255 on the last.
+  const auto lut = Generated(33);
+  EXPECT_EQ(1, lut->getGTData(nullptr)[8]);
+  EXPECT_FLOAT_EQ(8.0f / 7.96875f - 1.0f, lut->getFTData(nullptr)[8]);
+  EXPECT_EQ(31, lut->getGTData(nullptr)[254]);
+}
+
+TEST(CubeLut, GeneratedLatticeDividesBy31WhateverTheSize) {
+  auto two = Generated(2);
+  EXPECT_EQ(2, two->getLutSize());
+  EXPECT_EQ((std::vector<uint8_t>{0, 0, 0, 77}), Apply(*two, {0, 0, 0, 77}));
+  EXPECT_EQ((std::vector<uint8_t>{8, 8, 8, 77}), Apply(*two, {255, 255, 255, 77}));
+  EXPECT_EQ((std::vector<uint8_t>{8, 0, 0, 1}), Apply(*two, {255, 0, 0, 1}));  // blue alone
+
+  int w = 0, h = 0, d = 0, channels = 0;
+  auto lut = Generated(33);
+  lut->getLut3DData(&w, &h, &d, &channels);
+  EXPECT_EQ(33, w);
+  EXPECT_EQ(33, h);
+  EXPECT_EQ(33, d);
+  EXPECT_EQ(3, channels);
+  EXPECT_EQ(32.0f * 255.0f / 31.0f, Point(*lut, 32, 1, 0)[0]);
+  EXPECT_EQ(1.0f * 255.0f / 31.0f, Point(*lut, 32, 1, 0)[1]);
+  EXPECT_EQ(0.0f, Point(*lut, 32, 1, 0)[2]);
+}
+
+TEST(CubeLut, Identity32LeavesEveryColourAlone) {
+  const auto lut = Generated(32);
+  const CxImage& colours = tfx_test::EveryColour();
+  tfx_test::Image image = tfx_test::Clone(colours);
+  EXPECT_EQ(0, lut->doLUT(image->GetBits(), static_cast<int>(image->GetWidth()),
+                          static_cast<int>(image->GetHeight()),
+                          static_cast<int>(image->GetEffWidth()), 4));
+  EXPECT_TRUE(tfx_test::SameBuffer(colours, *image));
+}
+
+// With fr = fg = fb the last case reads C000, C010, C110 and C111. NaN in every other corner
+// would turn any other case's zero weights into a NaN result, which converts to 0.
+TEST(CubeLut, EqualFractionsTakeTheLastCase) {
+  const float nan = std::numeric_limits<float>::quiet_NaN();
+  auto lut = Generated(17);
+  for (int x = 0; x < 8; ++x) {
+    for (int ch = 0; ch < 3; ++ch)
+      Point(*lut, 6 + (x & 1), 6 + (x >> 1 & 1), 6 + (x >> 2))[ch] = nan;
+  }
+  // C000, C010, C110 and C111 of cell 6, as (red, green, blue) offsets.
+  for (const auto& at : {std::array<int, 3>{0, 0, 0}, {0, 1, 0}, {1, 1, 0}, {1, 1, 1}}) {
+    for (int ch = 0; ch < 3; ++ch) Point(*lut, 6 + at[0], 6 + at[1], 6 + at[2])[ch] = 100.0f;
+  }
+  ForEveryTarget([&] {
+    // 100 is 6.27 cells: every pixel of equal bytes in cell 6 has equal fractions.
+    for (const uint8_t v : {96, 100, 105, 111}) {
+      EXPECT_EQ((std::vector<uint8_t>{100, 100, 100, 9}), Apply(*lut, {v, v, v, 9})) << int{v};
+    }
+  });
+}
+
+struct ConversionCase {
+  float value;
+  uint8_t byte;
+};
+
+// A pixel on a lattice point converts that point's value unmixed: +0.5, a cap at 255, truncation,
+// and no floor, so negative results wrap.
+TEST(CubeLut, ResultsAreRoundedCappedAndWrapped) {
+  const ConversionCase cases[] = {
+      {0.0f, 0},
+      {0.49f, 0},
+      {0.5f, 1},
+      {127.5f, 128},
+      {254.49f, 254},
+      {254.5f, 255},
+      {300.0f, 255},
+      {1e30f, 255},
+      {-0.5f, 0},
+      {-1.0f, 0},
+      {-1.49f, 0},
+      {-1.5f, 255},
+      {-2.0f, 255},
+      {-255.0f, 2},
+      {-3e9f, 0},
+      {-2147483648.0f, 1},
+      {std::numeric_limits<float>::quiet_NaN(), 0},
+      {std::numeric_limits<float>::infinity(), 255},
+      {-std::numeric_limits<float>::infinity(), 0},
+  };
+  auto lut = Generated(2);
+  for (const ConversionCase& test : cases) {
+    SCOPED_TRACE(test.value);
+    // Black reads C000 alone with weight 1; the other corners are finite and weigh 0.
+    float* p = Point(*lut, 0, 0, 0);
+    p[0] = test.value;  // red
+    p[1] = 10.0f;
+    p[2] = 20.0f;
+    EXPECT_EQ((std::vector<uint8_t>{20, 10, test.byte, 200}), Apply(*lut, {0, 0, 0, 200}));
+    EXPECT_EQ(test.byte, tfx::LutComponentToByte(test.value));
+  }
+}
+
+// Pitch padding and bytes past the third stay as they are, whatever the pixel size.
+TEST(CubeLut, OnlyTheFirstThreeBytesOfEachPixelChange) {
+  auto lut = Generated(17);
+  for (int i = 0; i < 17; ++i) {
+    for (int j = 0; j < 17; ++j) {
+      for (int k = 0; k < 17; ++k) {
+        float* p = Point(*lut, i, j, k);
+        p[0] = 255.0f - 15.0f * k;
+        p[1] = 7.0f * i + 3.0f;
+        p[2] = 15.0f * j;
+      }
+    }
+  }
+  const tfx::TetraTable table{lut->getLut3DData(nullptr, nullptr, nullptr, nullptr),
+                              lut->getFTData(nullptr), lut->getGTData(nullptr), 17};
+  for (const int bpp : {3, 4, 5}) {
+    SCOPED_TRACE(bpp);
+    const int width = 37, height = 5;
+    const size_t pitch = static_cast<size_t>(width * bpp + 11);
+    const std::vector<uint8_t> before = tfx_test::NoiseBytes(pitch * height, bpp);
+    std::vector<uint8_t> after = before;
+    EXPECT_EQ(0, lut->doLUT(after.data(), width, height, static_cast<int>(pitch), bpp));
+    for (int y = 0; y < height; ++y) {
+      for (int x = 0; x < width; ++x) {
+        const size_t at = pitch * y + static_cast<size_t>(bpp) * x;
+        uint8_t expected[3] = {before[at], before[at + 1], before[at + 2]};
+        tfx::TetraRowReference(table, expected, 1, 3);
+        ASSERT_EQ(0, std::memcmp(expected, &after[at], 3)) << x << "," << y;
+        for (int b = 3; b < bpp; ++b) ASSERT_EQ(before[at + b], after[at + b]);
+      }
+      for (size_t b = static_cast<size_t>(width) * bpp; b < pitch; ++b) {
+        ASSERT_EQ(before[pitch * y + b], after[pitch * y + b]);
+      }
+    }
+  }
+}
+
+TEST(CubeLut, RefusalsLeaveThePixelsAlone) {
+  const std::vector<uint8_t> pixels = tfx_test::NoiseBytes(64 * 4, 5);
+  std::vector<uint8_t> work = pixels;
+
+  auto fresh = std::make_unique<CubeLut>();
+  EXPECT_EQ(1, fresh->getStatus());
+  EXPECT_EQ(23, fresh->doLUT(work.data(), 64, 1, 256, 4));
+  EXPECT_EQ(0, fresh->getStatus());  // cleared before the size check
+  // Sizes the lattice cannot hold are not taken.
+  fresh->generateLUT3DData(65);
+  EXPECT_EQ(0, fresh->getLutSize());
+  EXPECT_EQ(23, fresh->doLUT(work.data(), 64, 1, 256, 4));
+  EXPECT_EQ(pixels, work);
+
+  auto lut = Generated(2);
+  EXPECT_EQ(0, lut->doLUT(work.data(), 64, 0, 256, 4));
+  EXPECT_EQ(0, lut->doLUT(work.data(), 64, -3, 256, 4));
+  lut->setRowTable(new float[8][3]());
+  EXPECT_EQ(0, lut->doLUT(work.data(), 64, 1, 256, 4));
+  EXPECT_EQ(pixels, work);
+  lut->setRowTable(nullptr);
+  EXPECT_EQ(0, lut->doLUT(work.data(), 64, 1, 256, 4));
+  EXPECT_NE(pixels, work);
+
+  // One point per axis: every colour maps to it.
+  auto one = Generated(1);
+  EXPECT_EQ((std::vector<uint8_t>{0, 0, 0, 4}), Apply(*one, {255, 128, 3, 4}));
+}
+
+TEST(CubeLut, LastConstructedObjectIsTheInstance) {
+  CubeLut::releaseInstance();
+  CubeLut* made = CubeLut::getInstance();
+  ASSERT_NE(nullptr, made);
+  EXPECT_EQ(0, made->getLutSize());
+  EXPECT_EQ(made, CubeLut::getInstance());
+  CubeLut::releaseInstance();
+  CubeLut::releaseInstance();  // nothing registered: nothing to do
+
+  auto first = std::make_unique<CubeLut>();
+  EXPECT_EQ(first.get(), CubeLut::getInstance());
+  auto second = std::make_unique<CubeLut>();
+  EXPECT_EQ(second.get(), CubeLut::getInstance());
+  std::unique_ptr<CubeLut> copy(first->clone());
+  EXPECT_EQ(copy.get(), CubeLut::getInstance());
+  copy.reset();
+  // The registered object is gone; the instance is a new one, not the destroyed copy.
+  CubeLut* fresh = CubeLut::getInstance();
+  EXPECT_EQ(0, fresh->getLutSize());
+  CubeLut::releaseInstance();
+}
+
+TEST(CubeLut, CloneCopiesAllButTheRowTable) {
+  auto lut = Generated(5);
+  Point(*lut, 4, 3, 2)[1] = -7.25f;
+  lut->updateCalcuatedData(2, 3, 4, CubeLut::PR{1.0f, 2.0f, 3.0f});
+  lut->setRowTable(new float[4][3]());
+  const std::unique_ptr<CubeLut> copy(lut->clone());
+  EXPECT_EQ(nullptr, copy->getRowTable());
+  EXPECT_NE(nullptr, lut->getRowTable());
+  EXPECT_EQ(lut->getStatus(), copy->getStatus());
+  EXPECT_STREQ(lut->getTitle(), copy->getTitle());
+  EXPECT_EQ(5, copy->getLutSize());
+  EXPECT_EQ(0, std::memcmp(lut->getFTData(nullptr), copy->getFTData(nullptr), 256 * sizeof(float)));
+  EXPECT_EQ(0, std::memcmp(lut->getGTData(nullptr), copy->getGTData(nullptr), 256 * sizeof(int)));
+  for (int i = 0; i < 5; ++i) {
+    for (int j = 0; j < 5; ++j) {
+      for (int k = 0; k < 5; ++k) {
+        ASSERT_EQ(0, std::memcmp(Point(*lut, i, j, k), Point(*copy, i, j, k), 3 * sizeof(float)));
+      }
+    }
+  }
+  int bytes = 0, copyBytes = 0;
+  const uint8_t* atlas = lut->getAtlasData(&bytes);
+  const uint8_t* copyAtlas = copy->getAtlasData(&copyBytes);
+  EXPECT_EQ(5 * 5 * 5 * 3, copyBytes);
+  ASSERT_EQ(bytes, copyBytes);
+  EXPECT_NE(atlas, copyAtlas);
+  EXPECT_EQ(0, std::memcmp(atlas, copyAtlas, static_cast<size_t>(bytes)));
+  // The copy, without a row table, applies the lattice the original refuses to.
+  std::vector<uint8_t> pixel = {255, 255, 255, 0};
+  EXPECT_EQ(0, lut->doLUT(pixel.data(), 1, 1, 4, 4));
+  EXPECT_EQ((std::vector<uint8_t>{255, 255, 255, 0}), pixel);
+  EXPECT_EQ((std::vector<uint8_t>{33, 33, 33, 0}), Apply(*copy, pixel));  // 4 * 255 / 31
+}
+
+// The atlas has N^3 * 3 bytes, the size of the tile image only when N is a multiple of 8; for
+// other sizes the points whose tile falls beyond it are left out.
+TEST(CubeLut, AtlasHoldsTheLatticeInTiles) {
+  for (const int n : {2, 8, 17, 32, 33}) {
+    SCOPED_TRACE(n);
+    auto lut = Generated(n);
+    int bytes = 0;
+    const uint8_t* atlas = lut->getAtlasData(&bytes);
+    ASSERT_NE(nullptr, atlas);
+    ASSERT_EQ(n * n * n * 3, bytes);
+    int held = 0;
+    for (int k = 0; k < n; ++k) {
+      for (int j = 0; j < n; ++j) {
+        for (int i = 0; i < n; ++i) {
+          if (AtlasIndex(n, i, j, k) + 3 > bytes) continue;
+          ++held;
+          const uint8_t* a = atlas + AtlasIndex(n, i, j, k);
+          const float* p = Point(*lut, i, j, k);
+          for (int c = 0; c < 3; ++c) {
+            ASSERT_EQ(static_cast<uint8_t>(static_cast<int>(p[c])), a[c])
+                << i << "," << j << "," << k;
+          }
+        }
+      }
+    }
+    if (n % 8 == 0) {
+      EXPECT_EQ(n * n * n, held);
+    }
+  }
+  // The first argument is the blue index, the third the red; values keep their low 8 bits.
+  auto lut = Generated(17);
+  lut->updateCalcuatedData(9, 2, 5, CubeLut::PR{300.9f, -1.5f, 7.0f});
+  const uint8_t* a = lut->getAtlasData(nullptr) + AtlasIndex(17, 5, 2, 9);
+  EXPECT_EQ(44, a[0]);
+  EXPECT_EQ(255, a[1]);
+  EXPECT_EQ(7, a[2]);
+  // Nothing in the library clears the atlas state, so the atlas is not copied back.
+  lut->updateLUT3DData();
+  EXPECT_EQ(5.0f * 255.0f / 31.0f, Point(*lut, 5, 2, 9)[0]);
+}
+
+TEST(CubeLut, ResetWritesTheIntegerPattern) {
+  auto lut = Generated(33);
+  Point(*lut, 1, 2, 3)[0] = 99.0f;
+  lut->reset();
+  int bytes = 0;
+  const uint8_t* atlas = lut->getAtlasData(&bytes);
+  for (int k = 0; k < 33; ++k) {
+    for (int j = 0; j < 33; ++j) {
+      for (int i = 0; i < 33; ++i) {
+        const int expected[3] = {i * 255 / 31, j * 255 / 31, k * 255 / 31};
+        const int at = AtlasIndex(33, i, j, k);
+        for (int c = 0; c < 3; ++c) {
+          ASSERT_EQ(static_cast<float>(expected[c]), Point(*lut, i, j, k)[c]);
+          if (at + 3 <= bytes) {
+            ASSERT_EQ(static_cast<uint8_t>(expected[c]), atlas[at + c]);
+          }
+        }
+      }
+    }
+  }
+  EXPECT_EQ(8.0f, Point(*lut, 1, 0, 0)[0]);           // 8.2258... before
+  EXPECT_EQ(7, atlas[AtlasIndex(33, 0, 0, 32) + 2]);  // 263 keeps its low 8 bits
+
+  // Without a size there is nothing to reset.
+  auto empty = std::make_unique<CubeLut>();
+  empty->reset();
+  EXPECT_EQ(nullptr, empty->getAtlasData(nullptr));
+}
+
+}  // namespace
