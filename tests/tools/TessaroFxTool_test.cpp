@@ -247,8 +247,8 @@ TEST_F(ToolTest, FailuresNameTheirCauseAndLeaveNoOutput) {
       {"apply ChromeKeyLut3d -p green=256 in.png out.png", "0..255"},
       {"apply ColorAdjust none.png out.png", "none.png"},
       {"apply ColorAdjust --background wide.png in.png out.png", "9x4"},
-      // ChromeKeyCombine has no effect yet; when it gets one, pick another unimplemented filter.
-      {"apply ChromeKeyCombine in.png out.png", "0x80000001 (not implemented)"},
+      // ColorLut3dAdjust has no effect yet; when it gets one, pick another failing filter.
+      {"apply ColorLut3dAdjust in.png out.png", "0x80000001 (not implemented)"},
       {"apply ColorAdjust in.png out.xyz", "unknown image format"},
       {"apply ColorAdjust in.png no/such/dir/out.png", "No such file or directory"},
       {"apply ColorAdjust in.png in.png/out.png", "Not a directory"},
