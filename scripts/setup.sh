@@ -11,6 +11,7 @@ packages=(
   ocl-icd-opencl-dev opencl-clhpp-headers opencl-c-headers pocl-opencl-icd
   libgtest-dev libgmock-dev googletest
   libbenchmark-dev
+  libopencolorio-dev
 )
 
 missing=()

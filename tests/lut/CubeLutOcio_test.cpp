@@ -1,0 +1,136 @@
+// Agreement with OpenColorIO: a look baked by OCIO into a 33-point ".CUBE" file, read by
+// CubeLut::loadFile and applied by doLUT, against OCIO applying the same file with tetrahedral
+// interpolation at 8 bits. The two differ only in float rounding, so every channel of every
+// colour must agree within one level.
+#include <OpenColorIO/OpenColorIO.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <fstream>
+#include <memory>
+#include <sstream>
+#include <string>
+
+#include "support/ImageBuilders.h"
+#include "tessarofx/CubeLut.h"
+
+namespace OCIO = OCIO_NAMESPACE;
+
+namespace {
+
+// A config with a plain input space and a graded one: an ASC CDL (clamped to 0..1, so neither side
+// sees values beyond the byte range) with saturation, which mixes the channels, followed by a
+// channel-mixing matrix that keeps 0..1 inside 0..1.
+OCIO::ConstConfigRcPtr GradeConfig() {
+  OCIO::ConfigRcPtr config = OCIO::Config::Create();
+  // Not the raw config's own space: that one is data, which OCIO never converts.
+  OCIO::ColorSpaceRcPtr plain = OCIO::ColorSpace::Create();
+  plain->setName("plain");
+  config->addColorSpace(plain);
+  OCIO::CDLTransformRcPtr cdl = OCIO::CDLTransform::Create();
+  cdl->setStyle(OCIO::CDL_ASC);
+  const double slope[3] = {1.15, 0.95, 0.85};
+  const double offset[3] = {-0.02, 0.01, 0.05};
+  const double power[3] = {0.8, 1.1, 1.3};
+  cdl->setSlope(slope);
+  cdl->setOffset(offset);
+  cdl->setPower(power);
+  cdl->setSat(1.25);
+  OCIO::MatrixTransformRcPtr matrix = OCIO::MatrixTransform::Create();
+  const double m44[16] = {0.8, 0.15, 0.05, 0, 0.1, 0.85, 0.05, 0, 0.0, 0.2, 0.8, 0, 0, 0, 0, 1};
+  matrix->setMatrix(m44);
+  OCIO::GroupTransformRcPtr grade = OCIO::GroupTransform::Create();
+  grade->appendTransform(cdl);
+  grade->appendTransform(matrix);
+
+  OCIO::ColorSpaceRcPtr graded = OCIO::ColorSpace::Create();
+  graded->setName("graded");
+  graded->setTransform(grade, OCIO::COLORSPACE_DIR_FROM_REFERENCE);
+  config->addColorSpace(graded);
+  return config;
+}
+
+struct TempFile {
+  std::string path;
+  explicit TempFile(const std::string& name) : path(::testing::TempDir() + name) {}
+  ~TempFile() { std::remove(path.c_str()); }
+};
+
+// OCIO's "resolve_cube" writes a 1-D shaper section as well, which the reader refuses as an
+// unknown keyword; "iridas_cube" is a plain 3-D table.
+TEST(CubeLutOcio, BakedLookAgreesWithinOneLevel) {
+  try {
+    const OCIO::ConstConfigRcPtr config = GradeConfig();
+    OCIO::BakerRcPtr baker = OCIO::Baker::Create();
+    baker->setConfig(config);
+    baker->setFormat("iridas_cube");
+    baker->setInputSpace("plain");
+    baker->setTargetSpace("graded");
+    baker->setCubeSize(33);
+    std::ostringstream baked;
+    baker->bake(baked);
+
+    // Test runs of several builds may share the directory.
+    const TempFile file("tfx_ocio_look_" + std::to_string(getpid()) + ".cube");
+    std::ofstream(file.path, std::ios::binary) << baked.str();
+    const std::wstring widePath(file.path.begin(), file.path.end());
+    auto lut = std::make_unique<CubeLut>();
+    ASSERT_TRUE(lut->loadFile(widePath.c_str()))
+        << "status " << lut->getStatus() << "; the file begins:\n"
+        << baked.str().substr(0, 300);
+    ASSERT_EQ(33, lut->getLutSize());
+
+    OCIO::FileTransformRcPtr transform = OCIO::FileTransform::Create();
+    transform->setSrc(file.path.c_str());
+    transform->setInterpolation(OCIO::INTERP_TETRAHEDRAL);
+    transform->setDirection(OCIO::TRANSFORM_DIR_FORWARD);
+    const OCIO::ConstCPUProcessorRcPtr cpu =
+        config->getProcessor(transform)->getOptimizedCPUProcessor(
+            OCIO::BIT_DEPTH_UINT8, OCIO::BIT_DEPTH_UINT8, OCIO::OPTIMIZATION_NONE);
+
+    const CxImage& colours = tfx_test::EveryColour();
+    const tfx_test::Image ours = tfx_test::Clone(colours);
+    const tfx_test::Image theirs = tfx_test::Clone(colours);
+    const int width = static_cast<int>(colours.GetWidth());
+    const int height = static_cast<int>(colours.GetHeight());
+    const int pitch = static_cast<int>(colours.GetEffWidth());
+    ASSERT_EQ(0, lut->doLUT(ours->GetBits(), width, height, pitch, 4));
+    OCIO::PackedImageDesc desc(theirs->GetBits(), width, height, OCIO::CHANNEL_ORDERING_BGRA,
+                               OCIO::BIT_DEPTH_UINT8, 1, 4, pitch);
+    cpu->apply(desc);
+
+    int worst = 0, differing = 0, changed = 0;
+    for (int y = 0; y < height; ++y) {
+      const size_t row = static_cast<size_t>(y) * pitch;
+      const uint8_t* in = colours.GetBits() + row;
+      const uint8_t* a = ours->GetBits() + row;
+      const uint8_t* b = theirs->GetBits() + row;
+      for (int x = 0; x < width * 4; x += 4) {
+        for (int c = 0; c < 3; ++c) {
+          const int d = std::abs(a[x + c] - b[x + c]);
+          changed += a[x + c] != in[x + c];
+          differing += d != 0;
+          if (d > worst) {
+            worst = d;
+            if (d > 1) {
+              ADD_FAILURE() << "pixel " << x / 4 << "," << y << " channel " << c << ": "
+                            << int{a[x + c]} << " vs OCIO " << int{b[x + c]};
+            }
+          }
+        }
+      }
+    }
+    EXPECT_LE(worst, 1);
+    // A look that changed nothing would agree trivially.
+    const int channels = width * height * 3;
+    EXPECT_GT(changed, channels / 2);
+    // Nearly every channel matches exactly (697 of 3 * 2^24 here); a systematic offset would not.
+    EXPECT_LT(differing, channels / 1000) << differing << " channels differ by one level";
+  } catch (const OCIO::Exception& e) {
+    FAIL() << "OpenColorIO: " << e.what();
+  }
+}
+
+}  // namespace
