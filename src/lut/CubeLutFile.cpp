@@ -1,0 +1,376 @@
+// The file side of CubeLut: the ".CUBE" and ".3DL" readers.
+//
+// A ".CUBE" file is a header of keyword lines, then N^3 rows of three values with red changing
+// fastest, scaled here to 0..255 by the width of the domain:
+//
+//   # comment lines start with '#' in their very first column
+//   TITLE "Warm grade"
+//   DOMAIN_MIN 0.0 0.0 0.0
+//   DOMAIN_MAX 1.0 1.0 1.0
+//   LUT_3D_SIZE 2
+//   0.0 0.0 0.0          <- lattice[0][0][0]
+//   1.0 0.0 0.0          <- lattice[1][0][0]
+//   ...
+//
+// Each keyword may appear once; any other keyword (1-D sizes, input ranges) refuses the file.
+// The first line whose first word starts like a number ends the header.
+//
+// A ".3DL" file is free text up to its first numeric line, the input-range line, whose count
+// of space-separated pieces is N; then N^3 rows of 12-bit values with blue changing fastest:
+//
+//   3DMESH
+//   Mesh 4 12
+//   0 64 128 192 256 320 384 448 512 576 640 704 768 832 896 960 1023
+//   0 0 0                <- lattice[0][0][0]
+//   0 0 255              <- lattice[0][0][1]
+//   ...
+//
+// Hostile files are the normal case: the readers never write outside the 64-point lattice, never
+// allocate more than the input and an N <= 64 atlas, and every loop consumes input or stops.
+// Reading stops at the first error, and the stream is left where it stopped so that a caller
+// holding the stream can point at the line.
+#include "lut/CubeLutFile.h"
+
+#include <cctype>
+#include <climits>
+#include <cstdint>
+#include <cstdio>
+#include <cstring>
+#include <locale>
+#include <sstream>
+
+#include "tessarofx/CubeLut.h"
+
+namespace {
+
+constexpr int kTerminatorWindow = 252;  // characters searched for the first line end
+// Every ".3DL" file is read as 12-bit, whatever its range line says.
+constexpr float kDepth3dlMax = 4095.0f;
+
+// Finds the line terminator from the start of the stream: the first '\n' or '\r'; a '\r'
+// followed by '\n' makes a CR-LF file, read with '\n' so that its lines keep their '\r'. Returns
+// false when the first kTerminatorWindow characters hold neither. A file that ends sooner is read
+// with '\n' and has at most one line. The stream goes back to its start either way.
+bool DetectTerminator(std::ifstream& in, char* terminator) {
+  using Traits = std::ifstream::traits_type;
+  *terminator = '\n';
+  bool found = false;
+  for (int count = 0; count < kTerminatorWindow; ++count) {
+    const Traits::int_type c = in.get();
+    if (Traits::eq_int_type(c, Traits::eof())) {
+      found = true;
+      break;
+    }
+    if (c == '\n') {
+      found = true;
+      break;
+    }
+    if (c == '\r') {
+      *terminator = in.get() == '\n' ? '\n' : '\r';
+      found = true;
+      break;
+    }
+  }
+  // Cleared before the seek as well: a stream that met its end refuses to seek.
+  in.clear();
+  in.seekg(0);
+  in.clear();
+  return found;
+}
+
+// The header's test for a numeric line: a first word that sorts after "+" and before ":", so a
+// digit, '.', '-', ',', '/', or '+' with more after it.
+bool IsNumericWord(const std::string& word) { return word > "+" && word < ":"; }
+
+// The pieces splitString would cut `line` into, counted without building them: a hostile line of
+// spaces would cost a string per byte.
+size_t CountPieces(const std::string& line) {
+  if (line.empty()) return 0;
+  size_t pieces = 1;
+  for (const char c : line) pieces += c == ' ';
+  return pieces;
+}
+
+// Keyword values and table rows are read the same way whatever locale the host has set.
+std::istringstream ClassicStream(const std::string& text) {
+  std::istringstream in(text);
+  in.imbue(std::locale::classic());
+  return in;
+}
+
+}  // namespace
+
+// A Linux wchar_t holds a code point, so negative values count as 0x110000 and up, and
+// surrogates are encoded as they are.
+void tfx::WideToUtf8Path(const std::wstring& wide, char* out) {
+  size_t used = 0;
+  for (const wchar_t wc : wide) {
+    uint32_t cp = static_cast<uint32_t>(wc);
+    if (cp >= 0x110000u) cp = 0xFFFDu;
+    unsigned char bytes[4];
+    size_t n;
+    if (cp < 0x80u) {
+      bytes[0] = static_cast<unsigned char>(cp);
+      n = 1;
+    } else if (cp < 0x800u) {
+      bytes[0] = static_cast<unsigned char>(0xC0u | (cp >> 6));
+      bytes[1] = static_cast<unsigned char>(0x80u | (cp & 0x3Fu));
+      n = 2;
+    } else if (cp < 0x10000u) {
+      bytes[0] = static_cast<unsigned char>(0xE0u | (cp >> 12));
+      bytes[1] = static_cast<unsigned char>(0x80u | ((cp >> 6) & 0x3Fu));
+      bytes[2] = static_cast<unsigned char>(0x80u | (cp & 0x3Fu));
+      n = 3;
+    } else {
+      bytes[0] = static_cast<unsigned char>(0xF0u | (cp >> 18));
+      bytes[1] = static_cast<unsigned char>(0x80u | ((cp >> 12) & 0x3Fu));
+      bytes[2] = static_cast<unsigned char>(0x80u | ((cp >> 6) & 0x3Fu));
+      bytes[3] = static_cast<unsigned char>(0x80u | (cp & 0x3Fu));
+      n = 4;
+    }
+    if (used + n > kLutPathMaxBytes) return;
+    std::memcpy(out + used, bytes, n);
+    used += n;
+  }
+}
+
+bool CubeLut::loadFile(const wchar_t* path) {
+  if (!path) return false;
+  const std::wstring wide(path);
+  const size_t dot = wide.rfind(L'.');
+  if (dot == std::wstring::npos) return false;
+  std::wstring extension = wide.substr(dot);
+  for (wchar_t& c : extension) {
+    // toupper is defined only for values an unsigned char can hold; wider characters cannot be
+    // part of ".3DL" or ".CUBE" anyway and stay as they are.
+    if (c >= 0 && c <= UCHAR_MAX) c = static_cast<wchar_t>(std::toupper(static_cast<int>(c)));
+  }
+  char utf8[tfx::kLutPathBufferBytes] = {};
+  tfx::WideToUtf8Path(wide, utf8);
+
+  std::ifstream in(utf8, std::ios::in | std::ios::binary);
+  if (!in.is_open()) return false;
+  int result;
+  if (extension == L".3DL") {
+    result = load3DlFile(in);
+  } else if (extension == L".CUBE") {
+    result = loadCubeFile(in);
+  } else {
+    return false;
+  }
+  in.close();
+  return result == 0;
+}
+
+std::string CubeLut::readLine(std::ifstream& in, char terminator) {
+  std::string line;
+  for (;;) {
+    // A '#' only comments out a line when it is the very first character.
+    if (!line.empty() && line[0] != '#' && line != "\r") return line;
+    // Kept on purpose: a last line without a terminator leaves the end flag set and the next
+    // call reports 12, while one with a terminator lets getline fail first, which reports 10.
+    if (in.eof()) {
+      status_ = 12;
+      return line;
+    }
+    std::getline(in, line, terminator);
+    if (in.fail() || in.bad()) {
+      status_ = 10;
+      return line;
+    }
+  }
+}
+
+void CubeLut::splitString(const std::string& line, std::vector<std::string>& out) {
+  if (line.empty()) return;
+  size_t start = 0;
+  for (;;) {
+    const size_t space = line.find(' ', start);
+    if (space == std::string::npos) {
+      out.push_back(line.substr(start));
+      return;
+    }
+    out.push_back(line.substr(start, space - start));
+    start = space + 1;
+  }
+}
+
+std::vector<float> CubeLut::parseTableRow(const std::string& line) {
+  std::vector<float> values(3, 0.0f);
+  std::istringstream in = ClassicStream(line);
+  for (float& value : values) {
+    float read;
+    if (!(in >> read)) {
+      status_ = 24;
+      break;
+    }
+    value = read;
+  }
+  return values;
+}
+
+int CubeLut::load3DlFile(std::ifstream& in) {
+  status_ = 0;
+  title_.clear();
+  for (int c = 0; c < 3; ++c) {
+    domainMin_[c] = 0.0f;
+    domainMax_[c] = 1.0f;
+  }
+  std::memset(lattice_, 0, sizeof lattice_);
+  char terminator;
+  if (!DetectTerminator(in, &terminator)) status_ = 13;
+
+  while (status_ == 0) {
+    const std::string line = readLine(in, terminator);
+    if (status_ != 0) break;
+    std::istringstream words = ClassicStream(line);
+    std::string word;
+    // The mesh keyword is looked for in every header line, so a line of blanks alone, which has
+    // no first word to extract, is a failed read.
+    if (!(words >> word)) {
+      status_ = 10;
+      break;
+    }
+    if (word == "3DMESH" || word == "Mesh") continue;
+    if (IsNumericWord(word)) {
+      // The input range: one piece per lattice point. Empty pieces from doubled or trailing
+      // blanks count, and the lattice holds no more than kMaxSize.
+      const size_t pieces = CountPieces(line);
+      if (pieces < 3) {
+        status_ = 24;
+      } else if (pieces > static_cast<size_t>(kMaxSize)) {
+        status_ = 23;
+      } else {
+        size_ = static_cast<int32_t>(pieces);
+      }
+      break;
+    }
+  }
+
+  pointCount_ = size_ * size_ * size_;
+  allocateAtlas();
+  if (status_ == 0) buildTables();
+
+  // A component that fails to convert keeps the previous row's value; before the first row
+  // that value is 0.
+  float x = 0.0f, y = 0.0f, z = 0.0f;
+  const int n = size_;
+  for (int i = 0; status_ == 0 && i < n; ++i) {
+    for (int j = 0; status_ == 0 && j < n; ++j) {
+      for (int k = 0; status_ == 0 && k < n; ++k) {
+        const std::string line = readLine(in, terminator);
+        if (status_ != 0) break;
+        std::sscanf(line.c_str(), "%f %f %f", &x, &y, &z);
+        // Single precision: divided by the 12-bit maximum, then scaled to 0..255.
+        float* p = lattice_[i][j][k];
+        p[0] = x / kDepth3dlMax * 255.0f;
+        p[1] = y / kDepth3dlMax * 255.0f;
+        p[2] = z / kDepth3dlMax * 255.0f;
+      }
+    }
+  }
+  return status_;
+}
+
+int CubeLut::loadCubeFile(std::ifstream& in) {
+  status_ = 0;
+  title_.clear();
+  for (int c = 0; c < 3; ++c) {
+    domainMin_[c] = 0.0f;
+    domainMax_[c] = 1.0f;
+  }
+  std::memset(lattice_, 0, sizeof lattice_);
+  char terminator;
+  if (!DetectTerminator(in, &terminator)) status_ = 13;
+
+  bool sawTitle = false, sawMin = false, sawMax = false, sawSize = false;
+  while (status_ == 0) {
+    const std::streampos start = in.tellg();
+    const std::string line = readLine(in, terminator);
+    if (status_ != 0) break;
+    std::istringstream words = ClassicStream(line);
+    std::string word;
+    words >> word;
+    if (IsNumericWord(word)) {
+      // The first table row: read again by the data loop.
+      in.seekg(start);
+      break;
+    }
+    // A failed extraction reports 10 before any check of the value it should have produced.
+    if (word == "TITLE" && !sawTitle) {
+      sawTitle = true;
+      char quote = 0;
+      if (!(words >> quote)) {
+        status_ = 10;
+      } else if (quote != '"') {
+        status_ = 21;
+      } else if (!std::getline(words, title_, '"')) {
+        status_ = 10;
+      }
+    } else if (word == "DOMAIN_MIN" && !sawMin) {
+      sawMin = true;
+      if (!(words >> domainMin_[0] >> domainMin_[1] >> domainMin_[2])) status_ = 10;
+    } else if (word == "DOMAIN_MAX" && !sawMax) {
+      sawMax = true;
+      if (!(words >> domainMax_[0] >> domainMax_[1] >> domainMax_[2])) status_ = 10;
+    } else if (word == "LUT_3D_SIZE" && !sawSize) {
+      sawSize = true;
+      int n = 0;
+      if (!(words >> n)) {
+        status_ = 10;
+      } else if (n < 2 || n > kMaxSize) {
+        // The format goes up to 256, the lattice to kMaxSize; a refused size is never stored.
+        status_ = 23;
+      } else {
+        size_ = n;
+      }
+    } else {
+      status_ = 20;
+    }
+  }
+  if (status_ == 0) {
+    if (!sawSize) {
+      status_ = 23;
+    } else {
+      for (int c = 0; c < 3; ++c) {
+        if (!(domainMax_[c] > domainMin_[c])) status_ = 22;
+      }
+    }
+  }
+
+  pointCount_ = size_ * size_ * size_;
+  allocateAtlas();
+
+  const int n = size_;
+  if (rowTable_) {
+    // The raw rows go to the attached table unscaled, and the lattice stays zeroed.
+    for (int row = 0; status_ == 0 && row < n; ++row) {
+      const std::string line = readLine(in, terminator);
+      if (status_ != 0) break;
+      const std::vector<float> values = parseTableRow(line);
+      for (int c = 0; c < 3; ++c) rowTable_[row][c] = values[c];
+    }
+    return status_;
+  }
+
+  if (status_ == 0) buildTables();
+  // Deliberately only the domain's width: the minimum is not subtracted.
+  float scale[3];
+  for (int c = 0; c < 3; ++c) scale[c] = (domainMax_[c] - domainMin_[c]) * 255.0f;
+  // As in the ".3DL" reader, a missing component keeps the previous row's value, 0 at first.
+  float x = 0.0f, y = 0.0f, z = 0.0f;
+  for (int k = 0; status_ == 0 && k < n; ++k) {
+    for (int j = 0; status_ == 0 && j < n; ++j) {
+      for (int i = 0; status_ == 0 && i < n; ++i) {
+        const std::string line = readLine(in, terminator);
+        if (status_ != 0) break;
+        std::sscanf(line.c_str(), "%f %f %f", &x, &y, &z);
+        float* p = lattice_[i][j][k];
+        p[0] = x * scale[0];
+        p[1] = y * scale[1];
+        p[2] = z * scale[2];
+      }
+    }
+  }
+  return status_;
+}

@@ -1,0 +1,17 @@
+// Helpers of the LUT file code that tests and tools reach but the plug-in does not export.
+#pragma once
+
+#include <cstddef>
+#include <string>
+
+namespace tfx {
+
+constexpr size_t kLutPathBufferBytes = 8192;
+constexpr size_t kLutPathMaxBytes = 2047;
+
+// The UTF-8 form of a wide path into `out`, which the caller zero-fills with
+// kLutPathBufferBytes bytes. At most kLutPathMaxBytes bytes are written: conversion stops before
+// the first character that would not fit whole. Values from 0x110000 up become U+FFFD.
+void WideToUtf8Path(const std::wstring& wide, char* out);
+
+}  // namespace tfx
