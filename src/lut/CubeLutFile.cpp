@@ -1,4 +1,4 @@
-// The file side of CubeLut: the ".CUBE" and ".3DL" readers.
+// The file side of CubeLut: the ".CUBE" and ".3DL" readers and the ".CUBE" writer.
 //
 // A ".CUBE" file is a header of keyword lines, then N^3 rows of three values with red changing
 // fastest, scaled here to 0..255 by the width of the domain:
@@ -36,6 +36,7 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
+#include <iomanip>
 #include <locale>
 #include <sstream>
 
@@ -132,6 +133,13 @@ void tfx::WideToUtf8Path(const std::wstring& wide, char* out) {
     std::memcpy(out + used, bytes, n);
     used += n;
   }
+}
+
+std::string convertFloat2String(float v) {
+  std::ostringstream out;
+  out.imbue(std::locale::classic());
+  out << std::fixed << std::setprecision(8) << v;
+  return out.str();
 }
 
 bool CubeLut::loadFile(const wchar_t* path) {
@@ -373,4 +381,38 @@ int CubeLut::loadCubeFile(std::ifstream& in) {
     }
   }
   return status_;
+}
+
+bool CubeLut::writeLUT3D2File(const char* path) {
+  if (!path) {
+    std::puts("Path cannot be NULL!");
+    return false;
+  }
+  std::FILE* file = std::fopen(path, "wt+");
+  if (!file) {
+    std::puts("Cannot open the path file!");
+    return false;
+  }
+  std::fputs("#LUT size\n", file);
+  std::fprintf(file, "%s%d%s", "LUT_3D_SIZE ", size_, "\n\n");
+  std::fputs("#data domain\n", file);
+  std::fputs("DOMAIN_MIN 0.0 0.0 0.0\n", file);
+  std::fputs("DOMAIN_MAX 1.0 1.0 1.0\n\n", file);
+  std::fputs("#LUT data points\n", file);
+
+  const int n = size_;
+  for (int k = 0; k < n; ++k) {
+    for (int j = 0; j < n; ++j) {
+      for (int i = 0; i < n; ++i) {
+        // Single precision, as the lattice is.
+        const float* p = lattice_[i][j][k];
+        const std::string row = convertFloat2String(p[0] / 255.0f) + " " +
+                                convertFloat2String(p[1] / 255.0f) + " " +
+                                convertFloat2String(p[2] / 255.0f) + "\n";
+        std::fputs(row.c_str(), file);
+      }
+    }
+  }
+  std::fclose(file);
+  return true;
 }

@@ -4,6 +4,10 @@
 #include <cstddef>
 #include <string>
 
+// v in fixed notation with exactly eight decimals ("1.00000000", "0.50000000"), whatever the
+// host's locale: the form of every value the ".CUBE" writer emits.
+std::string convertFloat2String(float v);
+
 namespace tfx {
 
 constexpr size_t kLutPathBufferBytes = 8192;

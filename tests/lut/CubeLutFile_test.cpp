@@ -499,4 +499,86 @@ TEST(CubeLutFile, HostileBytesStayBounded) {
   }
 }
 
+TEST(CubeLutFile, ConvertFloat2String) {
+  EXPECT_EQ(convertFloat2String(1.0f), "1.00000000");
+  EXPECT_EQ(convertFloat2String(0.5f), "0.50000000");
+  EXPECT_EQ(convertFloat2String(0.0f), "0.00000000");
+  EXPECT_EQ(convertFloat2String(-0.25f), "-0.25000000");
+  EXPECT_EQ(convertFloat2String(1.0f / 3.0f), "0.33333334");  // the float, not the double third
+  EXPECT_EQ(convertFloat2String(1e10f), "10000000000.00000000");
+}
+
+std::string ReadAll(const std::string& path) {
+  std::ifstream in(path, std::ios::binary);
+  return std::string(std::istreambuf_iterator<char>(in), {});
+}
+
+TEST(CubeLutFile, WriterHeaderAndRows) {
+  TempDir dir;
+  const std::string header = std::string("#LUT size\nLUT_3D_SIZE 2\n\n#data domain\n") +
+                             "DOMAIN_MIN 0.0 0.0 0.0\nDOMAIN_MAX 1.0 1.0 1.0\n\n" +
+                             "#LUT data points\n";
+  CubeLut lut;
+  lut.generateLUT3DData(2);
+  const std::string path = dir.path() + "/out.cube";
+  ASSERT_TRUE(lut.writeLUT3D2File(path.c_str()));
+  const std::string text = ReadAll(path);
+  ASSERT_EQ(text.substr(0, header.size()), header);
+  // Red fastest: the second row is lattice[1][0][0] = 255/31 red, the last is all 255/31.
+  const std::string step = convertFloat2String(255.0f / 31.0f / 255.0f);
+  EXPECT_EQ(text.substr(header.size()),
+            "0.00000000 0.00000000 0.00000000\n" + step + " 0.00000000 0.00000000\n" +
+                "0.00000000 " + step + " 0.00000000\n" + step + " " + step + " 0.00000000\n" +
+                "0.00000000 0.00000000 " + step + "\n" + step + " 0.00000000 " + step + "\n" +
+                "0.00000000 " + step + " " + step + "\n" + step + " " + step + " " + step + "\n");
+
+  CubeLut empty;
+  ASSERT_TRUE(empty.writeLUT3D2File(path.c_str()));
+  EXPECT_EQ(ReadAll(path), Replace(header, "LUT_3D_SIZE 2", "LUT_3D_SIZE 0"));
+
+  testing::internal::CaptureStdout();
+  EXPECT_FALSE(lut.writeLUT3D2File(nullptr));
+  EXPECT_FALSE(lut.writeLUT3D2File((dir.path() + "/no/such/dir.cube").c_str()));
+  const std::string said = testing::internal::GetCapturedStdout();
+  EXPECT_NE(said.find("Path cannot be NULL!"), std::string::npos);
+  EXPECT_NE(said.find("Cannot open the path file!"), std::string::npos);
+}
+
+TEST(CubeLutFile, WriteThenLoadGivesTheLatticeBack) {
+  TempDir dir;
+  std::mt19937 random(77u);
+  std::uniform_real_distribution<float> value(0.0f, 255.0f);
+  for (const int n : {2, 17, 33, 64}) {
+    SCOPED_TRACE(n);
+    CubeLut out;
+    out.generateLUT3DData(n);
+    for (int i = 0; i < n; ++i) {
+      for (int j = 0; j < n; ++j) {
+        for (int k = 0; k < n; ++k) {
+          float* p = Point(out, i, j, k);
+          for (int c = 0; c < 3; ++c) p[c] = value(random);
+        }
+      }
+    }
+    const std::string path = dir.path() + "/round" + std::to_string(n) + ".cube";
+    ASSERT_TRUE(out.writeLUT3D2File(path.c_str()));
+    CubeLut in;
+    ASSERT_TRUE(in.loadFile(Wide(path).c_str()));
+    ASSERT_EQ(in.getLutSize(), n);
+    for (int i = 0; i < n; ++i) {
+      for (int j = 0; j < n; ++j) {
+        for (int k = 0; k < n; ++k) {
+          for (int c = 0; c < 3; ++c) {
+            const float written = Point(out, i, j, k)[c] / 255.0f;
+            const float text = std::strtof(convertFloat2String(written).c_str(), nullptr);
+            const float back = Point(in, i, j, k)[c];
+            ASSERT_EQ(back, text * 255.0f) << i << " " << j << " " << k;
+            ASSERT_NEAR(back / 255.0f, written, 1.5e-7) << i << " " << j << " " << k;
+          }
+        }
+      }
+    }
+  }
+}
+
 }  // namespace
