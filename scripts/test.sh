@@ -20,3 +20,16 @@ echo "== sanitizer build and tests (ASan + UBSan)"
 cmake --preset asan-ubsan
 cmake --build --preset asan-ubsan -j "$jobs"
 ctest --preset asan-ubsan -j "$jobs"
+
+echo "== fuzz: LUT files (libFuzzer, ASan + UBSan; corpus replay, then 60 s)"
+cmake --preset fuzz
+cmake --build --preset fuzz -j "$jobs"
+fuzzer=build/fuzz/bin/CubeLutLoad_fuzz
+mkdir -p build/fuzz/artifacts
+"$fuzzer" -artifact_prefix=build/fuzz/artifacts/ fuzz/corpus/*
+# New inputs go to a scratch copy of the corpus, so the checkout stays as it is.
+scratch=$(mktemp -d)
+trap 'rm -rf "$scratch"' EXIT
+cp fuzz/corpus/* "$scratch"/
+"$fuzzer" -max_total_time=60 -timeout=10 -print_final_stats=1 \
+  -artifact_prefix=build/fuzz/artifacts/ "$scratch"
