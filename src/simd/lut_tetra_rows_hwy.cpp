@@ -113,14 +113,10 @@ HWY_INLINE Corner LoadCorner(const float* lattice, VI offsets) {
   const DF df;
   const DI di;
   const hn::Repartition<double, DF> dd;
-  hn::Mask<DI> last;
-  if (kReachesEnd) {
-    const VI early = hn::Set(di, kLastPoint - 1);
-    last = hn::Gt(offsets, early);
-    offsets = hn::Min(offsets, early);
-  }
+  const VI early = hn::Set(di, kLastPoint - 1);
+  const auto last = hn::Gt(offsets, early);
   HWY_ALIGN int32_t at[HWY_MAX_BYTES / sizeof(int32_t)];
-  hn::Store(offsets, di, at);
+  hn::Store(kReachesEnd ? hn::Min(offsets, early) : offsets, di, at);
   // Block m of a_q is the point of pixel 4m + q, so the transpose inside each 128-bit block puts
   // every pixel's values in its own lane.
   const VF a0 = LoadBlocks(df, lattice, at), a1 = LoadBlocks(df, lattice, at + 1);
