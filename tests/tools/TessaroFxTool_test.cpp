@@ -247,8 +247,8 @@ TEST_F(ToolTest, FailuresNameTheirCauseAndLeaveNoOutput) {
       {"apply ChromeKeyLut3d -p green=256 in.png out.png", "0..255"},
       {"apply ColorAdjust none.png out.png", "none.png"},
       {"apply ColorAdjust --background wide.png in.png out.png", "9x4"},
-      // ColorLut3dAdjust has no effect yet; when it gets one, pick another failing filter.
-      {"apply ColorLut3dAdjust in.png out.png", "0x80000001 (not implemented)"},
+      // A filter's own failure: ColorLut3dAdjust without a LUT path.
+      {"apply ColorLut3dAdjust in.png out.png", "0x80000008 (resource unavailable)"},
       {"apply ColorAdjust in.png out.xyz", "unknown image format"},
       {"apply ColorAdjust in.png no/such/dir/out.png", "No such file or directory"},
       {"apply ColorAdjust in.png in.png/out.png", "Not a directory"},
