@@ -31,6 +31,9 @@ Commands:
       Calls one of the plug-in's exported image functions on INPUT.
   fx --list
       Those functions, their arguments and the symbols they are found by.
+  lut info FILE
+      Reads a .cube or .3dl file with the plug-in's reader and prints its size, title
+      and domain, or the line where reading stopped and why.
   demo [OUTDIR]
       Renders a built-in test scene through every filter, writing one PNG per filter
       and contact-sheet.png to OUTDIR (default: demo-out).
@@ -125,6 +128,8 @@ int Run(int argc, char** argv) {
     result = FxCommand(options, args);
   } else if (command == "demo") {
     result = DemoCommand(options, args);
+  } else if (command == "lut") {
+    result = LutCommand(options, args);
   } else {
     PrintError("unknown command '" + command + "' (see tessarofx --help)");
     return 2;

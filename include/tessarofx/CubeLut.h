@@ -52,7 +52,8 @@ class TFX_API CubeLut {
 
   int getLutSize() const { return size_; }
   int getStatus() const { return status_; }
-  const char* getTitle() const { return title_.c_str(); }
+  // Out of line, so that a host that loads the plug-in at run time can reach it by name.
+  const char* getTitle() const;
   // The domain of the last ".CUBE" read: (0,0,0)..(1,1,1) unless the file said otherwise.
   void getDomain(float minimum[3], float maximum[3]) const;
 

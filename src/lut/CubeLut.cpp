@@ -40,6 +40,8 @@ void CubeLut::releaseInstance() {
   mLut3d = nullptr;
 }
 
+const char* CubeLut::getTitle() const { return title_.c_str(); }
+
 void CubeLut::getDomain(float minimum[3], float maximum[3]) const {
   for (int c = 0; c < 3; ++c) {
     minimum[c] = domainMin_[c];

@@ -355,6 +355,72 @@ TEST_F(ToolTest, DemoWritesTheSceneEachFilterAndAContactSheet) {
   EXPECT_EQ(Slurp(Path("again/sample.png")), Slurp(Path("demo-out/sample.png")));
 }
 
+// A ".cube" table of n points per axis, red fastest, after `header` (lines ending in '\n') and
+// its own LUT_3D_SIZE line. Each point holds `rotate` ? (green, blue, red) : (red, green, blue)
+// of its input, 0..1.
+std::string CubeText(int n, const std::string& header = "", bool rotate = false) {
+  std::ostringstream out;
+  out << header << "LUT_3D_SIZE " << n << "\n";
+  for (int b = 0; b < n; ++b) {
+    for (int g = 0; g < n; ++g) {
+      for (int r = 0; r < n; ++r) {
+        const double v[3] = {r / double(n - 1), g / double(n - 1), b / double(n - 1)};
+        const int first = rotate ? 1 : 0;
+        out << v[first] << " " << v[(first + 1) % 3] << " " << v[(first + 2) % 3] << "\n";
+      }
+    }
+  }
+  return out.str();
+}
+
+std::string IdentityCube(int n, const std::string& header = "") { return CubeText(n, header); }
+
+TEST_F(ToolTest, LutInfoShowsSizeTitleAndDomain) {
+  {
+    std::ofstream(Path("grade.CUBE")) << IdentityCube(5,
+                                                      "# made by hand\nTITLE \"Warm\"\n"
+                                                      "DOMAIN_MIN 0.5 0.5 0.5\n");
+  }
+  const Outcome r = Run("lut info grade.CUBE");
+  ASSERT_EQ(r.exitCode, 0) << r.err;
+  EXPECT_NE(r.out.find("size:    5 points per axis"), npos) << r.out;
+  EXPECT_NE(r.out.find("title:   Warm\n"), npos) << r.out;
+  EXPECT_NE(r.out.find("domain:  0.5 0.5 0.5 .. 1 1 1"), npos) << r.out;
+}
+
+// A refused file names the status, its meaning and the physical line where the plug-in's reader
+// stopped, counting the comments and blank lines it skipped.
+TEST_F(ToolTest, LutInfoSaysWhereAndWhyTheReaderStopped) {
+  const struct {
+    const char* name;
+    std::string text;
+    std::vector<std::string> causes;
+  } cases[] = {
+      {"big.cube",
+       IdentityCube(65, "# 65 points\n\n"),
+       {"big.cube, line 3 (\"LUT_3D_SIZE 65\"): status 23, the size is missing or outside 2..64",
+        "tessarofx lut convert big.cube OUT.cube --size 64"}},
+      {"keyword.cube",
+       "# comment\n\n#another\nTITLE \"t\"\n\nLUT_1D_SIZE 3\n0 0 0\n",
+       {"line 6 (\"LUT_1D_SIZE 3\"): status 20, unknown or repeated keyword"}},
+      // CR-LF ends are one line end each; the header is judged at the first table row.
+      {"domain.cube",
+       "LUT_3D_SIZE 2\r\nDOMAIN_MAX 1 1 0\r\n# c\r\n\r\n0 0 0\r\n",
+       {"line 5 (\"0 0 0\"): status 22, a DOMAIN_MAX value is not above its DOMAIN_MIN"}},
+      {"short.cube", "LUT_3D_SIZE 2\n0 0 0\n\n1 0 0", {"line 4 (\"1 0 0\"): status 12"}},
+      {"range.3dl", "3DMESH\n\n0 512\n", {"line 3 (\"0 512\"): status 24"}},
+      {"grade.lut", "LUT_3D_SIZE 2\n", {"grade.lut: not a .cube or .3dl file"}},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    { std::ofstream(Path(c.name), std::ios::binary) << c.text; }
+    const Outcome r = Run(std::string("lut info ") + c.name);
+    EXPECT_EQ(r.exitCode, 1);
+    EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
+    for (const std::string& cause : c.causes) EXPECT_NE(r.err.find(cause), npos) << r.err;
+  }
+}
+
 TEST_F(ToolTest, UsageGoesToStdoutOnRequestAndStderrOnMistakes) {
   const Outcome help = Run("--help"), none = Run("");
   EXPECT_EQ(help.exitCode, 0);

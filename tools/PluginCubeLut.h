@@ -1,0 +1,58 @@
+// A CubeLut object of the loaded plug-in, driven through the members it exports. The tool is a
+// dlopen host and never links the plug-in, so it cannot call CubeLut's members or even name its
+// type information (which a sanitizer's checks of member calls would need); instead it resolves
+// each member by its symbol and calls it with the object as the first argument, as the compiler
+// would.
+#pragma once
+
+#include <cstddef>
+#include <fstream>
+#include <memory>
+#include <string>
+
+#include "PluginLibrary.h"
+#include "Status.h"
+
+class CubeLut;
+
+namespace tfxtool {
+
+class PluginCubeLut {
+ public:
+  // Constructs an object in storage of its own (a CubeLut is about 3 MiB, so on the heap).
+  static Status Create(const PluginLibrary& plugin, std::unique_ptr<PluginCubeLut>* out);
+  ~PluginCubeLut();
+  PluginCubeLut(const PluginCubeLut&) = delete;
+  PluginCubeLut& operator=(const PluginCubeLut&) = delete;
+
+  CubeLut* get() const { return object_; }
+
+  // The plug-in's readers on a stream the caller opened (binary); they return the status code
+  // and leave the stream where they stopped.
+  int LoadCube(std::ifstream& in) const;
+  int Load3Dl(std::ifstream& in) const;
+
+  // The 64-strided float lattice, lattice[((i * 64 + j) * 64 + k) * 3 + c] for red index i,
+  // green j, blue k; *size receives N.
+  float* Lattice(int* size) const;
+  void Domain(float minimum[3], float maximum[3]) const;
+  std::string Title() const;
+  // Size n with the plug-in's identity-like lattice (exact only for n = 32).
+  void Generate(int n) const;
+  // The plug-in's ".CUBE" writer.
+  bool Write(const std::string& path) const;
+
+  // Addresses of the free functions the plug-in exports beside the class.
+  void* Symbol(const char* name, std::string* why) const { return plugin_.Symbol(name, why); }
+
+ private:
+  struct Members;
+  PluginCubeLut(const PluginLibrary& plugin, std::unique_ptr<Members> members);
+
+  const PluginLibrary& plugin_;
+  std::unique_ptr<Members> members_;
+  std::unique_ptr<std::byte[]> storage_;
+  CubeLut* object_ = nullptr;
+};
+
+}  // namespace tfxtool
