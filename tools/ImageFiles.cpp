@@ -144,6 +144,11 @@ Status WriteImage(const std::string& path, const cv::Mat& bgra) {
 }
 
 Status WriteFileReplacing(const std::string& path, const std::vector<unsigned char>& bytes) {
+  return ReplaceFileVia(path, [&](int fd, const std::string&) { return WriteAll(fd, bytes); });
+}
+
+Status ReplaceFileVia(const std::string& path,
+                      const std::function<Status(int fd, const std::string& temporary)>& write) {
   // The temporary lives beside the target: rename is only atomic within one file system.
   const size_t slash = path.rfind('/');
   const size_t cut = slash == std::string::npos ? 0 : slash + 1;
@@ -158,7 +163,7 @@ Status WriteFileReplacing(const std::string& path, const std::vector<unsigned ch
   umask(mask);
   fchmod(fd, 0666 & ~mask);
 
-  Status s = WriteAll(fd, bytes);
+  Status s = write(fd, tmp);
   if (s.ok()) {
     s = CloseAndRename(fd, tmp, path);
   } else {

@@ -1,6 +1,7 @@
 // Image files in and out. Everything inside the tool is 8-bit BGRA, the frames' own format.
 #pragma once
 
+#include <functional>
 #include <opencv2/core.hpp>
 #include <string>
 #include <vector>
@@ -23,5 +24,12 @@ Status WriteImage(const std::string& path, const cv::Mat& bgra);
 
 // Replaces `path` with `bytes` the same way.
 Status WriteFileReplacing(const std::string& path, const std::vector<unsigned char>& bytes);
+
+// The same for content that something else writes: `write` gets the temporary file, already
+// created with the mode a plain create would give, as an open descriptor and by name (whoever
+// writes by name opens it again); the temporary replaces `path` only when `write` succeeds, and
+// is removed otherwise.
+Status ReplaceFileVia(const std::string& path,
+                      const std::function<Status(int fd, const std::string& temporary)>& write);
 
 }  // namespace tfxtool

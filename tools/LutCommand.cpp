@@ -1,9 +1,12 @@
-// tessarofx lut: looks into 3D LUT files with the plug-in's own reader.
+// tessarofx lut: looks into 3D LUT files with the plug-in's own reader, and converts and
+// resamples them to tables the plug-in takes.
 #include <cstdio>
+#include <cstring>
 #include <fstream>
 #include <memory>
 
 #include "Commands.h"
+#include "ImageFiles.h"
 #include "LutFiles.h"
 #include "PluginCubeLut.h"
 #include "Text.h"
@@ -91,15 +94,117 @@ Status InfoCommand(const GlobalOptions& options, const Args& words) {
   return Status::Ok();
 }
 
+Status ParseSize(const std::string& text, int* size) {
+  long long n = 0;
+  if (!ParseInteger(text, &n) || n < 2 || n > kPluginMaxSize) {
+    return Status::Error("bad --size '" + text + "': a whole number from 2 to " +
+                         std::to_string(kPluginMaxSize));
+  }
+  *size = static_cast<int>(n);
+  return Status::Ok();
+}
+
+// Makes `lut` a table of table.size points (at most 64) holding `table`.
+Status FillLattice(const PluginCubeLut& lut, const LutTable& table) {
+  lut.Generate(table.size);
+  int size = 0;
+  float* lattice = lut.Lattice(&size);
+  if (size != table.size) {
+    return Status::Error("the plug-in refused a size of " + std::to_string(table.size));
+  }
+  const int cap = kPluginMaxSize;
+  for (int i = 0; i < size; ++i) {
+    for (int j = 0; j < size; ++j) {
+      for (int k = 0; k < size; ++k) {
+        std::memcpy(lattice + ((i * cap + j) * cap + k) * 3, table.Point(i, j, k),
+                    3 * sizeof(float));
+      }
+    }
+  }
+  return Status::Ok();
+}
+
+// Writes the lut through the plug-in's ".CUBE" writer into a temporary file that replaces
+// `path` only once it is complete.
+Status WriteThroughPlugin(const PluginCubeLut& lut, const std::string& path) {
+  return ReplaceFileVia(path, [&](int, const std::string& temporary) {
+    return lut.Write(temporary) ? Status::Ok() : Status::Error("the plug-in's writer failed");
+  });
+}
+
+Status ConvertCommand(const GlobalOptions& options, const Args& args) {
+  std::string sizeText;
+  Args positional;
+  if (Status s = SplitArgs("lut convert", args, &sizeText, &positional); !s.ok()) return s;
+  if (positional.size() != 2) {
+    return Status::Error("lut convert takes IN and OUT (see tessarofx --help)");
+  }
+  const std::string& input = positional[0];
+  const std::string& output = positional[1];
+  int size = 0;
+  if (!sizeText.empty()) {
+    if (Status s = ParseSize(sizeText, &size); !s.ok()) return s;
+  }
+  if (LutFormatOf(output) != LutFormat::kCube) {
+    return Status::Error("cannot write " + output + ": lut convert writes .cube files");
+  }
+
+  PluginLibrary plugin;
+  if (Status s = plugin.Load(options.pluginPath); !s.ok()) return s;
+  std::unique_ptr<PluginCubeLut> lut;
+  if (Status s = PluginCubeLut::Create(plugin, &lut); !s.ok()) return s;
+
+  LutTable table;
+  switch (LutFormatOf(input)) {
+    case LutFormat::kCube:
+      if (Status s = ReadCubeTable(input, &table); !s.ok()) return s;
+      break;
+    case LutFormat::k3dl: {
+      // ".3DL" tables go through the plug-in's reader, so up to 64 points per axis.
+      if (Status s = LoadThroughPlugin(input, *lut); !s.ok()) return s;
+      const float* lattice = lut->Lattice(&table.size);
+      const int cap = kPluginMaxSize;
+      for (int i = 0; i < table.size; ++i) {
+        for (int j = 0; j < table.size; ++j) {
+          for (int k = 0; k < table.size; ++k) {
+            const float* p = lattice + ((i * cap + j) * cap + k) * 3;
+            table.values.insert(table.values.end(), p, p + 3);
+          }
+        }
+      }
+      break;
+    }
+    case LutFormat::kNone:
+      return Status::Error(LutFileMessage(input, 0, "", "not a .cube or .3dl file"));
+  }
+
+  if (size == 0) {
+    if (table.size > kPluginMaxSize) {
+      return Status::Error(
+          LutFileMessage(input, 0, "",
+                         std::to_string(table.size) + " points per axis, more than the plug-in's " +
+                             std::to_string(kPluginMaxSize) + ": pass --size " +
+                             std::to_string(kPluginMaxSize) + " (or smaller) to resample it"));
+    }
+  } else if (size != table.size) {
+    table = ResampleTable(table, size);
+  }
+  if (Status s = FillLattice(*lut, table); !s.ok()) return s;
+  if (Status s = WriteThroughPlugin(*lut, output); !s.ok()) return s;
+  std::printf("wrote %s (%d points per axis)\n", output.c_str(), table.size);
+  return Status::Ok();
+}
+
 }  // namespace
 
 Status LutCommand(const GlobalOptions& options, const Args& args) {
   if (args.empty()) {
-    return Status::Error("lut needs a subcommand: info (see tessarofx --help)");
+    return Status::Error("lut needs a subcommand: info, convert (see tessarofx --help)");
   }
   const Args rest(args.begin() + 1, args.end());
   if (args[0] == "info") return InfoCommand(options, rest);
-  return Status::Error("unknown lut subcommand '" + args[0] + "' (known: info)");
+  if (args[0] == "convert") return ConvertCommand(options, rest);
+  return Status::Error("unknown lut subcommand '" + args[0] + "' (known: info, convert)");
 }
 
 }  // namespace tfxtool

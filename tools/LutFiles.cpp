@@ -3,6 +3,8 @@
 #include <cctype>
 #include <cstdio>
 #include <fstream>
+#include <locale>
+#include <sstream>
 
 namespace tfxtool {
 namespace {
@@ -68,6 +70,149 @@ bool ScanTerminator(std::ifstream& in, char* terminator) {
 
 bool StartsWith(const std::string& text, const char* prefix) {
   return text.compare(0, std::char_traits<char>::length(prefix), prefix) == 0;
+}
+
+// The plug-in's ".CUBE" reader with a physical line count: one instance per file.
+class CubeReader {
+ public:
+  CubeReader(const std::string& path, std::ifstream& in) : path_(path), in_(in) {}
+
+  Status Read(LutTable* table) {
+    if (!ScanTerminator(in_, &terminator_)) return Fail(13, "");
+    float lo[3] = {0, 0, 0}, hi[3] = {1, 1, 1};
+    bool sawTitle = false, sawMin = false, sawMax = false;
+    int size = 0;
+    std::string row;  // the first table row, once the header has met it
+    for (;;) {
+      std::string line;
+      if (Status s = NextLine(&line); !s.ok()) return s;
+      std::istringstream words(line);
+      words.imbue(std::locale::classic());
+      std::string word;
+      words >> word;
+      if (word > "+" && word < ":") {
+        row = line;
+        break;
+      }
+      int status = 0;
+      if (word == "TITLE" && !sawTitle) {
+        sawTitle = true;
+        char quote = 0;
+        std::string title;
+        if (!(words >> quote)) {
+          status = 10;
+        } else if (quote != '"') {
+          status = 21;
+        } else if (!std::getline(words, title, '"')) {
+          status = 10;
+        }
+      } else if (word == "DOMAIN_MIN" && !sawMin) {
+        sawMin = true;
+        if (!(words >> lo[0] >> lo[1] >> lo[2])) status = 10;
+      } else if (word == "DOMAIN_MAX" && !sawMax) {
+        sawMax = true;
+        if (!(words >> hi[0] >> hi[1] >> hi[2])) status = 10;
+      } else if (word == "LUT_3D_SIZE" && size == 0) {
+        int n = 0;
+        if (!(words >> n)) {
+          status = 10;
+        } else if (n < 2 || n > kMaxCubeFileSize) {
+          return Fail(23, "LUT_3D_SIZE outside 2.." + std::to_string(kMaxCubeFileSize));
+        } else {
+          size = n;
+        }
+      } else {
+        status = 20;
+      }
+      if (status != 0) return Fail(status, LutStatusMeaning(status));
+    }
+    // Judged at the first table row, as the plug-in does.
+    if (size == 0) return Fail(23, "no LUT_3D_SIZE before the table");
+    for (int c = 0; c < 3; ++c) {
+      if (!(hi[c] > lo[c])) return Fail(22, LutStatusMeaning(22));
+    }
+
+    float scale[3];
+    for (int c = 0; c < 3; ++c) scale[c] = (hi[c] - lo[c]) * 255.0f;
+    table->size = size;
+    table->values.assign(static_cast<size_t>(size) * size * size * 3, 0.0f);
+    float x = 0, y = 0, z = 0;  // a missing number keeps the previous row's
+    for (int k = 0; k < size; ++k) {
+      for (int j = 0; j < size; ++j) {
+        for (int i = 0; i < size; ++i) {
+          if (row.empty()) {
+            if (Status s = NextLine(&row); !s.ok()) return s;
+          }
+          std::sscanf(row.c_str(), "%f %f %f", &x, &y, &z);
+          row.clear();
+          float* p = &table->values[((static_cast<size_t>(i) * size + j) * size + k) * 3];
+          p[0] = x * scale[0];
+          p[1] = y * scale[1];
+          p[2] = z * scale[2];
+        }
+      }
+    }
+    return Status::Ok();
+  }
+
+ private:
+  // The plug-in's readLine, counting every physical line it consumes.
+  Status NextLine(std::string* line) {
+    line->clear();
+    while (line->empty() || (*line)[0] == '#' || *line == "\r") {
+      if (in_.eof()) return Fail(12, LutStatusMeaning(12));
+      std::getline(in_, *line, terminator_);
+      if (in_.fail() || in_.bad()) return Fail(10, "the file ends before the table is complete");
+      ++number_;
+      text_ = *line;
+    }
+    return Status::Ok();
+  }
+
+  Status Fail(int status, const std::string& reason) const {
+    std::string text = text_;
+    if (!text.empty() && text.back() == '\r') text.pop_back();
+    return Status::Error(
+        LutFileMessage(path_, number_, text, "status " + std::to_string(status) + ", " + reason));
+  }
+
+  const std::string& path_;
+  std::ifstream& in_;
+  char terminator_ = '\n';
+  long number_ = 0;   // the physical line last read
+  std::string text_;  // and its text
+};
+
+// doLUT's tetrahedra: the corner path from C000 to C111 follows the fractions in decreasing
+// order, with strict comparisons tested in this order.
+float Tetrahedral(float fr, float fg, float fb, const float* c000, const float* c001,
+                  const float* c010, const float* c011, const float* c100, const float* c101,
+                  const float* c110, const float* c111, int ch) {
+  if (fr > fg) {
+    if (fg > fb) {
+      return (1 - fr) * c000[ch] + (fr - fg) * c100[ch] + (fg - fb) * c110[ch] + fb * c111[ch];
+    }
+    if (fr > fb) {
+      return (1 - fr) * c000[ch] + (fr - fb) * c100[ch] + (fb - fg) * c101[ch] + fg * c111[ch];
+    }
+    return (1 - fb) * c000[ch] + (fb - fr) * c001[ch] + (fr - fg) * c101[ch] + fg * c111[ch];
+  }
+  if (fb > fg) {
+    return (1 - fb) * c000[ch] + (fb - fg) * c001[ch] + (fg - fr) * c011[ch] + fr * c111[ch];
+  }
+  if (fb > fr) {
+    return (1 - fg) * c000[ch] + (fg - fb) * c010[ch] + (fb - fr) * c011[ch] + fr * c111[ch];
+  }
+  return (1 - fg) * c000[ch] + (fg - fr) * c010[ch] + (fr - fb) * c110[ch] + fb * c111[ch];
+}
+
+// Where output index i of m falls in an axis of n points: the lower point and the fraction.
+void Locate(int i, int m, int n, int* lower, float* fraction) {
+  // In float, as doLUT's tables are; the last index lands exactly on the last point.
+  const float s = static_cast<float>(i) * static_cast<float>(n - 1) / static_cast<float>(m - 1);
+  *lower = static_cast<int>(s);
+  if (*lower > n - 1) *lower = n - 1;
+  *fraction = s - static_cast<float>(*lower);
 }
 
 }  // namespace
@@ -157,6 +302,44 @@ LutLine LocateStop(const std::string& path, LutFormat format, long long offset, 
     }
   }
   return line;
+}
+
+Status ReadCubeTable(const std::string& path, LutTable* table) {
+  std::ifstream in(path, std::ios::in | std::ios::binary);
+  if (!in.is_open()) return Status::Error(LutFileMessage(path, 0, "", "cannot be opened"));
+  return CubeReader(path, in).Read(table);
+}
+
+LutTable ResampleTable(const LutTable& in, int m) {
+  LutTable out;
+  out.size = m;
+  out.values.resize(static_cast<size_t>(m) * m * m * 3);
+  const int n = in.size;
+  for (int i = 0; i < m; ++i) {
+    int ri;
+    float fr;
+    Locate(i, m, n, &ri, &fr);
+    const int ru = ri + 1 < n ? ri + 1 : n - 1;
+    for (int j = 0; j < m; ++j) {
+      int gi;
+      float fg;
+      Locate(j, m, n, &gi, &fg);
+      const int gu = gi + 1 < n ? gi + 1 : n - 1;
+      for (int k = 0; k < m; ++k) {
+        int bi;
+        float fb;
+        Locate(k, m, n, &bi, &fb);
+        const int bu = bi + 1 < n ? bi + 1 : n - 1;
+        float* p = &out.values[((static_cast<size_t>(i) * m + j) * m + k) * 3];
+        for (int ch = 0; ch < 3; ++ch) {
+          p[ch] = Tetrahedral(fr, fg, fb, in.Point(ri, gi, bi), in.Point(ri, gi, bu),
+                              in.Point(ri, gu, bi), in.Point(ri, gu, bu), in.Point(ru, gi, bi),
+                              in.Point(ru, gi, bu), in.Point(ru, gu, bi), in.Point(ru, gu, bu), ch);
+        }
+      }
+    }
+  }
+  return out;
 }
 
 }  // namespace tfxtool

@@ -3,6 +3,9 @@
 #pragma once
 
 #include <string>
+#include <vector>
+
+#include "Status.h"
 
 namespace tfxtool {
 
@@ -33,7 +36,32 @@ struct LutLine {
 //     without a LUT_3D_SIZE line just read) the line is that first table row.
 LutLine LocateStop(const std::string& path, LutFormat format, long long offset, int status);
 
-// The most points per axis the ".CUBE" format allows; the plug-in holds 64.
+// The points per axis the tool's own ".CUBE" reader takes: the most the format allows. The
+// plug-in holds 64.
 constexpr int kMaxCubeFileSize = 256;
+
+// A 3D table of any size up to kMaxCubeFileSize, in the plug-in's units: values in 0..255 for
+// 0..1, point (i, j, k) = (red, green, blue index) at values[((i * size + j) * size + k) * 3].
+struct LutTable {
+  int size = 0;
+  std::vector<float> values;
+
+  const float* Point(int i, int j, int k) const {
+    return values.data() + ((static_cast<size_t>(i) * size + j) * size + k) * 3;
+  }
+};
+
+// Reads a ".CUBE" file by the plug-in's rules but up to kMaxCubeFileSize points per axis, for
+// tables the plug-in refuses. The same header keywords, each once; the same line skipping
+// (empty lines, '#' in the first column, bare "\r"); rows with missing numbers keep the previous
+// row's values. Like the plug-in, it multiplies each value by the domain's width (DOMAIN_MAX -
+// DOMAIN_MIN) without subtracting DOMAIN_MIN, so the table means what the plug-in would make of
+// the same file if it were small enough. Errors carry the plug-in's status code and the physical
+// line where reading stopped.
+Status ReadCubeTable(const std::string& path, LutTable* table);
+
+// The table resampled to m points per axis by tetrahedral interpolation, with doLUT's corner
+// choice and weights but on positions that fall anywhere in a cell, and without rounding.
+LutTable ResampleTable(const LutTable& in, int m);
 
 }  // namespace tfxtool

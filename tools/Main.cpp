@@ -34,6 +34,10 @@ Commands:
   lut info FILE
       Reads a .cube or .3dl file with the plug-in's reader and prints its size, title
       and domain, or the line where reading stopped and why.
+  lut convert IN OUT.cube [--size N]
+      Rewrites a .cube (up to 256 points per axis) or .3dl table as a .cube file the
+      plug-in reads; --size N (2..64) resamples it by tetrahedral interpolation, which
+      tables above 64 points need.
   demo [OUTDIR]
       Renders a built-in test scene through every filter, writing one PNG per filter
       and contact-sheet.png to OUTDIR (default: demo-out).

@@ -5,7 +5,10 @@
 #include <sys/wait.h>
 
 #include <algorithm>
+#include <array>
 #include <cctype>
+#include <cmath>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
@@ -375,6 +378,20 @@ std::string CubeText(int n, const std::string& header = "", bool rotate = false)
 
 std::string IdentityCube(int n, const std::string& header = "") { return CubeText(n, header); }
 
+// The table rows of a ".cube" file, in file order.
+std::vector<std::array<double, 3>> CubeRows(const std::string& text) {
+  std::vector<std::array<double, 3>> rows;
+  std::istringstream lines(text);
+  for (std::string line; std::getline(lines, line);) {
+    std::array<double, 3> v;
+    if (!line.empty() && line[0] != '#' &&
+        std::sscanf(line.c_str(), "%lf %lf %lf", &v[0], &v[1], &v[2]) == 3) {
+      rows.push_back(v);
+    }
+  }
+  return rows;
+}
+
 TEST_F(ToolTest, LutInfoShowsSizeTitleAndDomain) {
   {
     std::ofstream(Path("grade.CUBE")) << IdentityCube(5,
@@ -419,6 +436,123 @@ TEST_F(ToolTest, LutInfoSaysWhereAndWhyTheReaderStopped) {
     EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
     for (const std::string& cause : c.causes) EXPECT_NE(r.err.find(cause), npos) << r.err;
   }
+}
+
+TEST_F(ToolTest, LutConvertResamplesATableTooBigForThePlugin) {
+  // A channel rotation: linear, so tetrahedral resampling must reproduce it exactly at any size,
+  // and any mix-up of axes or corners shows.
+  { std::ofstream(Path("big.cube")) << CubeText(65, "# rotation\n", true); }
+  for (const int n : {33, 20}) {
+    SCOPED_TRACE(n);
+    const std::string out = "small" + std::to_string(n) + ".cube";
+    const Outcome r = Run("lut convert big.cube " + out + " --size " + std::to_string(n));
+    ASSERT_EQ(r.exitCode, 0) << r.err;
+    const std::vector<std::array<double, 3>> rows = CubeRows(Slurp(Path(out)));
+    ASSERT_EQ(rows.size(), size_t(n) * n * n);
+    double worst = 0;
+    for (size_t at = 0; at < rows.size(); ++at) {
+      const double red = double(at % n) / (n - 1), green = double(at / n % n) / (n - 1),
+                   blue = double(at / n / n) / (n - 1);
+      worst = std::max({worst, std::abs(rows[at][0] - green), std::abs(rows[at][1] - blue),
+                        std::abs(rows[at][2] - red)});
+    }
+    EXPECT_LT(worst, 1e-6);
+  }
+  const Outcome info = Run("lut info small33.cube");
+  ASSERT_EQ(info.exitCode, 0) << info.err;
+  EXPECT_NE(info.out.find("size:    33 points per axis"), npos);
+
+  // Through the LUT effect: each colour rotated, within the rounding of doLUT.
+  WriteInput("in.png", 17, 9);
+  const Outcome r =
+      Run("apply ColorLut3dAdjust -p lut3dPath=" + Path("small33.cube") + " in.png out.png");
+  ASSERT_EQ(r.exitCode, 0) << r.err;
+  const cv::Mat in = Read("in.png"), out = Read("out.png");
+  ASSERT_EQ(out.size(), in.size());
+  for (int y = 0; y < in.rows; ++y) {
+    for (int x = 0; x < in.cols; ++x) {
+      const cv::Vec4b a = in.at<cv::Vec4b>(y, x), b = out.at<cv::Vec4b>(y, x);
+      const cv::Vec4b rotated(a[2], a[0], a[1], a[3]);  // blue <- red, green <- blue, red <- green
+      for (int c = 0; c < 4; ++c) EXPECT_LE(std::abs(b[c] - rotated[c]), 1) << x << "," << y;
+    }
+  }
+}
+
+TEST_F(ToolTest, LutConvertTurnsA3dlFileIntoACube) {
+  // 17 points with a 10-bit input range; every ".3DL" output is taken as 12-bit. Blue changes
+  // fastest, and the table is the channel rotation.
+  std::ostringstream text;
+  text << "3DMESH\nMesh 4 12\n";
+  for (int i = 0; i < 17; ++i) text << (i == 16 ? 1023 : i * 64) << (i == 16 ? "\n" : " ");
+  for (int r = 0; r < 17; ++r) {
+    for (int g = 0; g < 17; ++g) {
+      for (int b = 0; b < 17; ++b) {
+        text << std::lround(g * 4095 / 16.0) << " " << std::lround(b * 4095 / 16.0) << " "
+             << std::lround(r * 4095 / 16.0) << "\n";
+      }
+    }
+  }
+  { std::ofstream(Path("look.3DL")) << text.str(); }
+  const Outcome r = Run("lut convert look.3DL look.cube");
+  ASSERT_EQ(r.exitCode, 0) << r.err;
+  const std::vector<std::array<double, 3>> rows = CubeRows(Slurp(Path("look.cube")));
+  ASSERT_EQ(rows.size(), 17u * 17 * 17);
+  for (size_t at = 0; at < rows.size(); at += 97) {  // red fastest now
+    SCOPED_TRACE(at);
+    EXPECT_NEAR(rows[at][0], std::lround(at / 17 % 17 * 4095 / 16.0) / 4095.0, 1e-7);
+    EXPECT_NEAR(rows[at][1], std::lround(at / 289 * 4095 / 16.0) / 4095.0, 1e-7);
+    EXPECT_NEAR(rows[at][2], std::lround(at % 17 * 4095 / 16.0) / 4095.0, 1e-7);
+  }
+  EXPECT_NE(Run("lut info look.cube").out.find("size:    17 points per axis"), npos);
+}
+
+TEST_F(ToolTest, LutConvertKeepsThePluginsDomainScaling) {
+  // The plug-in multiplies by the domain's width and does not subtract its minimum; the
+  // converted table means the same, now over the plain domain.
+  { std::ofstream(Path("half.cube")) << IdentityCube(3, "DOMAIN_MIN 0.5 0.5 0.5\n"); }
+  ASSERT_EQ(Run("lut convert half.cube plain.cube").exitCode, 0);
+  const std::vector<std::array<double, 3>> rows = CubeRows(Slurp(Path("plain.cube")));
+  ASSERT_EQ(rows.size(), 27u);
+  EXPECT_EQ(rows[26], (std::array<double, 3>{0.5, 0.5, 0.5}));
+  EXPECT_EQ(rows[1], (std::array<double, 3>{0.25, 0, 0}));
+}
+
+// Refusals name the cause (with the physical line for parse errors) and leave no output behind.
+TEST_F(ToolTest, LutCommandsRefuseWithoutWritingAnything) {
+  { std::ofstream(Path("big.cube")) << IdentityCube(65); }
+  { std::ofstream(Path("huge.cube")) << "LUT_3D_SIZE 257\n"; }
+  { std::ofstream(Path("bad.cube")) << "# c\n\nLUT_3D_SIZE 70\nTITLE \"a\"\n\nTITLE \"b\"\n"; }
+  { std::ofstream(Path("cut.cube")) << "#c\nLUT_3D_SIZE 80\n0 0 0\n\n1 0 0\n"; }
+  { std::ofstream(Path("out.cube")) << "previous"; }
+  const struct {
+    std::string args;
+    std::string cause;
+  } cases[] = {
+      {"lut convert big.cube out.cube",
+       "big.cube: 65 points per axis, more than the plug-in's 64: "
+       "pass --size 64 (or smaller)"},
+      {"lut convert big.cube out.cube --size 65", "bad --size '65': a whole number from 2 to 64"},
+      {"lut convert big.cube out.png --size 8", "lut convert writes .cube files"},
+      {"lut convert huge.cube out.cube --size 8",
+       "huge.cube, line 1 (\"LUT_3D_SIZE 257\"): status 23, LUT_3D_SIZE outside 2..256"},
+      {"lut convert bad.cube out.cube --size 8",
+       "bad.cube, line 6 (\"TITLE \\\"b\\\"\"): status 20, unknown or repeated keyword"},
+      {"lut convert cut.cube out.cube --size 8",
+       "cut.cube, line 5 (\"1 0 0\"): status 10, the file ends before the table is complete"},
+      {"lut convert none.cube out.cube", "none.cube: cannot be opened"},
+      {"lut convert big.cube", "lut convert takes IN and OUT"},
+      {"lut frobnicate", "unknown lut subcommand 'frobnicate'"},
+  };
+  const std::vector<std::string> before = Listing();
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.args);
+    const Outcome r = Run(c.args);
+    EXPECT_EQ(r.exitCode, 1);
+    EXPECT_NE(r.err.find(c.cause), npos) << r.err;
+    EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
+    EXPECT_EQ(Listing(), before) << "output or temporary file left behind";
+  }
+  EXPECT_EQ(Slurp(Path("out.cube")), "previous");
 }
 
 TEST_F(ToolTest, UsageGoesToStdoutOnRequestAndStderrOnMistakes) {
