@@ -1,21 +1,29 @@
-// tessarofx lut: looks into 3D LUT files with the plug-in's own reader, and converts and
-// resamples them to tables the plug-in takes.
+// tessarofx lut: looks into 3D LUT files with the plug-in's own reader, converts and resamples
+// them to tables the plug-in takes, and bakes adjustments into new ones.
 #include <cstdio>
 #include <cstring>
 #include <fstream>
 #include <memory>
+#include <type_traits>
+#include <vector>
 
 #include "Commands.h"
+#include "FilterHost.h"
+#include "FilterTable.h"
 #include "ImageFiles.h"
 #include "LutFiles.h"
 #include "PluginCubeLut.h"
 #include "Text.h"
 #include "tessarofx/CubeLut.h"
+#include "tessarofx/Lut3dAdjust.h"
 
 namespace tfxtool {
 namespace {
 
 constexpr int kPluginMaxSize = CubeLut::kMaxSize;  // points per axis the plug-in holds
+// A cell of 255 / 32 levels, the common size of the format: finer than most grades bend, and
+// 36k points.
+constexpr int kDefaultBakeSize = 33;
 
 // A subcommand's words: its positional arguments and, where it takes one, the --size value
 // ("" when absent). "--" ends the options.
@@ -195,16 +203,222 @@ Status ConvertCommand(const GlobalOptions& options, const Args& args) {
   return Status::Ok();
 }
 
+// ---- bake ---------------------------------------------------------------------------------
+
+// The twins, reached like every other plug-in function by symbol; their pointer types are tied
+// to the public declarations.
+using TwinFn = CubeLut* (*)(CubeLut*, float);
+using BalanceTwinFn = CubeLut* (*)(CubeLut*, float, float);
+static_assert(std::is_same_v<decltype(&lut3d_exposureAdjustment), TwinFn>);
+static_assert(std::is_same_v<decltype(&lut3d_brightnessAdjustment), TwinFn>);
+static_assert(std::is_same_v<decltype(&lut3d_contrastAdjustment), TwinFn>);
+static_assert(std::is_same_v<decltype(&lut3d_vibranceAdjustment), TwinFn>);
+static_assert(std::is_same_v<decltype(&lut3d_saturationAdjustment), TwinFn>);
+static_assert(std::is_same_v<decltype(&lut3d_hdrHighlight), TwinFn>);
+static_assert(std::is_same_v<decltype(&lut3d_hdrShadow), TwinFn>);
+static_assert(std::is_same_v<decltype(&lut3d_hdrWhiteLevel), TwinFn>);
+static_assert(std::is_same_v<decltype(&lut3d_hdrBlackLevel), TwinFn>);
+static_assert(std::is_same_v<decltype(&lut3d_adjustWhiteBalance), BalanceTwinFn>);
+constexpr const char* kBalanceTwin = "_Z24lut3d_adjustWhiteBalanceP7CubeLutff";
+
+// A filter whose effect depends on colour alone, and so can be baked: its parameters in the
+// order its effect applies them, each with the twin it feeds (null for WhiteBalanceAdjust's,
+// which all feed the one balance twin).
+struct BakeableFilter {
+  const char* name;
+  std::vector<std::pair<const char*, const char*>> steps;  // parameter, twin symbol
+};
+
+const std::vector<BakeableFilter>& BakeableFilters() {
+  static const std::vector<BakeableFilter> kFilters = {
+      {"ColorAdjust",
+       {{"u_exposure", "_Z24lut3d_exposureAdjustmentP7CubeLutf"},
+        {"u_brightness", "_Z26lut3d_brightnessAdjustmentP7CubeLutf"},
+        {"u_contrast", "_Z24lut3d_contrastAdjustmentP7CubeLutf"},
+        {"u_vib", "_Z24lut3d_vibranceAdjustmentP7CubeLutf"},
+        {"u_sat", "_Z26lut3d_saturationAdjustmentP7CubeLutf"}}},
+      {"LightAdjust",
+       {{"u_highLight", "_Z18lut3d_hdrHighlightP7CubeLutf"},
+        {"u_shadow", "_Z15lut3d_hdrShadowP7CubeLutf"},
+        {"u_whiteLevel", "_Z19lut3d_hdrWhiteLevelP7CubeLutf"},
+        {"u_blackLevel", "_Z19lut3d_hdrBlackLevelP7CubeLutf"}}},
+      // The effect reads the gains and does not apply them; so does the bake.
+      {"WhiteBalanceAdjust",
+       {{"u_temperature", nullptr},
+        {"u_tint", nullptr},
+        {"u_rgain", nullptr},
+        {"u_ggain", nullptr},
+        {"u_bgain", nullptr}}},
+  };
+  return kFilters;
+}
+
+// One -f with its -p settings, checked against the filter's parameters and ranges.
+struct BakeStep {
+  const BakeableFilter* filter = nullptr;
+  const FilterInfo* info = nullptr;
+  std::vector<double> values;  // per entry of filter->steps; 0 (no change) unless set
+};
+
+Status StartStep(const std::string& name, BakeStep* step) {
+  std::string names;
+  for (const BakeableFilter& f : BakeableFilters()) {
+    names += (names.empty() ? "" : ", ") + std::string(f.name);
+    if (EqualsNoCase(f.name, name)) step->filter = &f;
+  }
+  if (!step->filter) {
+    return Status::Error("lut bake: '" + name +
+                         "' cannot be baked into a table (bakeable: " + names + ")");
+  }
+  step->info = FindFilterByName(step->filter->name);
+  if (!step->info) return Status::Error(std::string("no parameters known for ") + name);
+  step->values.assign(step->filter->steps.size(), 0.0);
+  for (size_t i = 0; i < step->values.size(); ++i) {
+    for (const ParamInfo& p : step->info->params) {
+      if (EqualsNoCase(p.name, step->filter->steps[i].first)) step->values[i] = p.defaultValue;
+    }
+  }
+  return Status::Ok();
+}
+
+Status SetStepParam(const std::string& text, BakeStep* step) {
+  ParamSetting setting;
+  if (Status s = ParseParamSetting(text, &setting); !s.ok()) return s;
+  const std::string& filter = step->filter->name;
+  const auto& steps = step->filter->steps;
+  size_t i = 0;
+  while (i < steps.size() && !EqualsNoCase(steps[i].first, setting.name)) ++i;
+  if (i == steps.size()) {
+    std::string valid;
+    for (const auto& s : steps) valid += (valid.empty() ? "" : ", ") + std::string(s.first);
+    return Status::Error(filter + " has no parameter '" + setting.name + "' (valid: " + valid +
+                         ")");
+  }
+  double v = 0;
+  if (!ParseNumber(setting.value, &v)) {
+    return Status::Error("bad value '" + setting.value + "' for " + steps[i].first +
+                         ": not a number");
+  }
+  for (const ParamInfo& p : step->info->params) {
+    if (EqualsNoCase(p.name, steps[i].first) && (v < p.min || v > p.max)) {
+      return Status::Error(filter + " " + p.name + " = " + setting.value +
+                           " is outside its range " + FormatNumber(p.min) + ".." +
+                           FormatNumber(p.max));
+    }
+  }
+  step->values[i] = v;  // the last setting of a name wins, as in apply
+  return Status::Ok();
+}
+
+template <class Fn>
+Status ResolveTwin(const PluginCubeLut& lut, const char* symbol, Fn* fn) {
+  std::string why;
+  void* p = lut.Symbol(symbol, &why);
+  if (!p) return Status::Error(std::string("the plug-in does not export ") + symbol + ": " + why);
+  *fn = reinterpret_cast<Fn>(p);
+  return Status::Ok();
+}
+
+// Applies one step's twins to the lattice, in its effect's order and with its effect's
+// conversions of the values.
+Status ApplyStep(const PluginCubeLut& lut, const BakeStep& step) {
+  if (!step.filter->steps.front().second) {
+    BalanceTwinFn balance = nullptr;
+    if (Status s = ResolveTwin(lut, kBalanceTwin, &balance); !s.ok()) return s;
+    // a = temperature / 200 and b = tint / 200 in double, passed as float.
+    balance(lut.get(), static_cast<float>(step.values[0] / 200.0),
+            static_cast<float>(step.values[1] / 200.0));
+    return Status::Ok();
+  }
+  for (size_t i = 0; i < step.values.size(); ++i) {
+    TwinFn twin = nullptr;
+    if (Status s = ResolveTwin(lut, step.filter->steps[i].second, &twin); !s.ok()) return s;
+    twin(lut.get(), static_cast<float>(step.values[i]));
+  }
+  return Status::Ok();
+}
+
+// The identity of n points, i * 255 / (n - 1) per axis; the plug-in's generated lattice is one
+// only for n = 32.
+LutTable IdentityTable(int n) {
+  LutTable table;
+  table.size = n;
+  table.values.reserve(static_cast<size_t>(n) * n * n * 3);
+  const auto level = [n](int i) {
+    return static_cast<float>(i) * 255.0f / static_cast<float>(n - 1);
+  };
+  for (int i = 0; i < n; ++i) {
+    for (int j = 0; j < n; ++j) {
+      for (int k = 0; k < n; ++k) {
+        table.values.insert(table.values.end(), {level(i), level(j), level(k)});
+      }
+    }
+  }
+  return table;
+}
+
+Status BakeCommand(const GlobalOptions& options, const Args& args) {
+  std::vector<BakeStep> steps;
+  std::string sizeText;
+  Args positional;
+  bool optionsEnded = false;
+  for (size_t i = 0; i < args.size(); ++i) {
+    Status error;
+    std::string value;
+    if (optionsEnded || !IsOptionWord(args[i])) {
+      positional.push_back(args[i]);
+    } else if (args[i] == "--") {
+      optionsEnded = true;
+    } else if (TakeOptionValue(args, &i, "--filter", "-f", &value, &error)) {
+      steps.emplace_back();
+      if (Status s = StartStep(value, &steps.back()); !s.ok()) return s;
+    } else if (error.ok() && TakeOptionValue(args, &i, "--param", "-p", &value, &error)) {
+      if (steps.empty()) {
+        return Status::Error("lut bake: -p " + value + " needs a -f FILTER before it");
+      }
+      if (Status s = SetStepParam(value, &steps.back()); !s.ok()) return s;
+    } else if (error.ok() && !TakeOptionValue(args, &i, "--size", nullptr, &sizeText, &error) &&
+               error.ok()) {
+      return Status::Error("lut bake: unknown option '" + args[i] + "'");
+    }
+    if (!error.ok()) return error;
+  }
+  if (positional.size() != 1) {
+    return Status::Error("lut bake takes one OUT.cube (see tessarofx --help)");
+  }
+  const std::string& output = positional[0];
+  int size = kDefaultBakeSize;
+  if (!sizeText.empty()) {
+    if (Status s = ParseSize(sizeText, &size); !s.ok()) return s;
+  }
+  if (LutFormatOf(output) != LutFormat::kCube) {
+    return Status::Error("cannot write " + output + ": lut bake writes .cube files");
+  }
+
+  PluginLibrary plugin;
+  if (Status s = plugin.Load(options.pluginPath); !s.ok()) return s;
+  std::unique_ptr<PluginCubeLut> lut;
+  if (Status s = PluginCubeLut::Create(plugin, &lut); !s.ok()) return s;
+  if (Status s = FillLattice(*lut, IdentityTable(size)); !s.ok()) return s;
+  for (const BakeStep& step : steps) {
+    if (Status s = ApplyStep(*lut, step); !s.ok()) return s;
+  }
+  if (Status s = WriteThroughPlugin(*lut, output); !s.ok()) return s;
+  std::printf("wrote %s (%d points per axis)\n", output.c_str(), size);
+  return Status::Ok();
+}
+
 }  // namespace
 
 Status LutCommand(const GlobalOptions& options, const Args& args) {
   if (args.empty()) {
-    return Status::Error("lut needs a subcommand: info, convert (see tessarofx --help)");
+    return Status::Error("lut needs a subcommand: info, convert, bake (see tessarofx --help)");
   }
   const Args rest(args.begin() + 1, args.end());
   if (args[0] == "info") return InfoCommand(options, rest);
   if (args[0] == "convert") return ConvertCommand(options, rest);
-  return Status::Error("unknown lut subcommand '" + args[0] + "' (known: info, convert)");
+  if (args[0] == "bake") return BakeCommand(options, rest);
+  return Status::Error("unknown lut subcommand '" + args[0] + "' (known: info, convert, bake)");
 }
 
 }  // namespace tfxtool

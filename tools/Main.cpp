@@ -38,6 +38,10 @@ Commands:
       Rewrites a .cube (up to 256 points per axis) or .3dl table as a .cube file the
       plug-in reads; --size N (2..64) resamples it by tetrahedral interpolation, which
       tables above 64 points need.
+  lut bake [-f FILTER [-p NAME=VALUE]...]... [--size N] OUT.cube
+      Bakes ColorAdjust, LightAdjust and WhiteBalanceAdjust settings (the parameters
+      apply takes) into a .cube table of N points per axis (default 33), in the order
+      given; ColorLut3dAdjust then applies the whole chain in one pass.
   demo [OUTDIR]
       Renders a built-in test scene through every filter, writing one PNG per filter
       and contact-sheet.png to OUTDIR (default: demo-out).
