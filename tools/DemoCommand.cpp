@@ -18,11 +18,25 @@ namespace {
 struct DemoStep {
   std::string filter;  // as on the command line
   std::vector<ParamSetting> params;
-  // Earlier steps whose results are this step's inputs; empty: the scene. A keyer's chain needs
-  // the mask of one step as the background of the next.
+  // Earlier steps (by label) whose results are this step's inputs; empty: the scene. A keyer's
+  // chain needs the mask of one step as the background of the next.
   std::string foreground;
   std::string background;  // empty: the foreground
+  // The step's name for its picture and for later steps; empty: the filter's name. A filter run
+  // twice needs one per run.
+  std::string label = "";
+
+  const std::string& Label() const { return label.empty() ? filter : label; }
 };
+
+std::vector<ParamSetting> KeyerParams(const Rgb& key, int mode) {
+  return {{"red", std::to_string(key.r)},
+          {"green", std::to_string(key.g)},
+          {"blue", std::to_string(key.b)},
+          {"contrast", "50"},
+          {"offset", "0"},
+          {"mode", std::to_string(mode)}};
+}
 
 // One representative setting per filter. Steps whose filter is not implemented yet are skipped
 // with a note, so entries can be added ahead of the effects.
@@ -50,16 +64,12 @@ std::vector<DemoStep> DemoSteps(const std::string& lutPath) {
       {"DistortionFringingAdjust", {{"distortion", "0"}, {"fringing", "100"}}, "", ""},
       {"ColorLut3dAdjust", {{"lut3dPath", lutPath}}, "", ""},
       {"HSLAdjust", {{"u_green_hue", "60"}, {"u_red_sat", "40"}, {"u_blue_light", "-30"}}, "", ""},
-      {"ChromeKeyLut3d",
-       {{"red", std::to_string(key.r)},
-        {"green", std::to_string(key.g)},
-        {"blue", std::to_string(key.b)},
-        {"contrast", "50"},
-        {"offset", "0"},
-        {"mode", "0"}},
-       "",
-       ""},
-      {"ChromeKeyCombine", {}, "", "ChromeKeyLut3d"},
+      // The green-screen key as a host runs it: the keyer once for the mask (mode 0) and once
+      // for the colours with the spill taken out (mode 1), the two joined with the mask as alpha,
+      // and the hole made opaque black for hosts that drop alpha.
+      {"ChromeKeyLut3d", KeyerParams(key, 0), "", "", "ChromeKeyLut3d-alpha"},
+      {"ChromeKeyLut3d", KeyerParams(key, 1), "", "", "ChromeKeyLut3d-beauty"},
+      {"ChromeKeyCombine", {}, "ChromeKeyLut3d-beauty", "ChromeKeyLut3d-alpha"},
       {"lutAToWhiteEffect", {}, "ChromeKeyCombine", ""},
   };
 }
@@ -134,7 +144,7 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
     cv::Mat foreground, background;
     const bool haveForeground = input(step.foreground, scene, &foreground);
     if (!haveForeground || !input(step.background, foreground, &background)) {
-      std::printf("skipped %s: it needs the result of %s\n", step.filter.c_str(),
+      std::printf("skipped %s: it needs the result of %s\n", step.Label().c_str(),
                   (haveForeground ? step.background : step.foreground).c_str());
       continue;
     }
@@ -143,10 +153,10 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
     Status s = ResolveFilter(published, step.filter, &filter);
     if (s.ok()) s = RunFilter(plugin, filter, step.params, foreground, background, &result);
     if (!s.ok() && s.code() == NLE_E_NOTIMPL) {
-      std::printf("skipped %s: not implemented yet\n", step.filter.c_str());
+      std::printf("skipped %s: not implemented yet\n", step.Label().c_str());
       continue;
     }
-    const std::string file = dir + "/" + step.filter + ".png";
+    const std::string file = dir + "/" + step.Label() + ".png";
     if (s.ok()) s = WriteImage(file, result);
     if (!s.ok()) {
       std::fprintf(stderr, "tessarofx: error: %s\n", s.message().c_str());
@@ -154,8 +164,8 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
       continue;
     }
     std::printf("wrote %s\n", file.c_str());
-    results[step.filter] = result;
-    tiles.push_back({step.filter, Caption(step), result});
+    results[step.Label()] = result;
+    tiles.push_back({step.Label(), Caption(step), result});
   }
 
   const cv::Mat sheet = MakeContactSheet("TessaroFx demo: before and after", tiles);

@@ -347,12 +347,23 @@ TEST_F(ToolTest, DemoWritesTheSceneEachFilterAndAContactSheet) {
   EXPECT_NE(cv::norm(adjusted, scene, cv::NORM_INF), 0);
   EXPECT_FALSE(Read("demo-out/contact-sheet.png").empty());
   // Every filter either wrote its picture or was skipped with a note.
-  for (const std::string name : {"LightAdjust", "WhiteBalanceAdjust", "VignetteAdjust",
-                                 "DistortionFringingAdjust", "ColorLut3dAdjust", "HSLAdjust",
-                                 "ChromeKeyLut3d", "ChromeKeyCombine", "lutAToWhiteEffect"}) {
+  for (const std::string name :
+       {"LightAdjust", "WhiteBalanceAdjust", "VignetteAdjust", "DistortionFringingAdjust",
+        "ColorLut3dAdjust", "HSLAdjust", "ChromeKeyLut3d-alpha", "ChromeKeyLut3d-beauty",
+        "ChromeKeyCombine", "lutAToWhiteEffect"}) {
     const bool wrote = fs::exists(Path("demo-out/" + name + ".png"));
     EXPECT_NE(wrote, r.out.find("skipped " + name + ":") != npos) << name;
   }
+  // The key chain: the green screen (from x 480, y 48) becomes a hole, then opaque black; a
+  // colour patch stays as it was.
+  const cv::Mat keyed = Read("demo-out/ChromeKeyCombine.png");
+  const cv::Mat filled = Read("demo-out/lutAToWhiteEffect.png");
+  ASSERT_EQ(keyed.size(), scene.size());
+  ASSERT_EQ(filled.size(), scene.size());
+  EXPECT_EQ(keyed.at<cv::Vec4b>(60, 500)[3], 0);
+  EXPECT_EQ(filled.at<cv::Vec4b>(60, 500), cv::Vec4b(0, 0, 0, 255));
+  EXPECT_EQ(keyed.at<cv::Vec4b>(90, 40), scene.at<cv::Vec4b>(90, 40));
+  EXPECT_EQ(filled.at<cv::Vec4b>(90, 40), scene.at<cv::Vec4b>(90, 40));
   // The demo is deterministic: a second run into another directory gives the same scene bytes.
   ASSERT_EQ(Run("demo " + Path("again")).exitCode, 0);
   EXPECT_EQ(Slurp(Path("again/sample.png")), Slurp(Path("demo-out/sample.png")));
