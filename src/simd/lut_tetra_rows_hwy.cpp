@@ -18,6 +18,7 @@
 
 #undef HWY_TARGET_INCLUDE
 #define HWY_TARGET_INCLUDE "simd/lut_tetra_rows_hwy.cpp"
+#include <hwy/cache_control.h>
 #include <hwy/foreach_target.h>  // IWYU pragma: keep
 #include <hwy/highway.h>
 
@@ -210,27 +211,59 @@ struct TetraKernel {
   }
 };
 
+// How far ahead of the vector being computed the corners of pixels are prefetched, in pixels.
+constexpr size_t kPrefetchAhead = 32;
+
+// Starts loading the four lattice rows that hold the corners of `count` 4-byte pixels. A lattice
+// of more than about 40 points per axis outgrows a 1 MiB second-level cache, and with pixels in
+// no particular order the corner loads then wait on memory; prefetching a few vectors ahead lets
+// those waits overlap.
+template <class Kernel>
+HWY_INLINE void PrefetchCorners(const Kernel& kernel, const uint8_t* pixels, size_t count) {
+  for (size_t i = 0; i < count; ++i, pixels += 4) {
+    const int32_t ri = kernel.gt[pixels[2]], gi = kernel.gt[pixels[1]], bi = kernel.gt[pixels[0]];
+    const int32_t rn = ri + 1 < kernel.last ? ri + 1 : kernel.last;
+    const int32_t gn = gi + 1 < kernel.last ? gi + 1 : kernel.last;
+    for (const int32_t r : {ri, rn}) {
+      for (const int32_t g : {gi, gn}) {
+        hwy::Prefetch(kernel.lattice + ((r << 12) + (g << 6) + bi) * 3);
+      }
+    }
+  }
+}
+
+// `count` 4-byte pixels in place, a whole number of vectors.
+template <bool kPrefetch, class Kernel>
+HWY_INLINE void WholeVectors(const Kernel& kernel, uint8_t* pixels, size_t count) {
+  const DU du;
+  const size_t lanes = hn::Lanes(du);
+  for (size_t x = 0; x < count; x += lanes) {
+    if (kPrefetch && x + kPrefetchAhead + lanes <= count) {
+      PrefetchCorners(kernel, pixels + 4 * (x + kPrefetchAhead), lanes);
+    }
+    uint32_t* const p = reinterpret_cast<uint32_t*>(pixels + 4 * x);
+    hn::StoreU(kernel(hn::LoadU(du, p)), du, p);
+  }
+}
+
 // 4-byte pixels in place, in whole vectors; the last partial vector goes through a zero-padded
 // copy, so the tail gets the same arithmetic as every other pixel.
-template <class Kernel>
+template <bool kPrefetch, class Kernel>
 void Rows4(const Kernel& kernel, uint8_t* row, size_t width) {
   const DU du;
   const size_t lanes = hn::Lanes(du);
-  size_t x = 0;
-  for (; x + lanes <= width; x += lanes) {
-    uint32_t* const p = reinterpret_cast<uint32_t*>(row + 4 * x);
-    hn::StoreU(kernel(hn::LoadU(du, p)), du, p);
-  }
-  if (x < width) {
+  const size_t whole = width / lanes * lanes;
+  WholeVectors<kPrefetch>(kernel, row, whole);
+  if (whole < width) {
     HWY_ALIGN uint32_t tail[HWY_MAX_BYTES / sizeof(uint32_t)] = {};
-    std::memcpy(tail, row + 4 * x, (width - x) * 4);
+    std::memcpy(tail, row + 4 * whole, (width - whole) * 4);
     hn::Store(kernel(hn::Load(du, tail)), du, tail);
-    std::memcpy(row + 4 * x, tail, (width - x) * 4);
+    std::memcpy(row + 4 * whole, tail, (width - whole) * 4);
   }
 }
 
 // Other pixel sizes gather blue, green and red into 4-byte pixels a block at a time.
-template <class Kernel>
+template <bool kPrefetch, class Kernel>
 void RowsN(const Kernel& kernel, uint8_t* row, size_t width, size_t bytesPerPixel) {
   const DU du;
   const size_t lanes = hn::Lanes(du);
@@ -245,9 +278,7 @@ void RowsN(const Kernel& kernel, uint8_t* row, size_t width, size_t bytesPerPixe
     }
     const size_t padded = (count + lanes - 1) / lanes * lanes;
     for (size_t i = count; i < padded; ++i) block[i] = 0;
-    for (size_t i = 0; i < padded; i += lanes) {
-      hn::Store(kernel(hn::Load(du, block + i)), du, block + i);
-    }
+    WholeVectors<kPrefetch>(kernel, reinterpret_cast<uint8_t*>(block), padded);
     uint8_t* out = first;
     for (size_t i = 0; i < count; ++i, out += bytesPerPixel) {
       out[0] = static_cast<uint8_t>(block[i]);
@@ -257,22 +288,26 @@ void RowsN(const Kernel& kernel, uint8_t* row, size_t width, size_t bytesPerPixe
   }
 }
 
-template <class Kernel>
+template <bool kPrefetch, class Kernel>
 void Rows(const Kernel& kernel, uint8_t* row, int width, int bytesPerPixel) {
   if (bytesPerPixel == 4) {
-    Rows4(kernel, row, static_cast<size_t>(width));
+    Rows4<kPrefetch>(kernel, row, static_cast<size_t>(width));
   } else {
-    RowsN(kernel, row, static_cast<size_t>(width), static_cast<size_t>(bytesPerPixel));
+    RowsN<kPrefetch>(kernel, row, static_cast<size_t>(width), static_cast<size_t>(bytesPerPixel));
   }
 }
 
 void TetraRowOfTarget(const TetraTable& table, uint8_t* row, int width, int bytesPerPixel) {
   if (width <= 0) return;
   if (table.size == 64) {
-    Rows(TetraKernel<true>{table.lattice, table.ft, table.gt, 63}, row, width, bytesPerPixel);
+    Rows<true>(TetraKernel<true>{table.lattice, table.ft, table.gt, 63}, row, width, bytesPerPixel);
+    return;
+  }
+  const TetraKernel<false> kernel{table.lattice, table.ft, table.gt, table.size - 1};
+  if (table.size > 40) {
+    Rows<true>(kernel, row, width, bytesPerPixel);
   } else {
-    Rows(TetraKernel<false>{table.lattice, table.ft, table.gt, table.size - 1}, row, width,
-         bytesPerPixel);
+    Rows<false>(kernel, row, width, bytesPerPixel);
   }
 }
 
