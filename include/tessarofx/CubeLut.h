@@ -94,7 +94,7 @@ class TFX_API CubeLut {
   float* getLut3DData(int* width, int* height, int* depth, int* channels);
   // The lattice as bytes in the OpenCL upload layout: 8*N texels wide, ceil(N/8)*N rows, three
   // bytes per texel. Blue slice k is the tile at column k % 8, tile row k / 8; inside it x is the
-  // red index and y the green index. *bytes receives N^3 * 3.
+  // red index and y the green index. *bytes receives its size, 8N * ceil(N/8)N * 3.
   const uint8_t* getAtlasData(int* bytes) const;
 
   // Attaches a raw table of rows (allocated with array new; the object frees it). While one is
@@ -106,7 +106,7 @@ class TFX_API CubeLut {
  private:
   void buildTables();  // fraction and grid index tables from size_
   int atlasIndex(int i, int j, int k) const;
-  void allocateAtlas();  // frees the atlas and allocates pointCount_ * 3 zeroed bytes
+  void allocateAtlas();  // frees the atlas and allocates a zeroed tile image for size_
 
   int32_t status_;
   std::string title_;

@@ -87,10 +87,10 @@ CubeLut* CubeLut::clone() {
   copy->atlasState_ = atlasState_;
   std::memcpy(copy->domainMin_, domainMin_, sizeof domainMin_);
   std::memcpy(copy->domainMax_, domainMax_, sizeof domainMax_);
-  const size_t bytes = static_cast<size_t>(pointCount_) * 3;
-  copy->atlas_ = new uint8_t[bytes]();
-  copy->atlasBytes_ = static_cast<int32_t>(bytes);
-  if (atlas_) std::memcpy(copy->atlas_, atlas_, std::min<size_t>(bytes, atlasBytes_));
+  copy->allocateAtlas();
+  if (atlas_) {
+    std::memcpy(copy->atlas_, atlas_, std::min<size_t>(copy->atlasBytes_, atlasBytes_));
+  }
   return copy;
 }
 
@@ -150,7 +150,7 @@ void CubeLut::updateLUT3DData() {
 
 void CubeLut::updateCalcuatedData(int k, int j, int i, const PR& p) {
   if (!atlas_ || i < 0 || j < 0 || k < 0 || i >= size_ || j >= size_ || k >= size_) return;
-  // An atlas kept from a smaller size (generateLUT3DData reuses it) has no room for this point.
+  // An atlas kept from a smaller size (generateLUT3DData reuses it) may have no room for it.
   const int index = atlasIndex(i, j, k);
   if (index + 3 > atlasBytes_) return;
   uint8_t* a = atlas_ + index;
@@ -184,7 +184,10 @@ const uint8_t* CubeLut::getAtlasData(int* bytes) const {
 
 void CubeLut::allocateAtlas() {
   delete[] atlas_;
-  atlasBytes_ = pointCount_ * 3;
+  // The whole tile image: N^3 points fill it only when N is a multiple of 8, and the last tile
+  // row of any other size reaches past N^3 * 3 bytes.
+  const int tileRows = (size_ + 7) / 8;
+  atlasBytes_ = 8 * size_ * tileRows * size_ * 3;
   atlas_ = new uint8_t[static_cast<size_t>(atlasBytes_)]();
 }
 

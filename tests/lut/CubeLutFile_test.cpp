@@ -83,7 +83,7 @@ void ExpectBounded(const CubeLut& lut) {
   EXPECT_LE(n, CubeLut::kMaxSize);
   int bytes = -1;
   lut.getAtlasData(&bytes);
-  EXPECT_EQ(bytes, n * n * n * 3);
+  EXPECT_EQ(bytes, 8 * n * ((n + 7) / 8) * n * 3);
 }
 
 // Sample values are sixteenths, exact as text and as floats. Row r is the r-th data line.
