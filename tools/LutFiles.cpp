@@ -1,6 +1,7 @@
 #include "LutFiles.h"
 
 #include <cctype>
+#include <cmath>
 #include <cstdio>
 #include <fstream>
 #include <locale>
@@ -145,10 +146,12 @@ class CubeReader {
           }
           std::sscanf(row.c_str(), "%f %f %f", &x, &y, &z);
           row.clear();
+          const float v[3] = {x * scale[0], y * scale[1], z * scale[2]};
+          if (!std::isfinite(v[0]) || !std::isfinite(v[1]) || !std::isfinite(v[2])) {
+            return Fail(24, LutStatusMeaning(24));
+          }
           float* p = &table->values[((static_cast<size_t>(i) * size + j) * size + k) * 3];
-          p[0] = x * scale[0];
-          p[1] = y * scale[1];
-          p[2] = z * scale[2];
+          for (int c = 0; c < 3; ++c) p[c] = v[c];
         }
       }
     }
@@ -262,7 +265,7 @@ std::string LutStatusMeaning(int status) {
     case 23:
       return "the size is missing or outside 2..64";
     case 24:
-      return "fewer than three numbers where three are needed";
+      return "fewer than three numbers where three are needed, or one that is not finite";
   }
   return "unknown status";
 }

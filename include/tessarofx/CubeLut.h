@@ -13,7 +13,8 @@
 //    1 nothing loaded yet                      21 .CUBE: TITLE not followed by '"'
 //   10 a stream read failed                    22 .CUBE: a domain maximum not above its minimum
 //   12 end of file while looking for a line    23 size missing or outside 2..64 (doLUT: 1..64)
-//   13 no line end in the first 252 bytes      24 a row with fewer than three numbers
+//   13 no line end in the first 252 bytes      24 a row with fewer than three numbers, or a
+//                                                 value that is infinite, NaN or past float
 // A failed read leaves the lattice zeroed up to the rows read before the error.
 //
 // Threading: an object is used by one thread at a time. getInstance() hands out a process-wide

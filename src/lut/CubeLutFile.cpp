@@ -33,6 +33,7 @@
 
 #include <cctype>
 #include <climits>
+#include <cmath>
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
@@ -47,6 +48,17 @@ namespace {
 constexpr int kTerminatorWindow = 252;  // characters searched for the first line end
 // Every ".3DL" file is read as 12-bit, whatever its range line says.
 constexpr float kDepth3dlMax = 4095.0f;
+
+// Stores one lattice point, unless a value is infinite or NaN: "inf", "nan" or a number beyond
+// float (scaled or not) is no colour, and a file holding one ends with status 24, like a row
+// short of numbers, rather than loading a table that cannot be written back out.
+bool StoreFinite(float* point, float red, float green, float blue) {
+  if (!std::isfinite(red) || !std::isfinite(green) || !std::isfinite(blue)) return false;
+  point[0] = red;
+  point[1] = green;
+  point[2] = blue;
+  return true;
+}
 
 // Finds the line terminator from the start of the stream: the first '\n' or '\r'; a '\r'
 // followed by '\n' makes a CR-LF file, read with '\n' so that its lines keep their '\r'. Returns
@@ -270,10 +282,10 @@ int CubeLut::load3DlFile(std::ifstream& in) {
         if (status_ != 0) break;
         std::sscanf(line.c_str(), "%f %f %f", &x, &y, &z);
         // Single precision: divided by the 12-bit maximum, then scaled to 0..255.
-        float* p = lattice_[i][j][k];
-        p[0] = x / kDepth3dlMax * 255.0f;
-        p[1] = y / kDepth3dlMax * 255.0f;
-        p[2] = z / kDepth3dlMax * 255.0f;
+        if (!StoreFinite(lattice_[i][j][k], x / kDepth3dlMax * 255.0f, y / kDepth3dlMax * 255.0f,
+                         z / kDepth3dlMax * 255.0f)) {
+          status_ = 24;
+        }
       }
     }
   }
@@ -373,10 +385,9 @@ int CubeLut::loadCubeFile(std::ifstream& in) {
         const std::string line = readLine(in, terminator);
         if (status_ != 0) break;
         std::sscanf(line.c_str(), "%f %f %f", &x, &y, &z);
-        float* p = lattice_[i][j][k];
-        p[0] = x * scale[0];
-        p[1] = y * scale[1];
-        p[2] = z * scale[2];
+        if (!StoreFinite(lattice_[i][j][k], x * scale[0], y * scale[1], z * scale[2])) {
+          status_ = 24;
+        }
       }
     }
   }
