@@ -10,8 +10,6 @@
 
 namespace {
 
-// The longest path text read from the parameter, in wide characters.
-constexpr size_t kMaxPathParam = 512;
 // The capacity of the buffer the host translates a path into.
 constexpr uint32_t kTranslatedCapacity = 1024;
 
@@ -38,8 +36,7 @@ class NLEColorLut3dAdjustEffect final : public NLEDynamicEffect {
   int Transform(uint8_t* dst, int dstWidth, int dstHeight, int dstPitch, const uint8_t*, int, int,
                 int, const uint8_t* src, int srcWidth, int srcHeight, int srcPitch) override {
     if (!dst || !src) return NLE_E_INVALIDARG;
-    std::wstring path = ParamString(L"lut3dPath");
-    if (path.size() > kMaxPathParam) path.resize(kMaxPathParam);
+    const std::wstring path = GetParamWString(L"lut3dPath");
     if (path.empty()) return NLE_E_RESOURCE;
     if (!table_) table_.reset(new CubeLut());
 

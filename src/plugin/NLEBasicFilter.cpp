@@ -192,9 +192,10 @@ double NLEBasicFilter::ParamDouble(const wchar_t* name, double fallback) const {
   return fallback;
 }
 
-std::wstring NLEBasicFilter::ParamString(const wchar_t* name) const {
+std::wstring NLEBasicFilter::GetParamWString(const wchar_t* name,
+                                             const std::wstring& fallback) const {
   auto it = paramIndex_.find(name);
-  if (it == paramIndex_.end() || !it->second) return std::wstring();
+  if (it == paramIndex_.end() || !it->second) return fallback;
   INLEProperties* param = it->second.get();
   std::wstring text(256, L'\0');
   uint32_t length = 0;
@@ -204,6 +205,6 @@ std::wstring NLEBasicFilter::ParamString(const wchar_t* name) const {
     text.assign(length + 1, L'\0');
     param->GetString(Key::Property::kValue_Current, text.data(), length + 1, &length);
   }
-  text.resize(length);
+  text.resize(length < kMaxParamText ? length : kMaxParamText);
   return text;
 }

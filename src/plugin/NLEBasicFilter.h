@@ -50,8 +50,10 @@ class NLEBasicFilter : public scombase::CUnknown, public INLECGFilter {
   // Current value of the parameter with this friendly name, or `fallback` when the filter has no
   // such parameter or its value is not a number.
   double ParamDouble(const wchar_t* name, double fallback = 0.0) const;
-  // Current value of a text parameter (empty when absent).
-  std::wstring ParamString(const wchar_t* name) const;
+  // Current value of a text parameter, at most kMaxParamText wide characters, or `fallback` when
+  // the filter has no such parameter.
+  static constexpr size_t kMaxParamText = 512;
+  std::wstring GetParamWString(const wchar_t* name, const std::wstring& fallback = {}) const;
 
   INLEFrame* Background() const { return background_; }
   INLEFrame* Foreground() const { return foreground_; }
