@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
 # Sets the machine up, then builds and runs every test: a format check, the release build with
-# its unit and tool tests, and the same suite under AddressSanitizer + UndefinedBehaviorSanitizer.
+# its unit and tool tests, the same suite under AddressSanitizer + UndefinedBehaviorSanitizer, and
+# the LUT reader's fuzz target over its corpus and then for a bounded time.
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
