@@ -107,6 +107,9 @@ class TFX_API CubeLut {
  private:
   void buildTables();  // fraction and grid index tables from size_
   int atlasIndex(int i, int j, int k) const;
+  // What both readers do first: status 0, no title, the default domain, a zeroed lattice, and the
+  // line terminator detected (status 13 when none is found). Returns the terminator.
+  char beginRead(std::ifstream& in);
   void allocateAtlas();  // frees the atlas and allocates a zeroed tile image for size_
 
   int32_t status_;

@@ -229,7 +229,7 @@ std::vector<float> CubeLut::parseTableRow(const std::string& line) {
   return values;
 }
 
-int CubeLut::load3DlFile(std::ifstream& in) {
+char CubeLut::beginRead(std::ifstream& in) {
   status_ = 0;
   title_.clear();
   for (int c = 0; c < 3; ++c) {
@@ -239,6 +239,11 @@ int CubeLut::load3DlFile(std::ifstream& in) {
   std::memset(lattice_, 0, sizeof lattice_);
   char terminator;
   if (!DetectTerminator(in, &terminator)) status_ = 13;
+  return terminator;
+}
+
+int CubeLut::load3DlFile(std::ifstream& in) {
+  const char terminator = beginRead(in);
 
   while (status_ == 0) {
     const std::string line = readLine(in, terminator);
@@ -293,15 +298,7 @@ int CubeLut::load3DlFile(std::ifstream& in) {
 }
 
 int CubeLut::loadCubeFile(std::ifstream& in) {
-  status_ = 0;
-  title_.clear();
-  for (int c = 0; c < 3; ++c) {
-    domainMin_[c] = 0.0f;
-    domainMax_[c] = 1.0f;
-  }
-  std::memset(lattice_, 0, sizeof lattice_);
-  char terminator;
-  if (!DetectTerminator(in, &terminator)) status_ = 13;
+  const char terminator = beginRead(in);
 
   bool sawTitle = false, sawMin = false, sawMax = false, sawSize = false;
   while (status_ == 0) {
