@@ -9,6 +9,7 @@
 namespace {
 
 using tfx_test::CreateEffect;
+using tfx_test::ExpectRefusesMissingForeground;
 constexpr const wchar_t* kAToWhite = L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356";
 
 // Despite the name, fully transparent pixels become opaque black; any other alpha passes.
@@ -28,12 +29,7 @@ TEST(AToWhiteEffect, TurnsOnlyFullyTransparentPixelsOpaqueBlack) {
 
 TEST(AToWhiteEffect, MissingForegroundIsABadArgument) {
   NLEComPtr<INLECGFilter> filter = CreateEffect(kAToWhite, nullptr);
-  TestFrame* bg = new TestFrame(2, 2);
-  TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
-  NLEComPtr<INLEFrame> h1(bg), h2(dst);
-  filter->SetBackground(bg);
-  EXPECT_EQ(filter->Running(dst), NLE_E_INVALIDARG);
-  EXPECT_EQ(dst->pixels[0], 9);
+  ExpectRefusesMissingForeground(filter.get());
 }
 
 }  // namespace

@@ -12,6 +12,7 @@ namespace {
 
 namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
+using tfx_test::ExpectRefusesMissingForeground;
 using tfx_test::Settings;
 constexpr const wchar_t* kChromeKey = L"DB4BBA18-48FC-4164-B572-E59757B02796";
 
@@ -122,12 +123,7 @@ TEST(ChromeKeyLut3dEffect, RebuildsOnlyTheTablesAChangeAffects) {
 
 TEST(ChromeKeyLut3dEffect, MissingForegroundIsABadArgument) {
   NLEComPtr<INLECGFilter> filter = GreenKey(0);
-  TestFrame* bg = new TestFrame(2, 2);
-  TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
-  NLEComPtr<INLEFrame> h1(bg), h2(dst);
-  filter->SetBackground(bg);
-  EXPECT_EQ(filter->Running(dst), NLE_E_INVALIDARG);
-  EXPECT_EQ(dst->pixels[0], 9);
+  ExpectRefusesMissingForeground(filter.get());
 }
 
 }  // namespace

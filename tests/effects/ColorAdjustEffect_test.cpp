@@ -11,6 +11,7 @@ namespace {
 
 namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
+using tfx_test::ExpectRefusesMissingForeground;
 using tfx_test::FillRandom;
 using tfx_test::Settings;
 constexpr const wchar_t* kColorAdjust = L"18C6E879-4138-42D0-B0B9-6B4401AA97E6";
@@ -69,12 +70,7 @@ TEST(ColorAdjustEffect, ParametersChangedAfterCreationTakeEffect) {
 
 TEST(ColorAdjustEffect, MissingForegroundIsABadArgument) {
   NLEComPtr<INLECGFilter> filter = CreateEffect(kColorAdjust, nullptr);
-  TestFrame* bg = new TestFrame(2, 2);
-  TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
-  NLEComPtr<INLEFrame> h1(bg), h2(dst);
-  filter->SetBackground(bg);
-  EXPECT_EQ(filter->Running(dst), NLE_E_INVALIDARG);
-  EXPECT_EQ(dst->pixels[0], 9);
+  ExpectRefusesMissingForeground(filter.get());
 }
 
 }  // namespace

@@ -14,6 +14,7 @@ namespace {
 
 namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
+using tfx_test::ExpectRefusesMissingForeground;
 using tfx_test::FillRandom;
 constexpr const wchar_t* kColorLut = L"74EB022D-1D73-4D1E-9F70-487C356D46CD";
 
@@ -163,12 +164,7 @@ TEST_F(ColorLut3dAdjustEffect, EmptyPathFailsWithoutWriting) {
 
 TEST_F(ColorLut3dAdjustEffect, MissingForegroundIsABadArgument) {
   NLEComPtr<INLECGFilter> filter = CreateEffect(kColorLut, PathSettings(Wide(Path("halve.cube"))));
-  TestFrame* bg = new TestFrame(2, 2);
-  TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
-  NLEComPtr<INLEFrame> h1(bg), h2(dst);
-  filter->SetBackground(bg);
-  EXPECT_EQ(filter->Running(dst), NLE_E_INVALIDARG);
-  EXPECT_EQ(dst->pixels[0], 9);
+  ExpectRefusesMissingForeground(filter.get());
 }
 
 }  // namespace

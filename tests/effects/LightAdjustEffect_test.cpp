@@ -11,6 +11,7 @@ namespace {
 
 namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
+using tfx_test::ExpectRefusesMissingForeground;
 using tfx_test::FillRandom;
 using tfx_test::Settings;
 constexpr const wchar_t* kLightAdjust = L"D8651B53-F47A-4B98-B8E9-35B491D5EADC";
@@ -65,12 +66,7 @@ TEST(LightAdjustEffect, AppliesTheFourOperationsInOrder) {
 
 TEST(LightAdjustEffect, MissingForegroundIsABadArgument) {
   NLEComPtr<INLECGFilter> filter = CreateEffect(kLightAdjust, Settings({{L"u_highLight", 50}}));
-  TestFrame* bg = new TestFrame(2, 2);
-  TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
-  NLEComPtr<INLEFrame> h1(bg), h2(dst);
-  filter->SetBackground(bg);
-  EXPECT_EQ(filter->Running(dst), NLE_E_INVALIDARG);
-  EXPECT_EQ(dst->pixels[0], 9);
+  ExpectRefusesMissingForeground(filter.get());
 }
 
 }  // namespace

@@ -39,4 +39,13 @@ void FillRandom(TestFrame* frame, unsigned salt) {
   for (auto& b : frame->pixels) b = static_cast<uint8_t>(rng());
 }
 
+void ExpectRefusesMissingForeground(INLECGFilter* filter) {
+  TestFrame* bg = new TestFrame(2, 2);
+  TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
+  NLEComPtr<INLEFrame> h1(bg), h2(dst);
+  filter->SetBackground(bg);
+  EXPECT_EQ(filter->Running(dst), NLE_E_INVALIDARG);
+  EXPECT_EQ(dst->pixels[0], 9);
+}
+
 }  // namespace tfx_test

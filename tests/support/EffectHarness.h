@@ -22,4 +22,8 @@ NLEComPtr<INLECGFilter> CreateEffect(const wchar_t* guid, INLEProperties* settin
 
 void FillRandom(TestFrame* frame, unsigned salt);
 
+// Runs `filter` with a background and no foreground: an effect that reads the foreground must
+// refuse with 0x80000003 and leave the destination unwritten.
+void ExpectRefusesMissingForeground(INLECGFilter* filter);
+
 }  // namespace tfx_test
