@@ -88,24 +88,15 @@ class WrappedImage {
   unsigned char* bits_;
 };
 
-template <class Fn>
-Status Resolve(const PluginLibrary& plugin, const char* symbol, Fn* fn) {
-  std::string why;
-  void* p = plugin.Symbol(symbol, &why);
-  if (!p) return Status::Error(std::string("the plug-in does not export ") + symbol + ": " + why);
-  *fn = reinterpret_cast<Fn>(p);
-  return Status::Ok();
-}
-
 // Calls an image-making function with the input's size and copies the new image, read pixel by
 // pixel, into `bgra` (opaque). Such images are 24-bit and tagged RGB.
 Status MakeNewImage(const PluginLibrary& plugin, const ImageFunction& fn, cv::Mat* bgra) {
   NewImageFn create = nullptr;
   GetPixelFn getPixel = nullptr;
   DeleteFn destroy = nullptr;
-  if (Status s = Resolve(plugin, fn.symbol, &create); !s.ok()) return s;
-  if (Status s = Resolve(plugin, kGetPixelSymbol, &getPixel); !s.ok()) return s;
-  if (Status s = Resolve(plugin, kDeleteSymbol, &destroy); !s.ok()) return s;
+  if (Status s = plugin.Resolve(fn.symbol, &create); !s.ok()) return s;
+  if (Status s = plugin.Resolve(kGetPixelSymbol, &getPixel); !s.ok()) return s;
+  if (Status s = plugin.Resolve(kDeleteSymbol, &destroy); !s.ok()) return s;
   CxImage* made = create(bgra->cols, bgra->rows);
   if (!made) return Status::Error(std::string(fn.function) + " made no image");
   for (int y = 0; y < bgra->rows; ++y) {
@@ -305,31 +296,31 @@ Status CallImageFunction(const PluginLibrary& plugin, const ImageCall& call, cv:
 
   WrapCtorFn ctor = nullptr;
   DtorFn dtor = nullptr;
-  if (Status s = Resolve(plugin, kWrapCtorSymbol, &ctor); !s.ok()) return s;
-  if (Status s = Resolve(plugin, kDtorSymbol, &dtor); !s.ok()) return s;
+  if (Status s = plugin.Resolve(kWrapCtorSymbol, &ctor); !s.ok()) return s;
+  if (Status s = plugin.Resolve(kDtorSymbol, &dtor); !s.ok()) return s;
   WrappedImage image(ctor, dtor, bgra);
   switch (fn.kind) {
     case FxKind::kImageFloat: {
       ImageFloatFn call1 = nullptr;
-      if (Status s = Resolve(plugin, fn.symbol, &call1); !s.ok()) return s;
+      if (Status s = plugin.Resolve(fn.symbol, &call1); !s.ok()) return s;
       call1(image.image(), f(0));
       return Status::Ok();
     }
     case FxKind::kImageLong: {
       ImageLongFn callLong = nullptr;
-      if (Status s = Resolve(plugin, fn.symbol, &callLong); !s.ok()) return s;
+      if (Status s = plugin.Resolve(fn.symbol, &callLong); !s.ok()) return s;
       callLong(image.image(), static_cast<long>(v[0]));
       return Status::Ok();
     }
     case FxKind::kImageFloat6: {
       ImageFloat6Fn call6 = nullptr;
-      if (Status s = Resolve(plugin, fn.symbol, &call6); !s.ok()) return s;
+      if (Status s = plugin.Resolve(fn.symbol, &call6); !s.ok()) return s;
       call6(image.image(), f(0), f(1), f(2), f(3), f(4), f(5));
       return Status::Ok();
     }
     case FxKind::kHslBand: {
       HslFn callHsl = nullptr;
-      if (Status s = Resolve(plugin, fn.symbol, &callHsl); !s.ok()) return s;
+      if (Status s = plugin.Resolve(fn.symbol, &callHsl); !s.ok()) return s;
       HSLBands bands{};
       bands.band[static_cast<int>(v[0])] = HSLBandValues{f(1), f(2), f(3), f(4), f(5)};
       callHsl(image.image(), bands);

@@ -310,21 +310,12 @@ Status SetStepParam(const std::string& text, BakeStep* step) {
   return Status::Ok();
 }
 
-template <class Fn>
-Status ResolveTwin(const PluginCubeLut& lut, const char* symbol, Fn* fn) {
-  std::string why;
-  void* p = lut.Symbol(symbol, &why);
-  if (!p) return Status::Error(std::string("the plug-in does not export ") + symbol + ": " + why);
-  *fn = reinterpret_cast<Fn>(p);
-  return Status::Ok();
-}
-
 // Applies one step's twins to the lattice, in its effect's order and with its effect's
 // conversions of the values.
 Status ApplyStep(const PluginCubeLut& lut, const BakeStep& step) {
   if (!step.filter->steps.front().second) {
     BalanceTwinFn balance = nullptr;
-    if (Status s = ResolveTwin(lut, kBalanceTwin, &balance); !s.ok()) return s;
+    if (Status s = lut.Resolve(kBalanceTwin, &balance); !s.ok()) return s;
     // a = temperature / 200 and b = tint / 200 in double, passed as float.
     balance(lut.get(), static_cast<float>(step.values[0] / 200.0),
             static_cast<float>(step.values[1] / 200.0));
@@ -332,7 +323,7 @@ Status ApplyStep(const PluginCubeLut& lut, const BakeStep& step) {
   }
   for (size_t i = 0; i < step.values.size(); ++i) {
     TwinFn twin = nullptr;
-    if (Status s = ResolveTwin(lut, step.filter->steps[i].second, &twin); !s.ok()) return s;
+    if (Status s = lut.Resolve(step.filter->steps[i].second, &twin); !s.ok()) return s;
     twin(lut.get(), static_cast<float>(step.values[i]));
   }
   return Status::Ok();

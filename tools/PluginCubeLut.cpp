@@ -32,15 +32,6 @@ static_assert(std::is_same_v<decltype(&CubeLut::writeLUT3D2File), bool (CubeLut:
 // Heap storage from new[] is aligned for any type up to this.
 static_assert(alignof(CubeLut) <= __STDCPP_DEFAULT_NEW_ALIGNMENT__);
 
-template <class Fn>
-Status Resolve(const PluginLibrary& plugin, const char* symbol, Fn* fn) {
-  std::string why;
-  void* p = plugin.Symbol(symbol, &why);
-  if (!p) return Status::Error(std::string("the plug-in does not export ") + symbol + ": " + why);
-  *fn = reinterpret_cast<Fn>(p);
-  return Status::Ok();
-}
-
 }  // namespace
 
 struct PluginCubeLut::Members {
@@ -59,17 +50,17 @@ Status PluginCubeLut::Create(const PluginLibrary& plugin, std::unique_ptr<Plugin
   auto m = std::make_unique<Members>();
   // Every symbol is looked up; the first one missing is reported.
   const Status found[] = {
-      Resolve(plugin, "_ZN7CubeLutC1Ev", &m->construct),
-      Resolve(plugin, "_ZN7CubeLutD1Ev", &m->destroy),
-      Resolve(plugin, "_ZN7CubeLut12loadCubeFileERSt14basic_ifstreamIcSt11char_traitsIcEE",
-              &m->loadCube),
-      Resolve(plugin, "_ZN7CubeLut11load3DlFileERSt14basic_ifstreamIcSt11char_traitsIcEE",
-              &m->load3Dl),
-      Resolve(plugin, "_ZN7CubeLut12getLut3DDataEPiS0_S0_S0_", &m->lattice),
-      Resolve(plugin, "_ZNK7CubeLut9getDomainEPfS0_", &m->domain),
-      Resolve(plugin, "_ZNK7CubeLut8getTitleEv", &m->title),
-      Resolve(plugin, "_ZN7CubeLut17generateLUT3DDataEi", &m->generate),
-      Resolve(plugin, "_ZN7CubeLut15writeLUT3D2FileEPKc", &m->write),
+      plugin.Resolve("_ZN7CubeLutC1Ev", &m->construct),
+      plugin.Resolve("_ZN7CubeLutD1Ev", &m->destroy),
+      plugin.Resolve("_ZN7CubeLut12loadCubeFileERSt14basic_ifstreamIcSt11char_traitsIcEE",
+                     &m->loadCube),
+      plugin.Resolve("_ZN7CubeLut11load3DlFileERSt14basic_ifstreamIcSt11char_traitsIcEE",
+                     &m->load3Dl),
+      plugin.Resolve("_ZN7CubeLut12getLut3DDataEPiS0_S0_S0_", &m->lattice),
+      plugin.Resolve("_ZNK7CubeLut9getDomainEPfS0_", &m->domain),
+      plugin.Resolve("_ZNK7CubeLut8getTitleEv", &m->title),
+      plugin.Resolve("_ZN7CubeLut17generateLUT3DDataEi", &m->generate),
+      plugin.Resolve("_ZN7CubeLut15writeLUT3D2FileEPKc", &m->write),
   };
   for (const Status& s : found) {
     if (!s.ok()) return s;

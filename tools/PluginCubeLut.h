@@ -42,8 +42,11 @@ class PluginCubeLut {
   // The plug-in's ".CUBE" writer.
   bool Write(const std::string& path) const;
 
-  // Addresses of the free functions the plug-in exports beside the class.
-  void* Symbol(const char* name, std::string* why) const { return plugin_.Symbol(name, why); }
+  // The free functions the plug-in exports beside the class, as typed pointers.
+  template <class Fn>
+  Status Resolve(const char* name, Fn* fn) const {
+    return plugin_.Resolve(name, fn);
+  }
 
  private:
   struct Members;

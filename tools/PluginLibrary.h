@@ -27,6 +27,15 @@ class PluginLibrary {
   const std::string& path() const { return path_; }
   // Address of an exported symbol, or null (with the loader's reason in *why when given).
   void* Symbol(const char* name, std::string* why = nullptr) const;
+  // The exported function `name` as a pointer of type Fn; the error names the missing symbol.
+  template <class Fn>
+  Status Resolve(const char* name, Fn* fn) const {
+    std::string why;
+    void* p = Symbol(name, &why);
+    if (!p) return Status::Error(std::string("the plug-in does not export ") + name + ": " + why);
+    *fn = reinterpret_cast<Fn>(p);
+    return Status::Ok();
+  }
 
   // Entry points, valid after a successful Load. FilterCount runs the plug-in's one-time merge
   // of its registries and must come before Properties and Create.
