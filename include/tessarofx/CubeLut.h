@@ -18,10 +18,12 @@
 // A failed read leaves the lattice zeroed up to the rows read before the error.
 //
 // Threading: an object is used by one thread at a time. getInstance() hands out a process-wide
-// object that every construction (clone() included) replaces, unsynchronised; code that may run
-// on several threads owns its objects and never uses the instance.
+// object that every construction (clone() included) replaces; objects may be built on several
+// threads at once, but code that may run on several threads owns its objects and never uses the
+// instance, which another thread can replace or release at any moment.
 #pragma once
 
+#include <atomic>
 #include <cstdint>
 #include <fstream>
 #include <string>
@@ -126,5 +128,7 @@ class TFX_API CubeLut {
   float domainMax_[3];
   int32_t atlasBytes_;  // what atlas_ was allocated with, which a kept atlas may not match
 
-  static CubeLut* mLut3d;
+  // Atomic so that effects building their own tables on several render threads do not race on
+  // it; the object it points at is still only safe for one thread at a time.
+  static std::atomic<CubeLut*> mLut3d;
 };

@@ -9,7 +9,7 @@
 
 #include "lut/CubeLutApply.h"
 
-CubeLut* CubeLut::mLut3d = nullptr;
+std::atomic<CubeLut*> CubeLut::mLut3d{nullptr};
 
 CubeLut::CubeLut()
     : status_(1),
@@ -22,23 +22,23 @@ CubeLut::CubeLut()
       domainMax_{1.0f, 1.0f, 1.0f},
       atlasBytes_(0) {
   // The tables and the lattice start out unwritten; size 0 keeps doLUT away from them.
-  mLut3d = this;
+  mLut3d.store(this);
 }
 
 CubeLut::~CubeLut() {
   delete[] rowTable_;
   delete[] atlas_;
   // A host that destroys the registered object itself must not find it through getInstance.
-  if (mLut3d == this) mLut3d = nullptr;
+  CubeLut* self = this;
+  mLut3d.compare_exchange_strong(self, nullptr);
 }
 
-CubeLut* CubeLut::getInstance() { return mLut3d ? mLut3d : new CubeLut(); }
-
-void CubeLut::releaseInstance() {
-  if (!mLut3d) return;
-  delete mLut3d;  // the destructor clears mLut3d
-  mLut3d = nullptr;
+CubeLut* CubeLut::getInstance() {
+  CubeLut* instance = mLut3d.load();
+  return instance ? instance : new CubeLut();
 }
+
+void CubeLut::releaseInstance() { delete mLut3d.exchange(nullptr); }
 
 const char* CubeLut::getTitle() const { return title_.c_str(); }
 
