@@ -38,8 +38,8 @@ int Min3(int a, int b, int c) { return std::min(std::min(a, b), c); }
 
 // Byte offsets of red and blue within a packed 4-byte pixel; green is byte 1, alpha byte 3.
 struct Packing {
-  int red;
-  int blue;
+  int red = 2;
+  int blue = 0;
 };
 
 bool PackedPixels(const CxImage& image, Packing* packing) {
