@@ -14,15 +14,9 @@ namespace {
 namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
 using tfx_test::ExpectRefusesMissingForeground;
+using tfx_test::SetParam;
 using tfx_test::Settings;
 constexpr const wchar_t* kChromeKey = L"DB4BBA18-48FC-4164-B572-E59757B02796";
-
-void SetParam(INLECGFilter* filter, const wchar_t* name, double value) {
-  NLEComPtr<INLEProperties> param;
-  ASSERT_EQ(filter->GetParamPropertyFromName(name, &param), NLE_S_OK);
-  param->SetValue(Key::Property::kValue_Current, CNLEValue(value));
-  filter->ParamValueChanged();
-}
 
 // B, G, R, A: the screen, skin, a grey, a warm colour with green spill (half the screen's
 // chroma), a grey as bright as the screen with a quarter of its chroma.

@@ -14,15 +14,9 @@ namespace {
 namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
 using tfx_test::FillRandom;
+using tfx_test::SetParam;
 using tfx_test::Settings;
 constexpr const wchar_t* kWhiteBalance = L"39509FB9-39FB-4516-9464-3D891DD61D62";
-
-void Set(INLECGFilter* filter, const wchar_t* name, double value) {
-  NLEComPtr<INLEProperties> p;
-  ASSERT_EQ(filter->GetParamPropertyFromName(name, &p), NLE_S_OK);
-  p->SetValue(Key::Property::kValue_Current, CNLEValue(value));
-  filter->ParamValueChanged();
-}
 
 // The balance per byte, from the formulas: factor in double, then float; product in float,
 // truncated and limited.
@@ -54,8 +48,8 @@ TEST(WhiteBalanceAdjustEffect, EveryColourMatchesTheFactors) {
   const double settings[][2] = {{100, 0}, {-100, 37}, {0, -100}, {-33.3, 71.1}, {-900, 650}};
   for (const auto& s : settings) {
     SCOPED_TRACE(testing::Message() << "temperature " << s[0] << " tint " << s[1]);
-    Set(filter.get(), L"u_temperature", s[0]);
-    Set(filter.get(), L"u_tint", s[1]);
+    SetParam(filter.get(), L"u_temperature", s[0]);
+    SetParam(filter.get(), L"u_tint", s[1]);
     ASSERT_EQ(filter->Running(dst), NLE_S_OK);
     const float a = static_cast<float>(s[0] / 200.0), b = static_cast<float>(s[1] / 200.0);
     uint8_t table[3][256];
@@ -96,7 +90,7 @@ TEST(WhiteBalanceAdjustEffect, ZeroCopiesAndTheRangeEndsDoubleAndRemoveChannels)
   });
 
   // 200 is beyond the registered range: a = 1 doubles red and removes blue.
-  Set(filter.get(), L"u_temperature", 200);
+  SetParam(filter.get(), L"u_temperature", 200);
   run([](const uint8_t* in, const uint8_t* out) {
     ASSERT_EQ(out[0], 0);
     ASSERT_EQ(out[1], in[1]);
@@ -105,8 +99,8 @@ TEST(WhiteBalanceAdjustEffect, ZeroCopiesAndTheRangeEndsDoubleAndRemoveChannels)
   });
 
   // b = 1 removes green and multiplies red and blue by 1.5.
-  Set(filter.get(), L"u_temperature", 0);
-  Set(filter.get(), L"u_tint", 200);
+  SetParam(filter.get(), L"u_temperature", 0);
+  SetParam(filter.get(), L"u_tint", 200);
   run([](const uint8_t* in, const uint8_t* out) {
     ASSERT_EQ(out[0], std::min(255, in[0] * 3 / 2));
     ASSERT_EQ(out[1], 0);
@@ -114,13 +108,13 @@ TEST(WhiteBalanceAdjustEffect, ZeroCopiesAndTheRangeEndsDoubleAndRemoveChannels)
   });
 
   // The gains are carried but never applied.
-  Set(filter.get(), L"u_tint", -40);
-  Set(filter.get(), L"u_temperature", 25);
+  SetParam(filter.get(), L"u_tint", -40);
+  SetParam(filter.get(), L"u_temperature", 25);
   ASSERT_EQ(filter->Running(dst), NLE_S_OK);
   const std::vector<uint8_t> plain = dst->pixels;
-  Set(filter.get(), L"u_rgain", -50);
-  Set(filter.get(), L"u_ggain", 0);
-  Set(filter.get(), L"u_bgain", 99);
+  SetParam(filter.get(), L"u_rgain", -50);
+  SetParam(filter.get(), L"u_ggain", 0);
+  SetParam(filter.get(), L"u_bgain", 99);
   ASSERT_EQ(filter->Running(dst), NLE_S_OK);
   EXPECT_EQ(dst->pixels, plain);
 }

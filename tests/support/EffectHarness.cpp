@@ -39,6 +39,13 @@ void FillRandom(TestFrame* frame, unsigned salt) {
   for (auto& b : frame->pixels) b = static_cast<uint8_t>(rng());
 }
 
+void SetParam(INLECGFilter* filter, const wchar_t* name, double value) {
+  NLEComPtr<INLEProperties> param;
+  ASSERT_EQ(filter->GetParamPropertyFromName(name, &param), NLE_S_OK);
+  param->SetValue(Key::Property::kValue_Current, CNLEValue(value));
+  filter->ParamValueChanged();
+}
+
 void ExpectRefusesMissingForeground(INLECGFilter* filter) {
   TestFrame* bg = new TestFrame(2, 2);
   TestFrame* dst = new TestFrame(2, 2, 0, false, 9);

@@ -22,6 +22,10 @@ NLEComPtr<INLECGFilter> CreateEffect(const wchar_t* guid, INLEProperties* settin
 
 void FillRandom(TestFrame* frame, unsigned salt);
 
+// Changes one parameter of a live filter as a host's UI does: its current value, then
+// ParamValueChanged.
+void SetParam(INLECGFilter* filter, const wchar_t* name, double value);
+
 // Runs `filter` with a background and no foreground: an effect that reads the foreground must
 // refuse with 0x80000003 and leave the destination unwritten.
 void ExpectRefusesMissingForeground(INLECGFilter* filter);
