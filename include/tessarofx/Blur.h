@@ -24,8 +24,8 @@ extern TFX_API const uint8_t stackblur_shr[256];
 // the fourth byte is alpha: it is kept, and colour is clamped to it (premultiplied data stays
 // premultiplied). With 3 channels colour is clamped to 255; with any other channel count the
 // clamp limit is 0, so the first three bytes of every pixel become 0. Radius 0..255.
-TFX_API void stackblur(unsigned char* pixels, unsigned int width, unsigned int height,
-                       int channels, unsigned int radius, int pass);
+TFX_API void stackblur(unsigned char* pixels, unsigned int width, unsigned int height, int channels,
+                       unsigned int radius, int pass);
 
 // Both Stack Blur passes, rows then columns. Radius 1..254; anything else does nothing.
 TFX_API void gaussianBlur(unsigned char* pixels, int width, int height, int channels, int radius);

@@ -37,9 +37,8 @@ TFX_API int makeImageFrame(unsigned char** out, int* outWidth, int* outHeight,
 // A (w + 2 border) x (h + 2 border) canvas of the colour whose alpha is the source's alpha
 // scaled over the whole canvas, and 0 outside the inner area. Bytes 0, 1, 2 are blue, green,
 // red here (the reverse of makeImageFrame's order). Returns 1, or 0 on failure.
-TFX_API int scaleImage(unsigned char** out, int* outWidth, int* outHeight,
-                       const unsigned char* src, int width, int height, int bpp,
-                       PIPNLERGB color, int border);
+TFX_API int scaleImage(unsigned char** out, int* outWidth, int* outHeight, const unsigned char* src,
+                       int width, int height, int bpp, PIPNLERGB color, int border);
 
 // Source-over blend of a copyWidth x copyHeight block of `src` from (srcX, srcY) onto `dst` at
 // (dstX, dstY) (negative positions clip), both images stored bottom-up, each alpha first scaled
@@ -60,5 +59,5 @@ TFX_API bool clipOutBorder(const unsigned char* src, unsigned char* dst, int src
 // result with a (2 radius + 1)^2 window that fades towards transparent black at the outer edge.
 // The output is (w + 2 radius) x (h + 2 radius); radius 0 gives a copy. Returns 1, or 0 on
 // failure.
-TFX_API int blurImage(unsigned char** out, int* outWidth, int* outHeight,
-                      const unsigned char* src, int width, int height, int bpp, int radius);
+TFX_API int blurImage(unsigned char** out, int* outWidth, int* outHeight, const unsigned char* src,
+                      int width, int height, int bpp, int radius);

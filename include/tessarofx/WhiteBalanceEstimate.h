@@ -11,8 +11,7 @@
 
 // The mean of byte `channel` (0, 1 or 2; 3 sums nothing and gives 0) over all pixels, as the low
 // byte of the truncated 64-bit mean. 255 for a null image, a channel above 3, or a size below 1.
-TFX_API unsigned char channelMean(const unsigned char* pixels, int width, int height,
-                                  int channel);
+TFX_API unsigned char channelMean(const unsigned char* pixels, int width, int height, int channel);
 
 // A placeholder that performs no balancing: it copies the first row of `width` pixels into
 // `dst` and returns `dst`. A null pointer or a size of 0 returns `src`.
