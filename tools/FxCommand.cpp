@@ -1,4 +1,5 @@
 #include <cstdio>
+#include <string>
 
 #include "Commands.h"
 #include "FilterTable.h"
@@ -9,10 +10,20 @@
 namespace tfxtool {
 namespace {
 
+// The image files a function takes after its arguments.
+std::string FileWords(const ImageFunction& fn) {
+  std::string words = "INPUT";
+  if (fn.inputs > 1) words += std::string(" ") + (fn.secondName ? fn.secondName : "SECOND");
+  if (fn.writes) words += " OUTPUT";
+  return words;
+}
+
 void PrintFunctions() {
-  std::printf("Image functions (fx NAME ARG... INPUT OUTPUT):\n");
+  std::printf("Image functions (fx NAME ARG... INPUT OUTPUT, unless shown otherwise):\n");
   for (const ImageFunction& fn : ImageFunctions()) {
     std::printf("  %-18s %-22s %s\n      %s\n", fn.name, fn.function, fn.symbol, fn.meaning);
+    if (fn.inputs != 1 || !fn.writes) std::printf("      files: %s\n", FileWords(fn).c_str());
+    for (const char* symbol : fn.also) std::printf("      also calls %s\n", symbol);
     for (const FxArg& arg : fn.args) {
       std::printf("      %-12s %s..%s\n", arg.name, FormatNumber(arg.min).c_str(),
                   FormatNumber(arg.max).c_str());
@@ -50,22 +61,30 @@ Status FxCommand(const GlobalOptions& options, const Args& args) {
       names += (names.empty() ? "" : ", ") + std::string(f.name);
     return Status::Error("unknown function '" + positional[0] + "' (known: " + names + ")");
   }
-  if (positional.size() < 3) {
-    return Status::Error("fx needs INPUT and OUTPUT (see tessarofx --help)");
+  const size_t files = static_cast<size_t>(fn->inputs) + (fn->writes ? 1 : 0);
+  if (positional.size() < 1 + files) {
+    return Status::Error(std::string("fx ") + fn->name + " needs " + FileWords(*fn) +
+                         " (see tessarofx fx --list)");
   }
-  const Args fnArgs(positional.begin() + 1, positional.end() - 2);
-  const std::string& input = positional[positional.size() - 2];
-  const std::string& output = positional.back();
+  const Args fnArgs(positional.begin() + 1, positional.end() - static_cast<long>(files));
+  const Args paths(positional.end() - static_cast<long>(files), positional.end());
   ImageCall call;
   if (Status s = PrepareImageCall(*fn, fnArgs, &call); !s.ok()) return s;
-  if (Status s = CheckWritableFormat(output); !s.ok()) return s;
+  if (fn->writes) {
+    if (Status s = CheckWritableFormat(paths.back()); !s.ok()) return s;
+  }
 
   PluginLibrary plugin;
   if (Status s = plugin.Load(options.pluginPath); !s.ok()) return s;
-  cv::Mat image;
-  if (Status s = ReadImage(input, &image); !s.ok()) return s;
-  if (Status s = CallImageFunction(plugin, call, &image); !s.ok()) return s;
-  return WriteImage(output, image);
+  cv::Mat image, second;
+  if (Status s = ReadImage(paths[0], &image); !s.ok()) return s;
+  if (fn->inputs > 1) {
+    if (Status s = ReadImage(paths[1], &second); !s.ok()) return s;
+  }
+  std::string report;
+  if (Status s = CallImageFunction(plugin, call, &image, &second, &report); !s.ok()) return s;
+  std::fputs(report.c_str(), stdout);
+  return fn->writes ? WriteImage(paths.back(), image) : Status::Ok();
 }
 
 }  // namespace tfxtool

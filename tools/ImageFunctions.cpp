@@ -5,6 +5,7 @@
 #include <type_traits>
 
 #include "FilterTable.h"
+#include "FxSupport.h"
 #include "Text.h"
 #include "tessarofx/ColorAdjust.h"
 #include "tessarofx/CxImage.h"
@@ -89,19 +90,20 @@ class WrappedImage {
 };
 
 // Calls an image-making function with the input's size and copies the new image, read pixel by
-// pixel, into `bgra` (opaque). Such images are 24-bit and tagged RGB.
-Status MakeNewImage(const PluginLibrary& plugin, const ImageFunction& fn, cv::Mat* bgra) {
+// pixel, into the image (opaque). Such images are 24-bit and tagged RGB.
+Status RunNewImage(const FxContext& fx) {
   NewImageFn create = nullptr;
   GetPixelFn getPixel = nullptr;
   DeleteFn destroy = nullptr;
-  if (Status s = plugin.Resolve(fn.symbol, &create); !s.ok()) return s;
-  if (Status s = plugin.Resolve(kGetPixelSymbol, &getPixel); !s.ok()) return s;
-  if (Status s = plugin.Resolve(kDeleteSymbol, &destroy); !s.ok()) return s;
-  CxImage* made = create(bgra->cols, bgra->rows);
-  if (!made) return Status::Error(std::string(fn.function) + " made no image");
-  for (int y = 0; y < bgra->rows; ++y) {
-    uint8_t* row = bgra->ptr<uint8_t>(y);
-    for (int x = 0; x < bgra->cols; ++x) {
+  if (Status s = fx.plugin.Resolve(fx.function.symbol, &create); !s.ok()) return s;
+  if (Status s = fx.plugin.Resolve(kGetPixelSymbol, &getPixel); !s.ok()) return s;
+  if (Status s = fx.plugin.Resolve(kDeleteSymbol, &destroy); !s.ok()) return s;
+  cv::Mat& bgra = *fx.image;
+  CxImage* made = create(bgra.cols, bgra.rows);
+  if (!made) return Status::Error(std::string(fx.function.function) + " made no image");
+  for (int y = 0; y < bgra.rows; ++y) {
+    uint8_t* row = bgra.ptr<uint8_t>(y);
+    for (int x = 0; x < bgra.cols; ++x) {
       const tagRGBQUAD c =
           getPixel(made, static_cast<unsigned long>(x), static_cast<unsigned long>(y), false);
       // Made images store blue, green, red under an RGB tag, so the reader's red is blue.
@@ -115,131 +117,181 @@ Status MakeNewImage(const PluginLibrary& plugin, const ImageFunction& fn, cv::Ma
   return Status::Ok();
 }
 
+// Resolves the function as type Fn and calls `call` with it on the wrapped image.
+template <class Fn, class Call>
+Status OnImage(const FxContext& fx, Call call) {
+  Fn fn = nullptr;
+  if (Status s = fx.plugin.Resolve(fx.function.symbol, &fn); !s.ok()) return s;
+  return WithPluginImage(fx.plugin, fx.image, [&](CxImage* image) { call(fn, image); });
+}
+
+Status RunImageLong(const FxContext& fx) {
+  return OnImage<ImageLongFn>(
+      fx, [&](ImageLongFn fn, CxImage* image) { fn(image, static_cast<long>(fx.values[0])); });
+}
+
+Status RunImageFloat6(const FxContext& fx) {
+  return OnImage<ImageFloat6Fn>(fx, [&](ImageFloat6Fn fn, CxImage* image) {
+    fn(image, ArgF(fx, 0), ArgF(fx, 1), ArgF(fx, 2), ArgF(fx, 3), ArgF(fx, 4), ArgF(fx, 5));
+  });
+}
+
+Status RunHslBand(const FxContext& fx) {
+  return OnImage<HslFn>(fx, [&](HslFn fn, CxImage* image) {
+    HSLBands bands{};
+    bands.band[ArgI(fx, 0)] =
+        HSLBandValues{ArgF(fx, 1), ArgF(fx, 2), ArgF(fx, 3), ArgF(fx, 4), ArgF(fx, 5)};
+    fn(image, bands);
+  });
+}
+
 }  // namespace
+
+Status WithPluginImage(const PluginLibrary& plugin, cv::Mat* bgra,
+                       const std::function<void(CxImage*)>& use) {
+  WrapCtorFn ctor = nullptr;
+  DtorFn dtor = nullptr;
+  if (Status s = plugin.Resolve(kWrapCtorSymbol, &ctor); !s.ok()) return s;
+  if (Status s = plugin.Resolve(kDtorSymbol, &dtor); !s.ok()) return s;
+  WrappedImage image(ctor, dtor, bgra);
+  use(image.image());
+  return Status::Ok();
+}
+
+Status RunImageFloat(const FxContext& fx) {
+  return OnImage<ImageFloatFn>(fx,
+                               [&](ImageFloatFn fn, CxImage* image) { fn(image, ArgF(fx, 0)); });
+}
 
 const std::vector<ImageFunction>& ImageFunctions() {
   // Ranges: where each function's arithmetic is defined. Brightness divides by b/253 + 0.99,
   // which reaches zero near -250.5; contrast divides by 1 - c/255.
-  static const std::vector<ImageFunction> kFunctions = {
-      {"exposure",
-       "exposureAdjustment",
-       "_Z18exposureAdjustmentP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -1000, 1000}},
-       "gain 2^(v*0.012): +50 = x1.52"},
-      {"brightness",
-       "brightnessAdjustment",
-       "_Z20brightnessAdjustmentP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -250, 1000}},
-       "above 0 scales by 1+v/100, below 0 subtracts"},
-      {"contrast",
-       "contrastAdjustment",
-       "_Z18contrastAdjustmentP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -1000, 254}},
-       "above 0 stretches away from mid grey, below 0 flattens"},
-      {"vibrance",
-       "vibranceAdjustment",
-       "_Z18vibranceAdjustmentP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -1000, 1000}},
-       "saturates muted colours more than vivid ones"},
-      {"saturation",
-       "saturationAdjustment",
-       "_Z20saturationAdjustmentP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -1000, 1000}},
-       "-100 gives grey, above 0 strengthens colour"},
-      {"highlight",
-       "hdrHighlight",
-       "_Z12hdrHighlightP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -100, 100}},
-       "brightens (or darkens) pixels by their brightest channel"},
-      {"shadow",
-       "hdrShadow",
-       "_Z9hdrShadowP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -100, 100}},
-       "lifts (or deepens) dark pixels; the lift is 4x the cut"},
-      {"white-level",
-       "hdrWhiteLevel",
-       "_Z13hdrWhiteLevelP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -100, 100}},
-       "moves the white point: above 0 the curve is applied twice"},
-      {"black-level",
-       "hdrBlackLevel",
-       "_Z13hdrBlackLevelP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -100, 100}},
-       "moves the black point, weighted towards dark pixels"},
-      {"auto-white",
-       "whiteBalanceAdjustment",
-       "_Z22whiteBalanceAdjustmentP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -500, 500}},
-       "scales channels so the brightest v/500 of the pixels average to white"},
-      {"temperature",
-       "temperatureAdjustment",
-       "_Z21temperatureAdjustmentP7CxImagel",
-       FxKind::kImageLong,
-       {{"VALUE", 0, 30000}},
-       "tints towards a black-body colour; 11500 is neutral, the mapping jumps there"},
-      {"tint",
-       "tintAdjustment",
-       "_Z14tintAdjustmentP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -100, 100}},
-       "above 0 towards magenta, below 0 towards green"},
-      {"temperature-colors",
-       "createTemperateColor",
-       "_Z20createTemperateColorii",
-       FxKind::kNewImage,
-       {},
-       "a black-body gradient of the input's size, 30000 K down by 100 K a column"},
-      {"vignette",
-       "vignetteAdjustFilter",
-       "_Z20vignetteAdjustFilterP7CxImageffffff",
-       FxKind::kImageFloat6,
-       {{"AMOUNT", -100, 100},
-        {"FEATHER", 0, 100},
-        {"HIGHLIGHTS", 0, 100},
-        {"SIZE", 0, 100},
-        {"ROUNDNESS", -100, 100},
-        {"EXPOSURE", -100, 100}},
-       "darkens or lightens outside a centred ellipse (arguments in the function's order)"},
-      {"distort",
-       "distortFilter",
-       "_Z13distortFilterP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -100, 100}},
-       "above 0 barrel, below 0 pincushion"},
-      {"fringing",
-       "fringingFilter",
-       "_Z14fringingFilterP7CxImagef",
-       FxKind::kImageFloat,
-       {{"VALUE", -100, 100}},
-       "red and blue drift apart towards the edges"},
-      {"hue",
-       "hueAdjustment",
-       "_Z13hueAdjustmentP7CxImagef",
-       FxKind::kImageFloat,
-       {{"DEGREES", -360, 360}},
-       "rotates hue about the grey axis"},
-      {"hsl",
-       "hslAdjustment",
-       "_Z13hslAdjustmentP7CxImageRK8HSLBands",
-       FxKind::kHslBand,
-       {{"BAND", 0, 7},
-        {"HUE", -100, 100},
-        {"SAT", -100, 100},
-        {"LIGHT", -100, 100},
-        {"WIDTH", -100, 100},
-        {"SOFT", -100, 100}},
-       "one colour band (0 red, 1 orange, 2 yellow, 3 green, 4 aqua, 5 blue, 6 purple, 7 magenta)"},
-  };
+  static const std::vector<ImageFunction> kFunctions = [] {
+    std::vector<ImageFunction> all = {
+        {"exposure",
+         "exposureAdjustment",
+         "_Z18exposureAdjustmentP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -1000, 1000}},
+         "gain 2^(v*0.012): +50 = x1.52"},
+        {"brightness",
+         "brightnessAdjustment",
+         "_Z20brightnessAdjustmentP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -250, 1000}},
+         "above 0 scales by 1+v/100, below 0 subtracts"},
+        {"contrast",
+         "contrastAdjustment",
+         "_Z18contrastAdjustmentP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -1000, 254}},
+         "above 0 stretches away from mid grey, below 0 flattens"},
+        {"vibrance",
+         "vibranceAdjustment",
+         "_Z18vibranceAdjustmentP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -1000, 1000}},
+         "saturates muted colours more than vivid ones"},
+        {"saturation",
+         "saturationAdjustment",
+         "_Z20saturationAdjustmentP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -1000, 1000}},
+         "-100 gives grey, above 0 strengthens colour"},
+        {"highlight",
+         "hdrHighlight",
+         "_Z12hdrHighlightP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -100, 100}},
+         "brightens (or darkens) pixels by their brightest channel"},
+        {"shadow",
+         "hdrShadow",
+         "_Z9hdrShadowP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -100, 100}},
+         "lifts (or deepens) dark pixels; the lift is 4x the cut"},
+        {"white-level",
+         "hdrWhiteLevel",
+         "_Z13hdrWhiteLevelP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -100, 100}},
+         "moves the white point: above 0 the curve is applied twice"},
+        {"black-level",
+         "hdrBlackLevel",
+         "_Z13hdrBlackLevelP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -100, 100}},
+         "moves the black point, weighted towards dark pixels"},
+        {"auto-white",
+         "whiteBalanceAdjustment",
+         "_Z22whiteBalanceAdjustmentP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -500, 500}},
+         "scales channels so the brightest v/500 of the pixels average to white"},
+        {"temperature",
+         "temperatureAdjustment",
+         "_Z21temperatureAdjustmentP7CxImagel",
+         RunImageLong,
+         {{"VALUE", 0, 30000}},
+         "tints towards a black-body colour; 11500 is neutral, the mapping jumps there"},
+        {"tint",
+         "tintAdjustment",
+         "_Z14tintAdjustmentP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -100, 100}},
+         "above 0 towards magenta, below 0 towards green"},
+        {"temperature-colors",
+         "createTemperateColor",
+         "_Z20createTemperateColorii",
+         RunNewImage,
+         {},
+         "a black-body gradient of the input's size, 30000 K down by 100 K a column"},
+        {"vignette",
+         "vignetteAdjustFilter",
+         "_Z20vignetteAdjustFilterP7CxImageffffff",
+         RunImageFloat6,
+         {{"AMOUNT", -100, 100},
+          {"FEATHER", 0, 100},
+          {"HIGHLIGHTS", 0, 100},
+          {"SIZE", 0, 100},
+          {"ROUNDNESS", -100, 100},
+          {"EXPOSURE", -100, 100}},
+         "darkens or lightens outside a centred ellipse (arguments in the function's order)"},
+        {"distort",
+         "distortFilter",
+         "_Z13distortFilterP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -100, 100}},
+         "above 0 barrel, below 0 pincushion"},
+        {"fringing",
+         "fringingFilter",
+         "_Z14fringingFilterP7CxImagef",
+         RunImageFloat,
+         {{"VALUE", -100, 100}},
+         "red and blue drift apart towards the edges"},
+        {"hue",
+         "hueAdjustment",
+         "_Z13hueAdjustmentP7CxImagef",
+         RunImageFloat,
+         {{"DEGREES", -360, 360}},
+         "rotates hue about the grey axis"},
+        {"hsl",
+         "hslAdjustment",
+         "_Z13hslAdjustmentP7CxImageRK8HSLBands",
+         RunHslBand,
+         {{"BAND", 0, 7},
+          {"HUE", -100, 100},
+          {"SAT", -100, 100},
+          {"LIGHT", -100, 100},
+          {"WIDTH", -100, 100},
+          {"SOFT", -100, 100}},
+         "one colour band (0 red, 1 orange, 2 yellow, 3 green, 4 aqua, 5 blue, 6 purple, 7 "
+         "magenta)"},
+    };
+    const std::vector<ImageFunction>& enhance = EnhanceFunctions();
+    all.insert(all.end(), enhance.begin(), enhance.end());
+    return all;
+  }();
   return kFunctions;
 }
 
@@ -288,48 +340,15 @@ Status PrepareImageCall(const ImageFunction& fn, const std::vector<std::string>&
   return Status::Ok();
 }
 
-Status CallImageFunction(const PluginLibrary& plugin, const ImageCall& call, cv::Mat* bgra) {
+Status CallImageFunction(const PluginLibrary& plugin, const ImageCall& call, cv::Mat* bgra,
+                         const cv::Mat* second, std::string* report) {
   const ImageFunction& fn = *call.function;
-  const std::vector<double>& v = call.values;
-  const auto f = [&](size_t i) { return static_cast<float>(v[i]); };
-  if (fn.kind == FxKind::kNewImage) return MakeNewImage(plugin, fn, bgra);
-
-  WrapCtorFn ctor = nullptr;
-  DtorFn dtor = nullptr;
-  if (Status s = plugin.Resolve(kWrapCtorSymbol, &ctor); !s.ok()) return s;
-  if (Status s = plugin.Resolve(kDtorSymbol, &dtor); !s.ok()) return s;
-  WrappedImage image(ctor, dtor, bgra);
-  switch (fn.kind) {
-    case FxKind::kImageFloat: {
-      ImageFloatFn call1 = nullptr;
-      if (Status s = plugin.Resolve(fn.symbol, &call1); !s.ok()) return s;
-      call1(image.image(), f(0));
-      return Status::Ok();
-    }
-    case FxKind::kImageLong: {
-      ImageLongFn callLong = nullptr;
-      if (Status s = plugin.Resolve(fn.symbol, &callLong); !s.ok()) return s;
-      callLong(image.image(), static_cast<long>(v[0]));
-      return Status::Ok();
-    }
-    case FxKind::kImageFloat6: {
-      ImageFloat6Fn call6 = nullptr;
-      if (Status s = plugin.Resolve(fn.symbol, &call6); !s.ok()) return s;
-      call6(image.image(), f(0), f(1), f(2), f(3), f(4), f(5));
-      return Status::Ok();
-    }
-    case FxKind::kHslBand: {
-      HslFn callHsl = nullptr;
-      if (Status s = plugin.Resolve(fn.symbol, &callHsl); !s.ok()) return s;
-      HSLBands bands{};
-      bands.band[static_cast<int>(v[0])] = HSLBandValues{f(1), f(2), f(3), f(4), f(5)};
-      callHsl(image.image(), bands);
-      return Status::Ok();
-    }
-    case FxKind::kNewImage:
-      break;
+  if (fn.inputs > 1 && (!second || second->empty())) {
+    return Status::Error(std::string(fn.name) + " needs a second image");
   }
-  return Status::Error(std::string("unsupported function kind for ") + fn.name);
+  std::string ignored;
+  const FxContext fx{plugin, fn, call.values, bgra, second, report ? report : &ignored};
+  return fn.run(fx);
 }
 
 }  // namespace tfxtool

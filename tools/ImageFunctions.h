@@ -12,15 +12,6 @@
 
 namespace tfxtool {
 
-// How a function is called; each kind has one pointer type in ImageFunctions.cpp.
-enum class FxKind {
-  kImageFloat,   // CxImage* f(CxImage*, float), in place
-  kImageLong,    // CxImage* f(CxImage*, long), in place
-  kImageFloat6,  // CxImage* f(CxImage*, float, float, float, float, float, float), in place
-  kNewImage,     // CxImage* f(int width, int height): a new image of the input's size
-  kHslBand,      // CxImage* f(CxImage*, const HSLBands&), one band set from five arguments
-};
-
 // One numeric argument: its name in the usage text and the range where the function's
 // arithmetic is defined.
 struct FxArg {
@@ -29,15 +20,37 @@ struct FxArg {
   double max;
 };
 
+struct ImageFunction;
+
+// What one call works on. `image` is the input, packed 8-bit BGRA, and receives the result
+// (possibly of another size); `second` is the second input of functions that take two images.
+// Functions that measure rather than change an image write lines of text to `report`.
+struct FxContext {
+  const PluginLibrary& plugin;
+  const ImageFunction& function;
+  const std::vector<double>& values;  // one per argument, checked against its range
+  cv::Mat* image;
+  const cv::Mat* second;
+  std::string* report;
+};
+
+// Calls the function the way its signature asks.
+using FxRunner = Status (*)(const FxContext& fx);
+
 struct ImageFunction {
   const char* name;      // what the user types
   const char* function;  // the exported function, also accepted on the command line
   const char* symbol;    // its mangled name in the plug-in
-  FxKind kind;
+  FxRunner run;
   std::vector<FxArg> args;  // in call order
   const char* meaning;
+  int inputs = 1;                    // images read: INPUT, or INPUT and a second image
+  bool writes = true;                // false: prints a measurement instead of writing OUTPUT
+  std::vector<const char*> also{};   // further exported functions it calls, mangled
+  const char* secondName = nullptr;  // what the second image is, for the usage text
 };
 
+// Every function, colour adjustments first, then the enhancement library.
 const std::vector<ImageFunction>& ImageFunctions();
 const ImageFunction* FindImageFunction(const std::string& name);
 
@@ -58,7 +71,9 @@ struct ImageCall {
 Status PrepareImageCall(const ImageFunction& fn, const std::vector<std::string>& args,
                         ImageCall* call);
 
-// Applies the call in place to a BGRA image.
-Status CallImageFunction(const PluginLibrary& plugin, const ImageCall& call, cv::Mat* bgra);
+// Runs the call on a BGRA image (and the second image where the function takes one). A
+// measuring function leaves the image alone and returns its text in *report.
+Status CallImageFunction(const PluginLibrary& plugin, const ImageCall& call, cv::Mat* bgra,
+                         const cv::Mat* second = nullptr, std::string* report = nullptr);
 
 }  // namespace tfxtool

@@ -27,8 +27,10 @@ Commands:
       including registered names the list does not show (ColorLut3dAdjust,
       ChromeKeyLut3d). INPUT is the foreground frame; the background is FILE (same size)
       or INPUT itself.
-  fx FUNCTION [ARG]... INPUT OUTPUT
-      Calls one of the plug-in's exported image functions on INPUT.
+  fx FUNCTION [ARG]... INPUT [SECOND] [OUTPUT]
+      Calls one of the plug-in's exported image functions on INPUT. Most write
+      OUTPUT; merge and wb-rates read a SECOND image; white-point and wb-rates print
+      measurements instead of writing.
   fx --list
       Those functions, their arguments and the symbols they are found by.
   lut info FILE
