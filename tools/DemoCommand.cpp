@@ -9,6 +9,7 @@
 #include "DemoScene.h"
 #include "FilterHost.h"
 #include "ImageFiles.h"
+#include "ImageFunctions.h"
 #include "Text.h"
 #include "tessarofx/NLEComBase.h"
 
@@ -71,6 +72,39 @@ std::vector<DemoStep> DemoSteps(const std::string& lutPath) {
       {"ChromeKeyLut3d", KeyerParams(key, 1), "", "", "ChromeKeyLut3d-beauty"},
       {"ChromeKeyCombine", {}, "ChromeKeyLut3d-beauty", "ChromeKeyLut3d-alpha"},
       {"lutAToWhiteEffect", {}, "ChromeKeyCombine", ""},
+  };
+}
+
+// One call of an exported image function; `second` names an earlier result (or "input", the
+// step's own input) for functions that take two images.
+struct FxStage {
+  std::string function;
+  std::vector<std::string> args;
+  std::string second = "";
+};
+
+// A picture made by image functions rather than a filter, from the scene or an earlier result.
+struct DemoFxStep {
+  std::string label;
+  std::string input;  // empty: the scene
+  std::vector<FxStage> stages;
+  std::string caption;
+};
+
+std::vector<DemoFxStep> DemoFxSteps() {
+  return {
+      {"grain", "", {{"grain", {"30", "100"}}}, "addNoiseFilter 30% x 100%"},
+      {"denoise", "grain", {{"denoise", {"250"}}}, "deNoiseRGB 250 on the grain"},
+      {"haze", "", {{"dehaze", {"-40"}}}, "dehaze -40 (adds haze)"},
+      {"dehaze", "haze", {{"dehaze", {"60"}}}, "dehaze 60 on the haze"},
+      {"clarity", "", {{"clarity", {"60"}}}, "clarity 60"},
+      {"diffuse", "", {{"diffuse", {"240"}}}, "diffuse 240"},
+      // The keyed figure with a gold outline: the outline on a canvas 2 x 8 pixels larger, then
+      // the cut-out merged back over it.
+      {"cutout-frame",
+       "ChromeKeyCombine",
+       {{"frame", {"255", "190", "40", "255", "8"}}, {"merge", {"8", "8", "100", "100"}, "input"}},
+       "makeImageFrame 8 px + mergeImage"},
   };
 }
 
@@ -168,11 +202,47 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
     tiles.push_back({step.Label(), Caption(step), result});
   }
 
+  for (const DemoFxStep& step : DemoFxSteps()) {
+    cv::Mat input = scene;
+    if (!step.input.empty()) {
+      auto it = results.find(step.input);
+      if (it == results.end()) {
+        std::printf("skipped %s: it needs the result of %s\n", step.label.c_str(),
+                    step.input.c_str());
+        continue;
+      }
+      input = it->second;
+    }
+    cv::Mat image = input.clone();
+    Status s = Status::Ok();
+    for (const FxStage& stage : step.stages) {
+      const ImageFunction* fn = FindImageFunction(stage.function);
+      ImageCall call;
+      s = fn ? PrepareImageCall(*fn, stage.args, &call)
+             : Status::Error("no image function " + stage.function);
+      if (!s.ok()) break;
+      const cv::Mat* second = nullptr;
+      if (stage.second == "input") second = &input;
+      s = CallImageFunction(plugin, call, &image, second);
+      if (!s.ok()) break;
+    }
+    const std::string file = dir + "/" + step.label + ".png";
+    if (s.ok()) s = WriteImage(file, image);
+    if (!s.ok()) {
+      std::fprintf(stderr, "tessarofx: error: %s: %s\n", step.label.c_str(), s.message().c_str());
+      ++failures;
+      continue;
+    }
+    std::printf("wrote %s\n", file.c_str());
+    results[step.label] = image;
+    tiles.push_back({step.label, step.caption, image});
+  }
+
   const cv::Mat sheet = MakeContactSheet("TessaroFx demo: before and after", tiles);
   const std::string sheetFile = dir + "/contact-sheet.png";
   if (Status s = WriteImage(sheetFile, sheet); !s.ok()) return s;
   std::printf("wrote %s\n", sheetFile.c_str());
-  if (failures) return Status::Error(std::to_string(failures) + " demo filter(s) failed");
+  if (failures) return Status::Error(std::to_string(failures) + " demo step(s) failed");
   return Status::Ok();
 }
 

@@ -257,7 +257,9 @@ TEST_F(ToolTest, FailuresNameTheirCauseAndLeaveNoOutput) {
       {"apply ColorAdjust in.png in.png/out.png", "Not a directory"},
       {"apply ColorAdjust -in.png out.png", "unknown option '-in.png'"},
       {"fx exposure bright in.png out.png", "not a number"},
-      {"fx sharpen 3 in.png out.png", "unknown function"},
+      {"fx sharpness 3 in.png out.png", "unknown function"},
+      {"fx merge in.png out.png", "needs INPUT OVERLAY OUTPUT"},
+      {"fx clip 90 2 in.png out.png", "larger than the image"},
       {"--log-level loud apply ColorAdjust in.png out.png", "bad log level 'loud'"},
       {"--plugin ./nowhere.so list", "nowhere.so"},
       {"list", "env.so", "TESSAROFX_PLUGIN=" + Path("env.so")},
@@ -322,6 +324,72 @@ TEST_F(ToolTest, EveryFxCallingKindRunsAndChangesTheImage) {
   }
 }
 
+TEST_F(ToolTest, EveryEnhancementFxRunsWithTheOutputSizeItPromises) {
+  // Each call shape of the enhancement table once: the image itself, packed rows, colour planes,
+  // grey planes, and buffers the plug-in allocates at a new size.
+  WriteInput("in.png", 33, 21);
+  const struct {
+    const char* args;
+    int width, height;
+  } cases[] = {
+      {"blur 3", 33, 21},
+      {"stack-pass 2 1", 33, 21},
+      {"box-blur 2", 33, 21},
+      {"window-mean 2", 33, 21},
+      {"window-variance 2", 33, 21},
+      {"percentile 2 0.5", 33, 21},
+      {"denoise 200", 33, 21},
+      {"denoise-hsl 200", 33, 21},
+      {"dct-denoise 30", 33, 21},
+      {"local-denoise 5 20", 33, 21},
+      {"dehaze 50", 33, 21},
+      {"dark-channel", 33, 21},
+      {"haze-veil 0.5", 33, 21},
+      {"sharpen 100", 33, 21},
+      {"clarity 40", 33, 21},
+      {"diffuse 300", 33, 21},
+      {"grain 50 100", 33, 21},
+      {"first-row", 33, 21},
+      {"frame 255 0 0 255 4", 41, 29},
+      {"scale-alpha 0 0 255 255 3", 39, 27},
+      {"clip 11 7", 11, 7},
+      {"pad-blur 5", 43, 31},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.args);
+    const Outcome r = Run(std::string("fx ") + c.args + " in.png out.png");
+    ASSERT_EQ(r.exitCode, 0) << r.err;
+    const cv::Mat out = Read("out.png");
+    EXPECT_EQ(out.size(), cv::Size(c.width, c.height));
+    if (out.size() == cv::Size(33, 21)) EXPECT_NE(cv::norm(out, Read("in.png"), cv::NORM_INF), 0);
+  }
+}
+
+TEST_F(ToolTest, FxMergeAndTheMeasuresReadASecondImage) {
+  WriteInput("in.png", 12, 8);
+  cv::Mat patch(3, 4, CV_8UC4, cv::Scalar(10, 20, 30, 255));
+  ASSERT_TRUE(cv::imwrite(Path("patch.png"), patch));
+  ASSERT_EQ(Run("fx merge 5 2 100 100 in.png patch.png out.png").exitCode, 0);
+  const cv::Mat merged = Read("out.png"), in = Read("in.png");
+  // Placed top-down as the images are read, whatever the function's own row order.
+  EXPECT_EQ(merged.at<cv::Vec4b>(2, 5), cv::Vec4b(10, 20, 30, 255));
+  EXPECT_EQ(merged.at<cv::Vec4b>(4, 8), cv::Vec4b(10, 20, 30, 255));
+  EXPECT_EQ(merged.at<cv::Vec4b>(1, 5), in.at<cv::Vec4b>(1, 5));
+  EXPECT_EQ(merged.at<cv::Vec4b>(5, 5), in.at<cv::Vec4b>(5, 5));
+
+  const Outcome same = Run("fx wb-rates in.png in.png");
+  ASSERT_EQ(same.exitCode, 0) << same.err;
+  EXPECT_NE(same.out.find("temperature change (getAutoWhiteBalanceCCTChangeRate)   0.00"), npos)
+      << same.out;
+  EXPECT_NE(same.out.find("tint change (getAutoWhiteBalanceTintChangeRate)         0.00"), npos)
+      << same.out;
+  const Outcome point = Run("fx white-point in.png");
+  ASSERT_EQ(point.exitCode, 0) << point.err;
+  EXPECT_NE(point.out.find(" mired"), npos) << point.out;
+  EXPECT_NE(point.out.find(" K"), npos) << point.out;
+  EXPECT_EQ(Listing(), (std::vector<std::string>{"in.png", "out.png", "patch.png"}));
+}
+
 TEST_F(ToolTest, EveryFxSymbolResolvesInThePlugin) {
   const Outcome r = Run("fx --list");
   ASSERT_EQ(r.exitCode, 0) << r.err;
@@ -330,8 +398,8 @@ TEST_F(ToolTest, EveryFxSymbolResolvesInThePlugin) {
   for (std::string w; words >> w;) {
     if (w.rfind("_Z", 0) == 0) symbols.push_back(w);
   }
-  // Eighteen functions and four members of the image class.
-  ASSERT_GE(symbols.size(), 22u) << r.out;
+  // 43 functions, 7 more that some of them call, and four members of the image class.
+  ASSERT_GE(symbols.size(), 54u) << r.out;
   void* plugin = dlopen(TFX_PLUGIN_PATH, RTLD_NOW | RTLD_LOCAL);
   ASSERT_NE(plugin, nullptr) << dlerror();
   for (const std::string& s : symbols) EXPECT_NE(dlsym(plugin, s.c_str()), nullptr) << s;
@@ -364,6 +432,16 @@ TEST_F(ToolTest, DemoWritesTheSceneEachFilterAndAContactSheet) {
   EXPECT_EQ(filled.at<cv::Vec4b>(60, 500), cv::Vec4b(0, 0, 0, 255));
   EXPECT_EQ(keyed.at<cv::Vec4b>(90, 40), scene.at<cv::Vec4b>(90, 40));
   EXPECT_EQ(filled.at<cv::Vec4b>(90, 40), scene.at<cv::Vec4b>(90, 40));
+  // The enhancement pictures: grain, then denoised back towards the scene; the cut-out with its
+  // outline on a canvas 8 pixels larger on each side.
+  const cv::Mat grain = Read("demo-out/grain.png"), denoised = Read("demo-out/denoise.png");
+  ASSERT_EQ(grain.size(), scene.size());
+  ASSERT_EQ(denoised.size(), scene.size());
+  EXPECT_LT(cv::norm(denoised, scene, cv::NORM_L2), 0.7 * cv::norm(grain, scene, cv::NORM_L2));
+  for (const std::string name : {"haze", "dehaze", "clarity", "diffuse"}) {
+    EXPECT_EQ(Read("demo-out/" + name + ".png").size(), scene.size()) << name;
+  }
+  EXPECT_EQ(Read("demo-out/cutout-frame.png").size(), cv::Size(976, 556));
   // The demo is deterministic: a second run into another directory gives the same scene bytes.
   ASSERT_EQ(Run("demo " + Path("again")).exitCode, 0);
   EXPECT_EQ(Slurp(Path("again/sample.png")), Slurp(Path("demo-out/sample.png")));
