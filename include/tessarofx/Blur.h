@@ -1,9 +1,9 @@
 // Blurs and sliding-window statistics over raw 8-bit pixel buffers.
 //
 // None of these functions keeps state or reports an error: bad input (a null pointer, a size
-// below 1, a radius outside the range stated) returns without touching the buffers. Every
-// filter costs O(1) per pixel in the radius. The row stride each one assumes is part of its
-// contract:
+// below 1, a radius outside the range stated, a buffer over 2^31 - 1 bytes) returns without
+// touching the buffers. Every filter costs O(1) per pixel in the radius. The row stride each one
+// assumes is part of its contract:
 //   stackblur, gaussianBlur        width * channels rounded up to a multiple of 4 bytes
 //   fastAverageBlur                width * channels
 //   window filters (one plane)     width
@@ -23,7 +23,8 @@ extern TFX_API const uint8_t stackblur_shr[256];
 // other pass does nothing. Only the first three bytes of a pixel are filtered. With 4 channels
 // the fourth byte is alpha: it is kept, and colour is clamped to it (premultiplied data stays
 // premultiplied). With 3 channels colour is clamped to 255; with any other channel count the
-// clamp limit is 0, so the first three bytes of every pixel become 0. Radius 0..255.
+// clamp limit is 0, so the first three bytes of every pixel become 0 (all of them when a pixel
+// has fewer). Radius 0..255.
 TFX_API void stackblur(unsigned char* pixels, unsigned int width, unsigned int height, int channels,
                        unsigned int radius, int pass);
 

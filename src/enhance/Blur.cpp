@@ -1,0 +1,190 @@
+// Stack Blur and the box blur over interleaved 8-bit pixels, in place.
+#include "tessarofx/Blur.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <memory>
+#include <new>
+
+// Literal constants rather than a table built at load: a host reads them as data.
+const uint16_t stackblur_mul[256] = {
+    512, 512, 456, 512, 328, 456, 335, 512, 405, 328, 271, 456, 388, 335, 292, 512, 454, 405, 364,
+    328, 298, 271, 496, 456, 420, 388, 360, 335, 312, 292, 273, 512, 482, 454, 428, 405, 383, 364,
+    345, 328, 312, 298, 284, 271, 259, 496, 475, 456, 437, 420, 404, 388, 374, 360, 347, 335, 323,
+    312, 302, 292, 282, 273, 265, 512, 497, 482, 468, 454, 441, 428, 417, 405, 394, 383, 373, 364,
+    354, 345, 337, 328, 320, 312, 305, 298, 291, 284, 278, 271, 265, 259, 507, 496, 485, 475, 465,
+    456, 446, 437, 428, 420, 412, 404, 396, 388, 381, 374, 367, 360, 354, 347, 341, 335, 329, 323,
+    318, 312, 307, 302, 297, 292, 287, 282, 278, 273, 269, 265, 261, 512, 505, 497, 489, 482, 475,
+    468, 461, 454, 447, 441, 435, 428, 422, 417, 411, 405, 399, 394, 389, 383, 378, 373, 368, 364,
+    359, 354, 350, 345, 341, 337, 332, 328, 324, 320, 316, 312, 309, 305, 301, 298, 294, 291, 287,
+    284, 281, 278, 274, 271, 268, 265, 262, 259, 257, 507, 501, 496, 491, 485, 480, 475, 470, 465,
+    460, 456, 451, 446, 442, 437, 433, 428, 424, 420, 416, 412, 408, 404, 400, 396, 392, 388, 385,
+    381, 377, 374, 370, 367, 363, 360, 357, 354, 350, 347, 344, 341, 338, 335, 332, 329, 326, 323,
+    320, 318, 315, 312, 310, 307, 304, 302, 299, 297, 294, 292, 289, 287, 285, 282, 280, 278, 275,
+    273, 271, 269, 267, 265, 263, 261, 259, 512,
+};
+const uint8_t stackblur_shr[256] = {
+    9,  11, 12, 13, 13, 14, 14, 15, 15, 15, 15, 16, 16, 16, 16, 17, 17, 17, 17, 17, 17, 17, 18, 18,
+    18, 18, 18, 18, 18, 18, 18, 19, 19, 19, 19, 19, 19, 19, 19, 19, 19, 19, 19, 19, 19, 20, 20, 20,
+    20, 20, 20, 20, 20, 20, 20, 20, 20, 20, 20, 20, 20, 20, 20, 21, 21, 21, 21, 21, 21, 21, 21, 21,
+    21, 21, 21, 21, 21, 21, 21, 21, 21, 21, 21, 21, 21, 21, 21, 21, 21, 21, 22, 22, 22, 22, 22, 22,
+    22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22, 22,
+    22, 22, 22, 22, 22, 22, 22, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23,
+    23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23,
+    23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 23, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24,
+    24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24,
+    24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24,
+    24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 24, 25,
+};
+
+namespace {
+
+// Larger buffers are refused: a size that large is far likelier a caller's overflow than a frame.
+constexpr uint64_t kMaxBytes = INT32_MAX;
+
+// Bytes 0..2 of one pixel, as the blur keeps them while they wait in its stack.
+struct Colour {
+  uint8_t c[3];
+};
+
+// One line of `length` pixels, `step` bytes apart, with 3-byte colour and, when `has_alpha`, an
+// alpha byte after it that caps the colour. The stack holds the 2 radius + 1 samples around the
+// output: `in` sums those ahead of it, `out` those at and behind it, and `sum` weighs each sample
+// by radius + 1 minus its distance, so (sum * mul) >> shr is the triangle-weighted mean.
+void BlurLine(uint8_t* line, ptrdiff_t step, size_t length, bool has_alpha, unsigned radius) {
+  Colour stack[511];
+  const unsigned div = 2 * radius + 1;
+  const uint64_t mul = stackblur_mul[radius];
+  const unsigned shr = stackblur_shr[radius];
+  const size_t last = length - 1;
+  uint32_t sum[3] = {}, in[3] = {}, out[3] = {};
+  for (unsigned i = 0; i <= radius; ++i) {
+    for (int c = 0; c < 3; ++c) {
+      stack[i].c[c] = line[c];
+      sum[c] += line[c] * (i + 1);
+      out[c] += line[c];
+    }
+  }
+  for (unsigned i = 1; i <= radius; ++i) {
+    const uint8_t* p = line + static_cast<ptrdiff_t>(std::min<size_t>(i, last)) * step;
+    for (int c = 0; c < 3; ++c) {
+      stack[radius + i].c[c] = p[c];
+      sum[c] += p[c] * (radius + 1 - i);
+      in[c] += p[c];
+    }
+  }
+  size_t next = std::min<size_t>(last, radius);
+  unsigned sp = radius;
+  uint8_t* dst = line;
+  for (size_t x = 0; x < length; ++x, dst += step) {
+    // The pass never writes byte 3, so the cap is the pixel's own alpha.
+    const uint32_t limit = has_alpha ? dst[3] : 255;
+    for (int c = 0; c < 3; ++c) {
+      // The product needs 33 bits at radius 255.
+      const uint64_t value = (sum[c] * mul) >> shr;
+      dst[c] = static_cast<uint8_t>(std::min<uint64_t>(value, limit));
+    }
+    unsigned leaving = sp + div - radius;
+    if (leaving >= div) leaving -= div;
+    if (next < last) ++next;
+    // Read after dst was written: only the last output position can see its own new value here,
+    // and no output follows it.
+    const uint8_t* p = line + static_cast<ptrdiff_t>(next) * step;
+    for (int c = 0; c < 3; ++c) {
+      sum[c] -= out[c];
+      out[c] -= stack[leaving].c[c];
+      stack[leaving].c[c] = p[c];
+      in[c] += p[c];
+      sum[c] += in[c];
+    }
+    sp = sp + 1 == div ? 0 : sp + 1;
+    for (int c = 0; c < 3; ++c) {
+      out[c] += stack[sp].c[c];
+      in[c] -= stack[sp].c[c];
+    }
+  }
+}
+
+}  // namespace
+
+void stackblur(unsigned char* pixels, unsigned int width, unsigned int height, int channels,
+               unsigned int radius, int pass) {
+  if (pixels == nullptr || radius > 255 || channels < 1 || (pass != 1 && pass != 2)) return;
+  if (width == 0 || height == 0) return;
+  const uint64_t row_bytes = static_cast<uint64_t>(width) * static_cast<uint64_t>(channels);
+  const uint64_t stride = (row_bytes + 3) & ~uint64_t{3};
+  if (stride > kMaxBytes / height) return;
+  const ptrdiff_t pitch = static_cast<ptrdiff_t>(stride);
+
+  if (channels != 3 && channels != 4) {
+    // The colour cap is 0, so every output is 0; pixels narrower than three bytes lose all
+    // their bytes rather than spill into their neighbours and past the buffer.
+    const size_t zeroed = static_cast<size_t>(std::min(channels, 3));
+    for (unsigned y = 0; y < height; ++y) {
+      uint8_t* p = pixels + static_cast<ptrdiff_t>(y) * pitch;
+      for (unsigned x = 0; x < width; ++x, p += channels) std::memset(p, 0, zeroed);
+    }
+    return;
+  }
+  const bool has_alpha = channels == 4;
+  if (pass == 1) {
+    for (unsigned y = 0; y < height; ++y) {
+      BlurLine(pixels + static_cast<ptrdiff_t>(y) * pitch, channels, width, has_alpha, radius);
+    }
+  } else {
+    for (unsigned x = 0; x < width; ++x) {
+      BlurLine(pixels + static_cast<ptrdiff_t>(x) * channels, pitch, height, has_alpha, radius);
+    }
+  }
+}
+
+void gaussianBlur(unsigned char* pixels, int width, int height, int channels, int radius) {
+  if (pixels == nullptr || static_cast<unsigned>(radius) - 1u >= 254u) return;
+  if (width < 1 || height < 1) return;
+  stackblur(pixels, static_cast<unsigned>(width), static_cast<unsigned>(height), channels,
+            static_cast<unsigned>(radius), 1);
+  stackblur(pixels, static_cast<unsigned>(width), static_cast<unsigned>(height), channels,
+            static_cast<unsigned>(radius), 2);
+}
+
+void fastAverageBlur(unsigned char* pixels, int width, int height, int channels, int radius) {
+  // The first window of a column reaches rows 0..radius unclamped, so the height must exceed
+  // the radius.
+  if (pixels == nullptr || radius < 1 || width < 1 || height <= radius || channels < 1) return;
+  const uint64_t area = static_cast<uint64_t>(width) * static_cast<uint64_t>(height);
+  if (area > kMaxBytes / static_cast<uint64_t>(channels)) return;
+  // With 4 channels only byte 0 is blurred, as with 2 or more than 4.
+  const int blurred = channels == 3 ? 3 : 1;
+  std::unique_ptr<uint8_t[]> plane(new (std::nothrow) uint8_t[area]);
+  if (!plane) return;
+  const int64_t r = radius;
+  const int64_t div = 2 * r + 1;
+  const int64_t w = width, h = height;
+  const ptrdiff_t pixel = channels;
+  for (int k = 0; k < blurred; ++k) {
+    for (int64_t y = 0; y < h; ++y) {
+      const uint8_t* row = pixels + y * w * pixel + k;
+      // Samples left of column 0 repeat it, and so do those right of the last column.
+      const int64_t inside = std::min(r, w - 1);
+      int64_t sum = (r + 1) * row[0] + (r - inside) * row[(w - 1) * pixel];
+      for (int64_t i = 1; i <= inside; ++i) sum += row[i * pixel];
+      uint8_t* out = plane.get() + y * w;
+      for (int64_t x = 0; x < w; ++x) {
+        out[x] = static_cast<uint8_t>(sum / div);
+        sum += row[std::min(x + r + 1, w - 1) * pixel] - row[std::max<int64_t>(x - r, 0) * pixel];
+      }
+    }
+    for (int64_t x = 0; x < w; ++x) {
+      const uint8_t* column = plane.get() + x;
+      int64_t sum = (r + 1) * column[0];
+      for (int64_t i = 1; i <= r; ++i) sum += column[i * w];
+      uint8_t* out = pixels + x * pixel + k;
+      for (int64_t y = 0; y < h; ++y) {
+        out[y * w * pixel] = static_cast<uint8_t>(sum / div);
+        sum += column[std::min(y + r + 1, h - 1) * w] - column[std::max<int64_t>(y - r, 0) * w];
+      }
+    }
+  }
+}
