@@ -10,11 +10,12 @@
 #include "tessarofx/Export.h"
 
 // The mean of byte `channel` (0, 1 or 2; 3 sums nothing and gives 0) over all pixels, as the low
-// byte of the truncated 64-bit mean. 255 for a null image, a channel above 3, or a size below 1.
+// byte of the truncated 64-bit mean. 255 for a null image, a channel outside 0..3, or a size
+// below 1.
 TFX_API unsigned char channelMean(const unsigned char* pixels, int width, int height, int channel);
 
 // A placeholder that performs no balancing: it copies the first row of `width` pixels into
-// `dst` and returns `dst`. A null pointer or a size of 0 returns `src`.
+// `dst` and returns `dst`. A null pointer or a size below 1 returns `src`.
 TFX_API unsigned char* doAutoWhiteBalance(unsigned char* src, unsigned char* dst, int width,
                                           int height);
 
@@ -25,16 +26,19 @@ TFX_API void rgb2xyz(unsigned char r, unsigned char g, unsigned char b, float& X
 TFX_API void xyz2xy(float X, float Y, float Z, float& x, float& y, float& Yout);
 // The correlated colour temperature of chromaticity (x, y) from the cubic in
 // n = (x - 0.332) / (0.1858 - y), returned as its reciprocal in mireds, truncated (D65: 153).
+// INT64_MIN when that is no number of 64 bits (the 0 / 0 chromaticity of black).
 TFX_API int64_t xy_to_CCT_Hernandez1999(float x, float y);
 
 // The temperature change from `src` to `corrected` as a slider position: the mired difference
-// of their mean colours over 11500, limited to -1..1, times 10000. A null `corrected` counts as
-// white. Equal images give exactly 0.
+// of their mean colours over 11500 (the 64-bit difference wraps), limited to -1..1, times 10000.
+// A null image counts as white; a size below 1 gives 0. Equal images give exactly 0.
 TFX_API double getAutoWhiteBalanceCCTChangeRate(const unsigned char* src,
                                                 const unsigned char* corrected, int width,
                                                 int height);
 // The tint change as a slider position: the relative change of the red mean, limited to -1..1,
-// times 100 (the red channel is the measure, by design). A null `corrected` counts as white.
+// times 100 (the red channel is the measure, by design). A null image counts as white; a size
+// below 1 gives 0. Equal images give exactly 0, black ones included; a black source gives 100
+// for any redder result.
 TFX_API double getAutoWhiteBalanceTintChangeRate(const unsigned char* src,
                                                  const unsigned char* corrected, int width,
                                                  int height);
