@@ -8,6 +8,9 @@
 #include <memory>
 #include <new>
 
+#include "simd/stackblur_lanes.h"
+#include "tessarofx/AlignedMemory.h"
+
 // Literal constants rather than a table built at load: a host reads them as data.
 const uint16_t stackblur_mul[256] = {
     512, 512, 456, 512, 328, 456, 335, 512, 405, 328, 271, 456, 388, 335, 292, 512, 454, 405, 364,
@@ -41,68 +44,77 @@ const uint8_t stackblur_shr[256] = {
 
 namespace {
 
+using tfx::StackblurLanesVector;
+using tfx::StackblurWalk;
+
 // Larger buffers are refused: a size that large is far likelier a caller's overflow than a frame.
 constexpr uint64_t kMaxBytes = INT32_MAX;
 
-// Bytes 0..2 of one pixel, as the blur keeps them while they wait in its stack.
-struct Colour {
-  uint8_t c[3];
+// Scratch memory from aligned_malloc, released on scope exit.
+struct AlignedBlock {
+  void* block;
+  explicit AlignedBlock(size_t bytes) : block(aligned_malloc(bytes, 64)) {}
+  ~AlignedBlock() { aligned_free(block); }
+  AlignedBlock(const AlignedBlock&) = delete;
+  AlignedBlock& operator=(const AlignedBlock&) = delete;
 };
 
-// One line of `length` pixels, `step` bytes apart, with 3-byte colour and, when `has_alpha`, an
-// alpha byte after it that caps the colour. The stack holds the 2 radius + 1 samples around the
-// output: `in` sums those ahead of it, `out` those at and behind it, and `sum` weighs each sample
-// by radius + 1 minus its distance, so (sum * mul) >> shr is the triangle-weighted mean.
-void BlurLine(uint8_t* line, ptrdiff_t step, size_t length, bool has_alpha, unsigned radius) {
-  Colour stack[511];
-  const unsigned div = 2 * radius + 1;
-  const uint64_t mul = stackblur_mul[radius];
-  const unsigned shr = stackblur_shr[radius];
-  const size_t last = length - 1;
-  uint32_t sum[3] = {}, in[3] = {}, out[3] = {};
-  for (unsigned i = 0; i <= radius; ++i) {
-    for (int c = 0; c < 3; ++c) {
-      stack[i].c[c] = line[c];
-      sum[c] += line[c] * (i + 1);
-      out[c] += line[c];
-    }
+// The table entry with common factors of 2 taken out of mul and 2^shr, which changes no
+// quotient: radius 255 becomes sum >> 16, and every product then fits 32 bits (255 (r + 1)^2
+// times mul stays below 2^32 for the other radii).
+StackblurWalk MakeWalk(unsigned radius, bool alpha) {
+  StackblurWalk walk{radius, stackblur_mul[radius], stackblur_shr[radius], alpha};
+  while (walk.shr > 0 && walk.mul % 2 == 0) {
+    walk.mul /= 2;
+    --walk.shr;
   }
-  for (unsigned i = 1; i <= radius; ++i) {
-    const uint8_t* p = line + static_cast<ptrdiff_t>(std::min<size_t>(i, last)) * step;
-    for (int c = 0; c < 3; ++c) {
-      stack[radius + i].c[c] = p[c];
-      sum[c] += p[c] * (radius + 1 - i);
-      in[c] += p[c];
-    }
+  return walk;
+}
+
+// Pass 2: the lanes are the bytes of a row, taken in strips narrow enough for the sums and the
+// ring to stay in cache while the walk goes down the image.
+void BlurColumns(uint8_t* pixels, ptrdiff_t pitch, size_t row_bytes, size_t height,
+                 const StackblurWalk& walk) {
+  constexpr size_t kStrip = 1024;
+  const size_t lanes = std::min(kStrip, row_bytes);
+  AlignedBlock scratch(lanes * (3 * sizeof(uint32_t) + walk.radius + 1));
+  if (scratch.block == nullptr) return;
+  auto* sums = static_cast<uint32_t*>(scratch.block);
+  auto* ring = reinterpret_cast<uint8_t*>(sums + 3 * lanes);
+  for (size_t j = 0; j < row_bytes; j += kStrip) {
+    StackblurLanesVector(pixels + j, pitch, std::min(kStrip, row_bytes - j), height, walk, sums,
+                         ring);
   }
-  size_t next = std::min<size_t>(last, radius);
-  unsigned sp = radius;
-  uint8_t* dst = line;
-  for (size_t x = 0; x < length; ++x, dst += step) {
-    // The pass never writes byte 3, so the cap is the pixel's own alpha.
-    const uint32_t limit = has_alpha ? dst[3] : 255;
-    for (int c = 0; c < 3; ++c) {
-      // The product needs 33 bits at radius 255.
-      const uint64_t value = (sum[c] * mul) >> shr;
-      dst[c] = static_cast<uint8_t>(std::min<uint64_t>(value, limit));
+}
+
+// Pass 1: bands of rows are turned so that each column of the band becomes a line of lanes,
+// walked as the columns are, and turned back.
+template <int kChannels>
+void BlurRows(uint8_t* pixels, ptrdiff_t pitch, size_t width, size_t height,
+              const StackblurWalk& walk) {
+  constexpr size_t kBand = 32;
+  constexpr size_t kLanes = (kBand * kChannels + 63) / 64 * 64;
+  AlignedBlock scratch(width * kLanes + kLanes * (3 * sizeof(uint32_t) + walk.radius + 1));
+  if (scratch.block == nullptr) return;
+  auto* sums = static_cast<uint32_t*>(scratch.block);
+  auto* ring = reinterpret_cast<uint8_t*>(sums + 3 * kLanes);
+  uint8_t* band = ring + kLanes * (walk.radius + 1);
+  // Lanes past the band's rows are walked too; they only need defined contents.
+  std::memset(band, 0, width * kLanes);
+  for (size_t y0 = 0; y0 < height; y0 += kBand) {
+    const size_t rows = std::min(kBand, height - y0);
+    for (size_t i = 0; i < rows; ++i) {
+      const uint8_t* row = pixels + static_cast<ptrdiff_t>(y0 + i) * pitch;
+      uint8_t* lane = band + i * kChannels;
+      for (size_t x = 0; x < width; ++x)
+        std::memcpy(lane + x * kLanes, row + x * kChannels, kChannels);
     }
-    unsigned leaving = sp + div - radius;
-    if (leaving >= div) leaving -= div;
-    if (next < last) ++next;
-    // Read after dst was written: only the last output position can see its own new value here,
-    // and no output follows it.
-    const uint8_t* p = line + static_cast<ptrdiff_t>(next) * step;
-    for (int c = 0; c < 3; ++c) {
-      sum[c] -= out[c];
-      out[c] -= stack[leaving].c[c];
-      stack[leaving].c[c] = p[c];
-      in[c] += p[c];
-      sum[c] += in[c];
-    }
-    sp = sp + 1 == div ? 0 : sp + 1;
-    for (int c = 0; c < 3; ++c) {
-      out[c] += stack[sp].c[c];
-      in[c] -= stack[sp].c[c];
+    StackblurLanesVector(band, kLanes, kLanes, width, walk, sums, ring);
+    for (size_t i = 0; i < rows; ++i) {
+      uint8_t* row = pixels + static_cast<ptrdiff_t>(y0 + i) * pitch;
+      const uint8_t* lane = band + i * kChannels;
+      for (size_t x = 0; x < width; ++x)
+        std::memcpy(row + x * kChannels, lane + x * kLanes, kChannels);
     }
   }
 }
@@ -128,15 +140,13 @@ void stackblur(unsigned char* pixels, unsigned int width, unsigned int height, i
     }
     return;
   }
-  const bool has_alpha = channels == 4;
-  if (pass == 1) {
-    for (unsigned y = 0; y < height; ++y) {
-      BlurLine(pixels + static_cast<ptrdiff_t>(y) * pitch, channels, width, has_alpha, radius);
-    }
+  const StackblurWalk walk = MakeWalk(radius, channels == 4);
+  if (pass == 2) {
+    BlurColumns(pixels, pitch, static_cast<size_t>(row_bytes), height, walk);
+  } else if (channels == 4) {
+    BlurRows<4>(pixels, pitch, width, height, walk);
   } else {
-    for (unsigned x = 0; x < width; ++x) {
-      BlurLine(pixels + static_cast<ptrdiff_t>(x) * channels, pitch, height, has_alpha, radius);
-    }
+    BlurRows<3>(pixels, pitch, width, height, walk);
   }
 }
 
