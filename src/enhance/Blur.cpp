@@ -8,8 +8,8 @@
 #include <memory>
 #include <new>
 
+#include "enhance/Scratch.h"
 #include "simd/stackblur_lanes.h"
-#include "tessarofx/AlignedMemory.h"
 
 // Literal constants rather than a table built at load: a host reads them as data.
 const uint16_t stackblur_mul[256] = {
@@ -44,20 +44,12 @@ const uint8_t stackblur_shr[256] = {
 
 namespace {
 
+using tfx::ScratchBlock;
 using tfx::StackblurLanesVector;
 using tfx::StackblurWalk;
 
 // Larger buffers are refused: a size that large is far likelier a caller's overflow than a frame.
 constexpr uint64_t kMaxBytes = INT32_MAX;
-
-// Scratch memory from aligned_malloc, released on scope exit.
-struct AlignedBlock {
-  void* block;
-  explicit AlignedBlock(size_t bytes) : block(aligned_malloc(bytes, 64)) {}
-  ~AlignedBlock() { aligned_free(block); }
-  AlignedBlock(const AlignedBlock&) = delete;
-  AlignedBlock& operator=(const AlignedBlock&) = delete;
-};
 
 // The table entry with common factors of 2 taken out of mul and 2^shr, which changes no
 // quotient: radius 255 becomes sum >> 16, and every product then fits 32 bits (255 (r + 1)^2
@@ -77,9 +69,9 @@ void BlurColumns(uint8_t* pixels, ptrdiff_t pitch, size_t row_bytes, size_t heig
                  const StackblurWalk& walk) {
   constexpr size_t kStrip = 1024;
   const size_t lanes = std::min(kStrip, row_bytes);
-  AlignedBlock scratch(lanes * (3 * sizeof(uint32_t) + walk.radius + 1));
-  if (scratch.block == nullptr) return;
-  auto* sums = static_cast<uint32_t*>(scratch.block);
+  const ScratchBlock scratch(lanes * (3 * sizeof(uint32_t) + walk.radius + 1));
+  if (!scratch) return;
+  auto* sums = scratch.As<uint32_t>();
   auto* ring = reinterpret_cast<uint8_t*>(sums + 3 * lanes);
   for (size_t j = 0; j < row_bytes; j += kStrip) {
     StackblurLanesVector(pixels + j, pitch, std::min(kStrip, row_bytes - j), height, walk, sums,
@@ -94,9 +86,9 @@ void BlurRows(uint8_t* pixels, ptrdiff_t pitch, size_t width, size_t height,
               const StackblurWalk& walk) {
   constexpr size_t kBand = 32;
   constexpr size_t kLanes = (kBand * kChannels + 63) / 64 * 64;
-  AlignedBlock scratch(width * kLanes + kLanes * (3 * sizeof(uint32_t) + walk.radius + 1));
-  if (scratch.block == nullptr) return;
-  auto* sums = static_cast<uint32_t*>(scratch.block);
+  const ScratchBlock scratch(width * kLanes + kLanes * (3 * sizeof(uint32_t) + walk.radius + 1));
+  if (!scratch) return;
+  auto* sums = scratch.As<uint32_t>();
   auto* ring = reinterpret_cast<uint8_t*>(sums + 3 * kLanes);
   uint8_t* band = ring + kLanes * (walk.radius + 1);
   // Lanes past the band's rows are walked too; they only need defined contents.

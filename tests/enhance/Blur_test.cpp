@@ -6,6 +6,7 @@
 #include <array>
 #include <cstdint>
 #include <cstring>
+#include <iterator>
 #include <vector>
 
 #include "support/EveryTarget.h"
@@ -277,29 +278,63 @@ TEST(FastAverageBlur, IsABoxMeanOfBoxMeans) {
 
 // ---- Window statistics ------------------------------------------------------------------------
 
-TEST(WindowFilters, FollowTheDefinedWalkIncludingTheSkippedLastColumn) {
-  // Planes of radius + 2 to 2 radius columns count the last column without summing it.
+struct WindowCase {
+  int width, height, radius;
+};
+
+// Planes narrower and shorter than the window, the widths that skip the last column (radius + 2
+// to 2 radius) and windows whose counters wrap (radius 8 and up).
+const WindowCase kWindowCases[] = {{1, 1, 1},    {1, 9, 2},   {9, 1, 2},   {5, 1, 3},  {6, 4, 3},
+                                   {7, 7, 3},    {8, 3, 4},   {3, 9, 2},   {9, 9, 1},  {20, 5, 7},
+                                   {12, 12, 20}, {33, 21, 8}, {19, 40, 9}, {64, 48, 5}};
+
+// Noise, or noise pushed near 255 for the largest sums and squares.
+Bytes WindowSource(const WindowCase& c, bool high) {
+  Bytes src = NoiseBytes(size_t(c.width) * c.height, 31);
+  if (high) {
+    for (uint8_t& v : src) v = uint8_t(v | 0xf0);
+  }
+  return src;
+}
+
+TEST(WindowFilters, MeanAndVarianceFollowTheDefinedWalk) {
+  // The last column left out of the sum but counted.
   const Bytes last_only = {0, 0, 0, 0, 255};
   Bytes dst(5, 77);
   fastWindowAverageFilter(last_only.data(), dst.data(), 5, 1, 3);
   EXPECT_EQ(dst, Bytes(5, 0));
 
-  struct Case {
-    int width, height, radius;
-  };
-  const Case cases[] = {{1, 1, 1}, {5, 1, 3}, {6, 4, 3},  {7, 7, 3},   {8, 3, 4},
-                        {3, 9, 2}, {9, 9, 1}, {20, 5, 7}, {12, 12, 20}};
-  for (const Case& c : cases) {
+  std::vector<WindowCase> cases(std::begin(kWindowCases), std::end(kWindowCases));
+  cases.push_back({260, 259, 129});  // windows over 66051 pixels need 64-bit totals
+  for (const WindowCase& c : cases) {
     SCOPED_TRACE(testing::Message() << c.width << "x" << c.height << " radius " << c.radius);
-    const Bytes src = NoiseBytes(size_t(c.width) * c.height, 31);
-    Bytes mean(src.size()), variance(src.size()), median(src.size());
-    fastWindowAverageFilter(src.data(), mean.data(), c.width, c.height, c.radius);
-    fastWindowVarianceFilter(src.data(), variance.data(), c.width, c.height, c.radius);
-    fastFilter(src.data(), median.data(), c.width, c.height, c.radius, 0.5f);
-    EXPECT_EQ(mean, LiteralWindowWalk(src, c.width, c.height, c.radius, Stat::kMean));
-    EXPECT_EQ(variance, LiteralWindowWalk(src, c.width, c.height, c.radius, Stat::kVariance));
-    EXPECT_EQ(median, LiteralWindowWalk(src, c.width, c.height, c.radius, Stat::kPercentile));
+    for (const bool high : {false, true}) {
+      const Bytes src = WindowSource(c, high);
+      Bytes mean(src.size()), variance(src.size());
+      fastWindowAverageFilter(src.data(), mean.data(), c.width, c.height, c.radius);
+      fastWindowVarianceFilter(src.data(), variance.data(), c.width, c.height, c.radius);
+      EXPECT_EQ(mean, LiteralWindowWalk(src, c.width, c.height, c.radius, Stat::kMean));
+      EXPECT_EQ(variance, LiteralWindowWalk(src, c.width, c.height, c.radius, Stat::kVariance));
+    }
   }
+}
+
+TEST(WindowFilters, PercentileFollowsTheDefinedWalkOnEveryTarget) {
+  tfx_test::ForEveryTarget([&] {
+    for (const WindowCase& c : kWindowCases) {
+      SCOPED_TRACE(testing::Message() << c.width << "x" << c.height << " radius " << c.radius);
+      for (const bool high : {false, true}) {
+        const Bytes src = WindowSource(c, high);
+        for (const float p : {0.0f, 0.5f, 0.93f, 1.0f}) {
+          Bytes percentile(src.size());
+          fastFilter(src.data(), percentile.data(), c.width, c.height, c.radius, p);
+          EXPECT_EQ(percentile,
+                    LiteralWindowWalk(src, c.width, c.height, c.radius, Stat::kPercentile, p))
+              << p;
+        }
+      }
+    }
+  });
 }
 
 TEST(WindowFilters, VarianceKeepsOnlyTheLowByte) {

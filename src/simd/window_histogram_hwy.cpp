@@ -1,0 +1,126 @@
+// The percentile filter's row, compiled once per instruction set by foreach_target.h.
+//
+// Counters add and subtract modulo 256 in any order, so whole-vector byte arithmetic gives the
+// walk's histogram exactly. The scan looks for the smallest value v whose running count reaches
+// the target; that bin is never empty unless the target is 0, where the first non-empty bin is
+// wanted, which is the same search with a target of 1. Sums of eight bins find the group of eight
+// holding v, then the bins of that group find v.
+#include <algorithm>
+
+#include "simd/window_histogram.h"
+
+#undef HWY_TARGET_INCLUDE
+#define HWY_TARGET_INCLUDE "simd/window_histogram_hwy.cpp"
+#include <hwy/foreach_target.h>  // IWYU pragma: keep
+#include <hwy/highway.h>
+
+HWY_BEFORE_NAMESPACE();
+namespace tfx {
+namespace HWY_NAMESPACE {
+
+namespace hn = hwy::HWY_NAMESPACE;
+
+// Helpers stay in this file: other kernels' files build the same target namespaces.
+namespace {
+
+constexpr uint32_t kNone = 256;
+
+// The target of a window of `count` pixels, at least 1 as explained above.
+uint32_t TargetOf(int64_t count, float fraction) {
+  const int64_t target =
+      std::min(static_cast<int64_t>(static_cast<float>(count + 1) * fraction), count);
+  // No histogram of 256 counters holds more than 256 * 255 pixels.
+  return static_cast<uint32_t>(std::clamp<int64_t>(target, 1, 256 * 255 + 1));
+}
+
+// The smallest v of `bins` whose running count reaches `target`, given the sums of its eight-bin
+// groups; kNone when the total stays below.
+uint32_t Scan(const uint8_t* bins, const uint64_t* groups, uint32_t target) {
+  uint32_t total = 0, g = 0;
+  while (g < 32 && total + groups[g] < target) total += static_cast<uint32_t>(groups[g++]);
+  if (g == 32) return kNone;
+  uint32_t v = 8 * g;
+  while ((total += bins[v]) < target) ++v;
+  return v;
+}
+
+#if HWY_TARGET == HWY_SCALAR
+
+void Combine(uint8_t* window, const uint8_t* add, const uint8_t* remove, uint64_t* groups) {
+  for (int g = 0; g < 32; ++g) {
+    uint64_t sum = 0;
+    for (int b = 8 * g; b < 8 * g + 8; ++b) {
+      if (remove != nullptr) window[b] = static_cast<uint8_t>(window[b] - remove[b]);
+      if (add != nullptr) window[b] = static_cast<uint8_t>(window[b] + add[b]);
+      sum += window[b];
+    }
+    groups[g] = sum;
+  }
+}
+
+#else
+
+// window += add - remove (either may be null), then the sums of the window's eight-bin groups.
+void Combine(uint8_t* HWY_RESTRICT window, const uint8_t* add, const uint8_t* remove,
+             uint64_t* HWY_RESTRICT groups) {
+  const hn::ScalableTag<uint8_t> d8;
+  const hn::Repartition<uint64_t, decltype(d8)> d64;
+  const size_t n = hn::Lanes(d8);
+  for (size_t i = 0; i < 256; i += n) {
+    auto v = hn::Load(d8, window + i);
+    if (remove != nullptr) v = hn::Sub(v, hn::LoadU(d8, remove + i));
+    if (add != nullptr) v = hn::Add(v, hn::LoadU(d8, add + i));
+    hn::Store(v, d8, window + i);
+    hn::StoreU(hn::SumsOf8(v), d64, groups + i / 8);
+  }
+}
+
+#endif
+
+}  // namespace
+
+void WindowHistogramRowOfTarget(const uint8_t* columns, uint8_t* out, int64_t width, int64_t radius,
+                                int64_t rows, float fraction) {
+  HWY_ALIGN uint8_t window[256] = {};
+  HWY_ALIGN uint64_t groups[32];
+  const int64_t first_right = std::min(width - 1, radius);
+  for (int64_t j = 0; j <= first_right; ++j) Combine(window, columns + j * 256, nullptr, groups);
+  for (int64_t x = 0; x < width; ++x) {
+    const int64_t left = std::max<int64_t>(0, x - radius);
+    const int64_t right = std::min(width - 1, x + radius);
+    if (x > 0) {
+      // The walk's slide: the column behind the window leaves, and the column at the right edge
+      // enters unless that edge is clamped and the window is narrower than 2 radius + 1.
+      const uint8_t* remove = x - radius > 0 ? columns + (x - radius - 1) * 256 : nullptr;
+      const uint8_t* add =
+          right == width - 1 && right - left < 2 * radius ? nullptr : columns + right * 256;
+      Combine(window, add, remove, groups);
+    }
+    const uint32_t v = Scan(window, groups, TargetOf((right - left + 1) * rows, fraction));
+    out[x] = static_cast<uint8_t>(v);  // none gives 256, whose low byte is 0
+  }
+}
+
+const char* WindowHistogramTargetOfTarget() { return hwy::TargetName(HWY_TARGET); }
+
+}  // namespace HWY_NAMESPACE
+}  // namespace tfx
+HWY_AFTER_NAMESPACE();
+
+#if HWY_ONCE
+namespace tfx {
+
+HWY_EXPORT(WindowHistogramRowOfTarget);
+HWY_EXPORT(WindowHistogramTargetOfTarget);
+
+void WindowHistogramRow(const uint8_t* columns, uint8_t* out, int64_t width, int64_t radius,
+                        int64_t rows, float fraction) {
+  HWY_DYNAMIC_DISPATCH(WindowHistogramRowOfTarget)(columns, out, width, radius, rows, fraction);
+}
+
+const char* WindowHistogramTarget() {
+  return HWY_DYNAMIC_DISPATCH(WindowHistogramTargetOfTarget)();
+}
+
+}  // namespace tfx
+#endif  // HWY_ONCE
