@@ -5,10 +5,9 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
-#include <memory>
-#include <new>
 
 #include "enhance/Scratch.h"
+#include "simd/box_rows.h"
 #include "simd/stackblur_lanes.h"
 
 // Literal constants rather than a table built at load: a host reads them as data.
@@ -111,6 +110,126 @@ void BlurRows(uint8_t* pixels, ptrdiff_t pitch, size_t width, size_t height,
   }
 }
 
+// floor(n / div) for n up to 255 div: the 32-bit multiply and shift where one exists (div up
+// to 256), else a division. With m = ceil(2^shift / div) and 2^shift >= 255 div^2 the product
+// overshoots n / div by less than 1 / div, so it never reaches the next integer.
+struct BoxDivide {
+  tfx::BoxQuotient quotient{0, 0};
+  uint64_t div;
+  bool by_multiply = false;
+
+  explicit BoxDivide(uint64_t d) : div(d) {
+    for (int shift = 0; shift < 32; ++shift) {
+      const uint64_t power = uint64_t{1} << shift;
+      if (power < 255 * d * d) continue;
+      const uint64_t mul = (power + d - 1) / d;
+      by_multiply = 255 * d * mul <= UINT32_MAX;
+      quotient = {static_cast<uint32_t>(mul), shift};
+      break;
+    }
+  }
+  uint8_t operator()(uint64_t n) const {
+    if (by_multiply) {
+      return static_cast<uint8_t>((static_cast<uint32_t>(n) * quotient.mul) >> quotient.shift);
+    }
+    return static_cast<uint8_t>(n / div);
+  }
+};
+
+// The row pass of the box blur: channel k of each row, its edge samples repeated, into byte k of
+// kBlurred-byte pixels of `mid`. The window slides by one sample in and one out; in the middle of
+// the row neither end is clamped.
+template <int kBlurred>
+void BoxRows(const uint8_t* pixels, int64_t w, int64_t h, ptrdiff_t channels, int64_t r,
+             const BoxDivide& divide, uint8_t* mid) {
+  const int64_t inside = std::min(r, w - 1);
+  // Columns [r, w - r - 1) have both window ends inside the row.
+  const int64_t middle_begin = std::min(r, w);
+  const int64_t middle_end = std::max(middle_begin, w - r - 1);
+  for (int64_t y = 0; y < h; ++y) {
+    const uint8_t* row = pixels + y * w * channels;
+    uint8_t* out = mid + y * w * kBlurred;
+    for (int k = 0; k < kBlurred; ++k) {
+      const uint8_t* p = row + k;
+      uint64_t sum = static_cast<uint64_t>(r + 1) * p[0] + (r - inside) * p[(w - 1) * channels];
+      for (int64_t i = 1; i <= inside; ++i) sum += p[i * channels];
+      auto clamped_step = [&](int64_t x) {
+        out[x * kBlurred + k] = divide(sum);
+        sum += p[std::min(x + r + 1, w - 1) * channels];
+        sum -= p[std::max<int64_t>(x - r, 0) * channels];
+      };
+      int64_t x = 0;
+      for (; x < middle_begin; ++x) clamped_step(x);
+      for (; x < middle_end; ++x) {
+        out[x * kBlurred + k] = divide(sum);
+        sum += p[(x + r + 1) * channels];
+        sum -= p[(x - r) * channels];
+      }
+      for (; x < w; ++x) clamped_step(x);
+    }
+  }
+}
+
+// The column pass: each byte position of `mid`'s rows slides down the rows; only negative rows
+// are clamped for the first window, which the height above the radius makes enough.
+template <int kBlurred>
+void BoxColumns(const uint8_t* mid, int64_t w, int64_t h, ptrdiff_t channels, int64_t r,
+                const BoxDivide& divide, uint8_t* pixels, uint8_t* out_row, void* sums_block) {
+  const size_t lanes = static_cast<size_t>(w * kBlurred);
+  auto mid_row = [&](int64_t y) { return mid + y * static_cast<int64_t>(lanes); };
+  auto output = [&](int64_t y) {
+    return kBlurred == channels ? pixels + y * w * channels : out_row;
+  };
+  auto scatter = [&](int64_t y) {
+    if (kBlurred == channels) return;
+    uint8_t* row = pixels + y * w * channels;
+    for (int64_t x = 0; x < w; ++x) row[x * channels] = out_row[x];
+  };
+  if (divide.by_multiply) {
+    auto* sums = static_cast<uint32_t*>(sums_block);
+    std::fill(sums, sums + lanes, 0u);
+    tfx::BoxRowAccumulate(sums, mid_row(0), lanes, static_cast<uint32_t>(r + 1));
+    for (int64_t i = 1; i <= r; ++i) tfx::BoxRowAccumulate(sums, mid_row(i), lanes, 1);
+    for (int64_t y = 0; y < h; ++y) {
+      tfx::BoxRowStep(sums, mid_row(std::min(y + r + 1, h - 1)),
+                      mid_row(std::max<int64_t>(y - r, 0)), output(y), lanes, divide.quotient);
+      scatter(y);
+    }
+    return;
+  }
+  auto* sums = static_cast<uint64_t*>(sums_block);
+  for (size_t j = 0; j < lanes; ++j) sums[j] = static_cast<uint64_t>(r + 1) * mid_row(0)[j];
+  for (int64_t i = 1; i <= r; ++i) {
+    for (size_t j = 0; j < lanes; ++j) sums[j] += mid_row(i)[j];
+  }
+  for (int64_t y = 0; y < h; ++y) {
+    const uint8_t* entering = mid_row(std::min(y + r + 1, h - 1));
+    const uint8_t* leaving = mid_row(std::max<int64_t>(y - r, 0));
+    uint8_t* out = output(y);
+    for (size_t j = 0; j < lanes; ++j) {
+      out[j] = divide(sums[j]);
+      sums[j] += entering[j];
+      sums[j] -= leaving[j];
+    }
+    scatter(y);
+  }
+}
+
+template <int kBlurred>
+void BoxBlur(uint8_t* pixels, int width, int height, int channels, int radius) {
+  const int64_t w = width, h = height, r = radius;
+  const BoxDivide divide(static_cast<uint64_t>(2 * r + 1));
+  const size_t lanes = static_cast<size_t>(w * kBlurred);
+  const size_t mid_bytes = lanes * static_cast<size_t>(h);
+  const ScratchBlock scratch(mid_bytes + lanes * sizeof(uint64_t) + static_cast<size_t>(w));
+  if (!scratch) return;
+  uint8_t* mid = scratch.As<uint8_t>();
+  void* sums = scratch.As<void>(mid_bytes);
+  uint8_t* out_row = scratch.As<uint8_t>(mid_bytes + lanes * sizeof(uint64_t));
+  BoxRows<kBlurred>(pixels, w, h, channels, r, divide, mid);
+  BoxColumns<kBlurred>(mid, w, h, channels, r, divide, pixels, out_row, sums);
+}
+
 }  // namespace
 
 void stackblur(unsigned char* pixels, unsigned int width, unsigned int height, int channels,
@@ -157,36 +276,10 @@ void fastAverageBlur(unsigned char* pixels, int width, int height, int channels,
   if (pixels == nullptr || radius < 1 || width < 1 || height <= radius || channels < 1) return;
   const uint64_t area = static_cast<uint64_t>(width) * static_cast<uint64_t>(height);
   if (area > kMaxBytes / static_cast<uint64_t>(channels)) return;
-  // With 4 channels only byte 0 is blurred, as with 2 or more than 4.
-  const int blurred = channels == 3 ? 3 : 1;
-  std::unique_ptr<uint8_t[]> plane(new (std::nothrow) uint8_t[area]);
-  if (!plane) return;
-  const int64_t r = radius;
-  const int64_t div = 2 * r + 1;
-  const int64_t w = width, h = height;
-  const ptrdiff_t pixel = channels;
-  for (int k = 0; k < blurred; ++k) {
-    for (int64_t y = 0; y < h; ++y) {
-      const uint8_t* row = pixels + y * w * pixel + k;
-      // Samples left of column 0 repeat it, and so do those right of the last column.
-      const int64_t inside = std::min(r, w - 1);
-      int64_t sum = (r + 1) * row[0] + (r - inside) * row[(w - 1) * pixel];
-      for (int64_t i = 1; i <= inside; ++i) sum += row[i * pixel];
-      uint8_t* out = plane.get() + y * w;
-      for (int64_t x = 0; x < w; ++x) {
-        out[x] = static_cast<uint8_t>(sum / div);
-        sum += row[std::min(x + r + 1, w - 1) * pixel] - row[std::max<int64_t>(x - r, 0) * pixel];
-      }
-    }
-    for (int64_t x = 0; x < w; ++x) {
-      const uint8_t* column = plane.get() + x;
-      int64_t sum = (r + 1) * column[0];
-      for (int64_t i = 1; i <= r; ++i) sum += column[i * w];
-      uint8_t* out = pixels + x * pixel + k;
-      for (int64_t y = 0; y < h; ++y) {
-        out[y * w * pixel] = static_cast<uint8_t>(sum / div);
-        sum += column[std::min(y + r + 1, h - 1) * w] - column[std::max<int64_t>(y - r, 0) * w];
-      }
-    }
+  if (channels == 3) {
+    BoxBlur<3>(pixels, width, height, channels, radius);
+  } else {
+    // With 4 channels only byte 0 is blurred, as with 2 or more than 4.
+    BoxBlur<1>(pixels, width, height, channels, radius);
   }
 }

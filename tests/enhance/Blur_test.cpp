@@ -251,20 +251,30 @@ TEST(GaussianBlur, BlursRowsThenColumnsForRadius1To254Only) {
 
 // ---- Box blur ---------------------------------------------------------------------------------
 
-TEST(FastAverageBlur, IsABoxMeanOfBoxMeans) {
+TEST(FastAverageBlur, IsABoxMeanOfBoxMeansOnEveryTarget) {
   struct Case {
     int width, height, channels, radius;
   };
-  const Case cases[] = {{1, 2, 1, 1}, {5, 4, 3, 3},  {2, 9, 1, 4},  {16, 9, 3, 8},
-                        {9, 9, 4, 2}, {7, 12, 2, 5}, {30, 31, 3, 1}};
-  for (const Case& c : cases) {
-    SCOPED_TRACE(testing::Message() << c.width << "x" << c.height << " channels " << c.channels
-                                    << " radius " << c.radius);
-    Bytes image = NoiseBytes(size_t(c.width) * c.height * c.channels, 21);
-    const Bytes expected = BoxReference(image, c.width, c.height, c.channels, c.radius);
-    fastAverageBlur(image.data(), c.width, c.height, c.channels, c.radius);
-    EXPECT_EQ(image, expected);
-  }
+  // Rows narrower than the window, heights just above the radius, every channel count, and
+  // radii from 128 on, whose quotients no 32-bit multiply gives.
+  const Case cases[] = {{1, 2, 1, 1},  {5, 4, 3, 3},     {2, 9, 1, 4},      {16, 9, 3, 8},
+                        {9, 9, 4, 2},  {7, 12, 2, 5},    {30, 31, 3, 1},    {3, 6, 5, 5},
+                        {41, 9, 3, 7}, {3, 140, 3, 130}, {40, 129, 1, 128}, {33, 20, 4, 19}};
+  tfx_test::ForEveryTarget([&] {
+    for (const Case& c : cases) {
+      SCOPED_TRACE(testing::Message() << c.width << "x" << c.height << " channels " << c.channels
+                                      << " radius " << c.radius);
+      for (const bool high : {false, true}) {
+        Bytes image = NoiseBytes(size_t(c.width) * c.height * c.channels, 21);
+        if (high) {
+          for (uint8_t& v : image) v = uint8_t(v | 0xf8);  // the largest sums
+        }
+        const Bytes expected = BoxReference(image, c.width, c.height, c.channels, c.radius);
+        fastAverageBlur(image.data(), c.width, c.height, c.channels, c.radius);
+        EXPECT_EQ(image, expected);
+      }
+    }
+  });
   // With 4 channels bytes 1 to 3 are left alone.
   const Bytes noise = NoiseBytes(6 * 5 * 4, 22);
   Bytes image = noise;

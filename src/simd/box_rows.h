@@ -1,0 +1,24 @@
+// Rows of the box blur's column pass, one instruction set per build of the kernels, picked at the
+// time of the call. Each lane is one byte position of a row; enhance/Blur.cpp walks the rows.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+namespace tfx {
+
+// floor(n / div) as (n * mul) >> shift, exact and within 32 bits for every n up to 255 div; such
+// a pair exists for div up to 256.
+struct BoxQuotient {
+  uint32_t mul;
+  int shift;
+};
+
+// sums[j] += weight * row[j] for j < lanes.
+void BoxRowAccumulate(uint32_t* sums, const uint8_t* row, size_t lanes, uint32_t weight);
+
+// out[j] = floor(sums[j] / div), then sums[j] += entering[j] - leaving[j] for j < lanes.
+void BoxRowStep(uint32_t* sums, const uint8_t* entering, const uint8_t* leaving, uint8_t* out,
+                size_t lanes, BoxQuotient quotient);
+
+}  // namespace tfx
