@@ -97,15 +97,17 @@ void BlurRows(uint8_t* pixels, ptrdiff_t pitch, size_t width, size_t height,
     for (size_t i = 0; i < rows; ++i) {
       const uint8_t* row = pixels + static_cast<ptrdiff_t>(y0 + i) * pitch;
       uint8_t* lane = band + i * kChannels;
-      for (size_t x = 0; x < width; ++x)
+      for (size_t x = 0; x < width; ++x) {
         std::memcpy(lane + x * kLanes, row + x * kChannels, kChannels);
+      }
     }
     StackblurLanesVector(band, kLanes, kLanes, width, walk, sums, ring);
     for (size_t i = 0; i < rows; ++i) {
       uint8_t* row = pixels + static_cast<ptrdiff_t>(y0 + i) * pitch;
       const uint8_t* lane = band + i * kChannels;
-      for (size_t x = 0; x < width; ++x)
+      for (size_t x = 0; x < width; ++x) {
         std::memcpy(row + x * kChannels, lane + x * kLanes, kChannels);
+      }
     }
   }
 }
@@ -119,6 +121,7 @@ struct BoxDivide {
   bool by_multiply = false;
 
   explicit BoxDivide(uint64_t d) : div(d) {
+    if (d > 256) return;
     for (int shift = 0; shift < 32; ++shift) {
       const uint64_t power = uint64_t{1} << shift;
       if (power < 255 * d * d) continue;

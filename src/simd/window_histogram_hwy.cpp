@@ -4,7 +4,8 @@
 // walk's histogram exactly. The scan looks for the smallest value v whose running count reaches
 // the target; that bin is never empty unless the target is 0, where the first non-empty bin is
 // wanted, which is the same search with a target of 1. Sums of eight bins find the group of eight
-// holding v, then the bins of that group find v.
+// holding v, walking from the group of the previous pixel's v, which the next window's rarely
+// leaves far behind; then the bins of that group find v.
 #include <algorithm>
 
 #include "simd/window_histogram.h"
@@ -34,45 +35,61 @@ uint32_t TargetOf(int64_t count, float fraction) {
 }
 
 // The smallest v of `bins` whose running count reaches `target`, given the sums of its eight-bin
-// groups; kNone when the total stays below.
-uint32_t Scan(const uint8_t* bins, const uint64_t* groups, uint32_t target) {
-  uint32_t total = 0, g = 0;
-  while (g < 32 && total + groups[g] < target) total += static_cast<uint32_t>(groups[g++]);
-  if (g == 32) return kNone;
-  uint32_t v = 8 * g;
-  while ((total += bins[v]) < target) ++v;
+// groups and the total `below` of the groups before `group`; kNone when the total stays below.
+uint32_t Scan(const uint8_t* bins, const uint64_t* groups, uint32_t group, uint64_t below,
+              uint32_t target) {
+  // Find the group whose running totals before and after it straddle the target. Before group
+  // 0 the total is 0, below any target.
+  if (below >= target) {
+    while (below >= target) below -= groups[--group];
+  } else {
+    while (group < 32 && below + groups[group] < target) below += groups[group++];
+    if (group == 32) return kNone;
+  }
+  uint32_t v = 8 * group;
+  while ((below += bins[v]) < target) ++v;
   return v;
 }
 
 #if HWY_TARGET == HWY_SCALAR
 
-void Combine(uint8_t* window, const uint8_t* add, const uint8_t* remove, uint64_t* groups) {
-  for (int g = 0; g < 32; ++g) {
+uint64_t Combine(uint8_t* window, const uint8_t* add, const uint8_t* remove, uint64_t* groups,
+                 uint32_t group) {
+  uint64_t below = 0;
+  for (uint32_t g = 0; g < 32; ++g) {
     uint64_t sum = 0;
-    for (int b = 8 * g; b < 8 * g + 8; ++b) {
+    for (uint32_t b = 8 * g; b < 8 * g + 8; ++b) {
       if (remove != nullptr) window[b] = static_cast<uint8_t>(window[b] - remove[b]);
       if (add != nullptr) window[b] = static_cast<uint8_t>(window[b] + add[b]);
       sum += window[b];
     }
     groups[g] = sum;
+    if (g < group) below += sum;
   }
+  return below;
 }
 
 #else
 
-// window += add - remove (either may be null), then the sums of the window's eight-bin groups.
-void Combine(uint8_t* HWY_RESTRICT window, const uint8_t* add, const uint8_t* remove,
-             uint64_t* HWY_RESTRICT groups) {
+// window += add - remove (either may be null), then the sums of the window's eight-bin groups;
+// returns the total of the groups before `group`.
+uint64_t Combine(uint8_t* HWY_RESTRICT window, const uint8_t* add, const uint8_t* remove,
+                 uint64_t* HWY_RESTRICT groups, uint32_t group) {
   const hn::ScalableTag<uint8_t> d8;
   const hn::Repartition<uint64_t, decltype(d8)> d64;
   const size_t n = hn::Lanes(d8);
+  auto below = hn::Zero(d64);
   for (size_t i = 0; i < 256; i += n) {
     auto v = hn::Load(d8, window + i);
     if (remove != nullptr) v = hn::Sub(v, hn::LoadU(d8, remove + i));
     if (add != nullptr) v = hn::Add(v, hn::LoadU(d8, add + i));
     hn::Store(v, d8, window + i);
-    hn::StoreU(hn::SumsOf8(v), d64, groups + i / 8);
+    const auto sums = hn::SumsOf8(v);
+    hn::StoreU(sums, d64, groups + i / 8);
+    const size_t before = group > i / 8 ? group - i / 8 : 0;  // lanes of groups before `group`
+    below = hn::Add(below, hn::IfThenElseZero(hn::FirstN(d64, before), sums));
   }
+  return hn::GetLane(hn::SumOfLanes(d64, below));
 }
 
 #endif
@@ -83,8 +100,12 @@ void WindowHistogramRowOfTarget(const uint8_t* columns, uint8_t* out, int64_t wi
                                 int64_t rows, float fraction) {
   HWY_ALIGN uint8_t window[256] = {};
   HWY_ALIGN uint64_t groups[32];
+  uint32_t group = 0;  // where the previous pixel's value was found
+  uint64_t below = 0;
   const int64_t first_right = std::min(width - 1, radius);
-  for (int64_t j = 0; j <= first_right; ++j) Combine(window, columns + j * 256, nullptr, groups);
+  for (int64_t j = 0; j <= first_right; ++j) {
+    below = Combine(window, columns + j * 256, nullptr, groups, group);
+  }
   for (int64_t x = 0; x < width; ++x) {
     const int64_t left = std::max<int64_t>(0, x - radius);
     const int64_t right = std::min(width - 1, x + radius);
@@ -94,9 +115,11 @@ void WindowHistogramRowOfTarget(const uint8_t* columns, uint8_t* out, int64_t wi
       const uint8_t* remove = x - radius > 0 ? columns + (x - radius - 1) * 256 : nullptr;
       const uint8_t* add =
           right == width - 1 && right - left < 2 * radius ? nullptr : columns + right * 256;
-      Combine(window, add, remove, groups);
+      below = Combine(window, add, remove, groups, group);
     }
-    const uint32_t v = Scan(window, groups, TargetOf((right - left + 1) * rows, fraction));
+    const uint32_t target = TargetOf((right - left + 1) * rows, fraction);
+    const uint32_t v = Scan(window, groups, group, below, target);
+    if (v != kNone) group = v / 8;
     out[x] = static_cast<uint8_t>(v);  // none gives 256, whose low byte is 0
   }
 }
