@@ -1,0 +1,88 @@
+// The sliding 8 x 8 DCT denoiser and its colour forms. The transforms themselves live in
+// simd/dct8_hwy.cpp; this file checks arguments, keeps the unfiltered border and splits images
+// into planes.
+#include <cstdint>
+#include <cstring>
+
+#include "simd/dct8.h"
+#include "tessarofx/Denoise.h"
+
+void DCT8X81D(const float* in, float* out, bool inverse) {
+  if (!in || !out) return;
+  tfx::Dct8(in, out, inverse);
+}
+
+void DCT8X82D(const float* in, float* out, bool inverse) {
+  if (!in || !out) return;
+  tfx::Dct8x8(in, out, inverse);
+}
+
+void DCT8X82DR(const float* rows, float* out) {
+  if (!rows || !out) return;
+  tfx::Dct8x8Columns(rows, out);
+}
+
+void dct_Denosing(const unsigned char* src, unsigned char* dst, int width, int height, int stride,
+                  float sigma) {
+  if (!src || !dst || width < 1 || height < 1 || stride < width) return;
+  // 3 * sigma rounds to the same float whether formed in float or in double.
+  const float threshold = 3.0f * sigma;
+  const bool blocks = width > 8 && height > 8;
+  if (blocks && !tfx::DctDenoisePlane(src, dst, width, height, stride, threshold)) return;
+  if (dst == src) return;
+  // The last 8 rows and columns keep their source pixels although blocks covered some of them.
+  const int blockRows = blocks ? height - 8 : 0;
+  const int blockColumns = blocks ? width - 8 : 0;
+  for (int y = 0; y < height; ++y) {
+    const ptrdiff_t row = static_cast<ptrdiff_t>(y) * stride;
+    const int from = y < blockRows ? blockColumns : 0;
+    std::memcpy(dst + row + from, src + row + from, static_cast<size_t>(width - from));
+  }
+}
+
+namespace {
+
+// An image whose header describes its buffer: 24 or 32 bits, rows no shorter than the pixels
+// they hold, and 8-bit planes of its size whose row lengths fit the header's 32-bit fields.
+bool Denoisable(const CxImage* image) {
+  if (!image || !image->GetBits()) return false;
+  const uint64_t width = image->GetWidth(), height = image->GetHeight();
+  const uint32_t bpp = image->GetBpp();
+  if (width == 0 || height == 0 || (bpp != 24 && bpp != 32)) return false;
+  if (width > (UINT32_MAX - 31) / 32) return false;
+  return image->GetEffWidth() >= width * (bpp / 8) &&
+         uint64_t{image->GetEffWidth()} * height == image->GetSize();
+}
+
+// Splits `image` into three planes (and alpha), denoises the three, and recombines them.
+CxImage* DenoisePlanes(CxImage* image, float strength, bool hsl) {
+  if (!Denoisable(image) || strength == 0.0f) return image;
+  const unsigned width = image->GetWidth(), height = image->GetHeight();
+  CxImage planes[4];
+  for (CxImage& plane : planes) {
+    if (!plane.Create(width, height, 8, IPF_RGB)) return image;
+  }
+  const bool split = hsl ? image->SplitHSLA(&planes[0], &planes[1], &planes[2], &planes[3])
+                         : image->SplitRGBA(&planes[0], &planes[1], &planes[2], &planes[3]);
+  if (!split) return image;
+  // The product is formed in double, as the strength scale is a double constant.
+  const float sigma = static_cast<float>(strength * 0.15);
+  const int stride = static_cast<int>(planes[0].GetEffWidth());
+  for (int i = 0; i < 3; ++i) {
+    uint8_t* bits = planes[i].GetBits();
+    dct_Denosing(bits, bits, static_cast<int>(width), static_cast<int>(height), stride, sigma);
+  }
+  image->Combine(&planes[0], &planes[1], &planes[2], &planes[3], hsl ? 1 : 0);
+  return image;
+}
+
+}  // namespace
+
+CxImage* deNoiseRGB(CxImage* image, float strength) {
+  return DenoisePlanes(image, strength, false);
+}
+
+// Hue and saturation are filtered like lightness.
+CxImage* deNoiseLumiance(CxImage* image, float strength) {
+  return DenoisePlanes(image, strength, true);
+}

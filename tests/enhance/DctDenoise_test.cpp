@@ -1,0 +1,357 @@
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <cstdint>
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "support/EveryTarget.h"
+#include "support/ImageBuilders.h"
+#include "tessarofx/Denoise.h"
+
+namespace {
+
+using tfx_test::ForEveryTarget;
+using tfx_test::Image;
+using tfx_test::NoiseBytes;
+using tfx_test::NoiseImage;
+
+// ---- Textbook transforms in double ------------------------------------------------------------
+
+// c(k) cos((2n + 1) k pi / 16) at [k][n].
+const std::vector<double>& Basis() {
+  static const std::vector<double> basis = [] {
+    std::vector<double> b(64);
+    for (int i = 0; i < 64; ++i) {
+      const int k = i / 8, n = i % 8;
+      b[i] = (k == 0 ? std::sqrt(0.125) : 0.5) * std::cos((2 * n + 1) * k * 3.14159265358979 / 16);
+    }
+    return b;
+  }();
+  return basis;
+}
+
+// 8 values `step` apart, in place.
+void Textbook(double* v, bool inverse, int step = 1) {
+  const std::vector<double>& basis = Basis();
+  double out[8] = {};
+  for (int k = 0; k < 8; ++k) {
+    for (int n = 0; n < 8; ++n) out[k] += basis[inverse ? n * 8 + k : k * 8 + n] * v[n * step];
+  }
+  for (int k = 0; k < 8; ++k) v[k * step] = out[k];
+}
+
+void Textbook2D(double* block, bool inverse, bool rows = true) {
+  for (int r = 0; rows && r < 8; ++r) Textbook(block + 8 * r, inverse);
+  for (int c = 0; c < 8; ++c) Textbook(block + c, inverse, 8);
+}
+
+TEST(DctTransform, MatchesTheTextbookTransformInPlaceAndOnEveryTarget) {
+  const std::vector<uint8_t> bytes = NoiseBytes(64 * 8, 3);
+  std::vector<float> input(bytes.begin(), bytes.end());
+  for (size_t i = 0; i < input.size(); i += 3) input[i] = -input[i] * 7.5f;
+  std::vector<float> firstTarget;
+  ForEveryTarget([&] {
+    std::vector<float> all;
+    for (size_t b = 0; b < input.size(); b += 64) {
+      const float* in = &input[b];
+      // 1-D forward and inverse, 2-D forward and inverse, columns of row transforms.
+      for (int kind = 0; kind < 5; ++kind) {
+        SCOPED_TRACE(kind);
+        const bool inverse = kind % 2 == 1;
+        const int n = kind < 2 ? 8 : 64;
+        double l1 = 0;
+        for (int i = 0; i < n; ++i) l1 += std::abs(in[i]);
+        std::vector<double> expected(in, in + 64);
+        float out[64], inPlace[64];
+        std::memcpy(inPlace, in, sizeof(inPlace));
+        if (kind < 2) {
+          Textbook(expected.data(), inverse);
+          DCT8X81D(in, out, inverse);
+          DCT8X81D(inPlace, inPlace, inverse);
+        } else if (kind < 4) {
+          Textbook2D(expected.data(), inverse);
+          DCT8X82D(in, out, inverse);
+          DCT8X82D(inPlace, inPlace, inverse);
+        } else {
+          Textbook2D(expected.data(), false, false);
+          DCT8X82DR(in, out);
+          DCT8X82DR(inPlace, inPlace);
+        }
+        // The float constants are off by up to 4e-7 relative and each output sums at most 64
+        // products: 2e-6 of the L1 norm bounds the error, and any wrong term is off by more.
+        for (int i = 0; i < n; ++i) ASSERT_NEAR(expected[i], out[i], 2e-6 * l1) << i;
+        EXPECT_EQ(std::memcmp(out, inPlace, n * sizeof(float)), 0);
+        all.insert(all.end(), out, out + n);
+      }
+    }
+    if (firstTarget.empty()) firstTarget = all;
+    EXPECT_EQ(std::memcmp(all.data(), firstTarget.data(), all.size() * sizeof(float)), 0);
+  });
+}
+
+// ---- The denoiser against full 2-D transforms per block ---------------------------------------
+
+struct Plane {
+  int width, height, stride;
+  std::vector<uint8_t> bytes;
+  uint8_t& at(int x, int y) { return bytes[size_t(y) * stride + x]; }
+};
+
+// Ramps that wrap every 216 levels with noise of about +-24 on them, so that coefficients spread
+// around any threshold and the clamp to 0..255 is reached; row padding is noise.
+Plane NoisyRamp(int width, int height, int stride, uint32_t salt) {
+  Plane p{width, height, stride, NoiseBytes(size_t(stride) * height, salt)};
+  for (int y = 0; y < height; ++y) {
+    for (int x = 0; x < width; ++x) {
+      p.at(x, y) =
+          static_cast<uint8_t>(std::clamp((4 * x + 2 * y) % 216 + p.at(x, y) / 5 - 24, 0, 255));
+    }
+  }
+  return p;
+}
+
+std::vector<uint8_t> Denoised(const Plane& p, float sigma) {
+  std::vector<uint8_t> out(p.bytes.size(), 0xA5);
+  dct_Denosing(p.bytes.data(), out.data(), p.width, p.height, p.stride, sigma);
+  return out;
+}
+
+// Every block transformed in double, thresholded, inverted and averaged over the pixels it
+// covers. Float rounding may land a mean on either side of an integer it lies within 1e-3 of,
+// and may flip a coefficient within 1e-3 of the threshold: pixels under such a block are not
+// judged. Border pixels must be the source's. Returns the number of such blocks.
+int ExpectMatchesReference(Plane p, float sigma, const std::vector<uint8_t>& out) {
+  const int w = p.width, h = p.height;
+  const double threshold = 3.0f * sigma;
+  std::vector<double> sum(size_t(w) * h, 0.0), weight(size_t(w) * h, 0.0);
+  std::vector<bool> unsure(size_t(w) * h, false);
+  int unsureBlocks = 0;
+  for (int by = 0; by + 8 < h; ++by) {
+    for (int bx = 0; bx + 8 < w; ++bx) {
+      double block[64];
+      for (int i = 0; i < 64; ++i) block[i] = p.at(bx + i % 8, by + i / 8);
+      Textbook2D(block, false);
+      bool near = false;
+      for (double& c : block) {
+        near = near || std::abs(std::abs(c) - threshold) < 1e-3;
+        if (std::abs(c) < threshold) c = 0;
+      }
+      unsureBlocks += near;
+      Textbook2D(block, true);
+      for (int i = 0; i < 64; ++i) {
+        const size_t at = size_t(by + i / 8) * w + bx + i % 8;
+        sum[at] += block[i];
+        weight[at] += 1;
+        if (near) unsure[at] = true;
+      }
+    }
+  }
+  const auto byte = [](double v) { return static_cast<int>(std::clamp(v, 0.0, 255.0)); };
+  for (int y = 0; y < h; ++y) {
+    for (int x = 0; x < w; ++x) {
+      const int actual = out[size_t(y) * p.stride + x];
+      const size_t i = size_t(y) * w + x;
+      if (y >= h - 8 || x >= w - 8) {
+        EXPECT_EQ(actual, p.at(x, y)) << "border pixel " << x << "," << y;
+      } else if (!unsure[i]) {
+        const double mean = sum[i] / weight[i];
+        EXPECT_TRUE(actual == byte(mean - 1e-3) || actual == byte(mean + 1e-3))
+            << "pixel " << x << "," << y << ": " << actual << ", mean " << mean;
+      }
+    }
+  }
+  return unsureBlocks;
+}
+
+TEST(DctDenoise, AgreesWithFullBlockTransformsWithinFloatRounding) {
+  const Plane planes[] = {NoisyRamp(37, 29, 40, 11), NoisyRamp(9, 26, 9, 13),
+                          NoisyRamp(27, 9, 27, 14), NoisyRamp(11, 530, 11, 15),
+                          NoisyRamp(9, 9, 9, 16)};  // one block: only pixel (0, 0) filtered
+  int unsure = 0, blocks = 0;
+  for (const Plane& p : planes) {
+    for (const float sigma : {0.01f, 2.5f, 9.0f, 30.0f, 400.0f}) {
+      SCOPED_TRACE(std::to_string(p.width) + "x" + std::to_string(p.height) + ", sigma " +
+                   std::to_string(sigma));
+      unsure += ExpectMatchesReference(p, sigma, Denoised(p, sigma));
+      blocks += (p.width - 8) * (p.height - 8);
+    }
+  }
+  // Ties are rare (a block sum that lands on the threshold); were they common, little would be
+  // judged.
+  EXPECT_LT(unsure, blocks / 100);
+}
+
+TEST(DctDenoise, GivesTheSameBytesOnEveryTargetInPlaceOrNot) {
+  // Heights around every vector length's group boundaries and across bands of block rows, rows
+  // with and without padding.
+  std::vector<Plane> planes;
+  for (int h = 9; h <= 44; ++h) planes.push_back(NoisyRamp(9 + h % 5, h, 9 + h % 5 + h % 2, h));
+  for (const int h : {70, 96, 264, 530}) planes.push_back(NoisyRamp(h / 20 + 9, h, h / 20 + 12, h));
+  std::vector<std::vector<uint8_t>> firstTarget;
+  ForEveryTarget([&] {
+    std::vector<std::vector<uint8_t>> all;
+    for (const Plane& p : planes) {
+      // With sigma 0 every block comes back whole, so each mean is its source pixel up to
+      // rounding, and truncation shows any change in the order of the float additions.
+      for (const float sigma : {0.0f, 6.0f}) {
+        SCOPED_TRACE(std::to_string(p.width) + "x" + std::to_string(p.height) + ", sigma " +
+                     std::to_string(sigma));
+        all.push_back(Denoised(p, sigma));
+        std::vector<uint8_t> inPlace = p.bytes;
+        dct_Denosing(inPlace.data(), inPlace.data(), p.width, p.height, p.stride, sigma);
+        for (size_t i = 0; i < inPlace.size(); ++i) {
+          // Padding stays as it was: the source's in place, the filler in the copy.
+          const bool padding = int(i % p.stride) >= p.width;
+          ASSERT_EQ(inPlace[i], padding ? p.bytes[i] : all.back()[i]) << i;
+          if (padding) {
+            ASSERT_EQ(all.back()[i], 0xA5) << i;
+          }
+        }
+      }
+    }
+    if (firstTarget.empty()) firstTarget = all;
+    EXPECT_TRUE(all == firstTarget);
+  });
+}
+
+TEST(DctDenoise, KeepsAFlatPlaneUnlessTheThresholdPassesItsDcTerm) {
+  // A flat plane of v has one coefficient, the DC term 8 v. 3 sigma = 8 v exactly when v is a
+  // multiple of 3 (sigma = 8 v / 3 is then an integer); it is kept, being not below. In float the
+  // term is 8 v (1 + 1.3e-7): the rounded constant sqrt(1/8) is a little large.
+  const int w = 20, h = 18;
+  int atDc = 0;
+  for (int v = 0; v < 256; ++v) {
+    SCOPED_TRACE(v);
+    const Plane p{w, h, w, std::vector<uint8_t>(size_t(w) * h, uint8_t(v))};
+    EXPECT_EQ(Denoised(p, v % 3 == 0 ? 8.0f * v / 3 : 0.5f * v), p.bytes);
+    // A threshold of exactly the float DC term keeps it too: only what is below goes.
+    float block[64];
+    std::fill(block, block + 64, float(v));
+    DCT8X82D(block, block, false);
+    float sigma = block[0] / 3;
+    while (3.0f * sigma < block[0]) sigma = std::nextafter(sigma, 1e9f);
+    if (3.0f * sigma == block[0]) {
+      EXPECT_EQ(Denoised(p, sigma), p.bytes);
+      ++atDc;
+    }
+    const std::vector<uint8_t> out = Denoised(p, 8.0f * v / 3 * 1.000001f);
+    for (size_t i = 0; i < out.size(); ++i) {
+      ASSERT_EQ(out[i], int(i / w) < h - 8 && int(i % w) < w - 8 ? 0 : v) << i;
+    }
+  }
+  EXPECT_GT(atDc, 100);
+}
+
+TEST(DctDenoise, LeavesBadInputAlone) {
+  const Plane p = NoisyRamp(16, 12, 16, 31);
+  struct Case {
+    bool nullSrc, nullDst;
+    int width, height, stride;
+  };
+  const Case bad[] = {{true, false, 16, 12, 16},  {false, true, 16, 12, 16},
+                      {false, false, 0, 12, 16},  {false, false, -3, 12, 16},
+                      {false, false, 16, 0, 16},  {false, false, 16, -1, 16},
+                      {false, false, 16, 12, 15}, {false, false, 16, 12, -16}};
+  for (const Case& c : bad) {
+    SCOPED_TRACE(std::to_string(c.width) + "x" + std::to_string(c.height) + " stride " +
+                 std::to_string(c.stride) + (c.nullSrc ? " null source" : "") +
+                 (c.nullDst ? " null destination" : ""));
+    std::vector<uint8_t> out(p.bytes.size(), 0xA5);
+    dct_Denosing(c.nullSrc ? nullptr : p.bytes.data(), c.nullDst ? nullptr : out.data(), c.width,
+                 c.height, c.stride, 10.0f);
+    EXPECT_EQ(out, std::vector<uint8_t>(p.bytes.size(), 0xA5));
+  }
+  // Planes narrower or shorter than 9 come back as they were, in place or copied.
+  for (const auto& [w, h] : {std::pair{8, 12}, std::pair{16, 8}, std::pair{1, 1}}) {
+    const Plane small = NoisyRamp(w, h, w, 32);
+    EXPECT_EQ(Denoised(small, 50.0f), small.bytes);
+    std::vector<uint8_t> inPlace = small.bytes;
+    dct_Denosing(inPlace.data(), inPlace.data(), w, h, w, 50.0f);
+    EXPECT_EQ(inPlace, small.bytes);
+  }
+}
+
+// ---- Colour images -----------------------------------------------------------------------------
+
+tagRGBQUAD Same(tagRGBQUAD c) { return c; }
+
+TEST(DctDenoise, FiltersThreeColourPlanesAndKeepsAlpha) {
+  const float strength = 60.0f, sigma = static_cast<float>(strength * 0.15);
+  struct Case {
+    unsigned bpp;
+    _ImagePixelFormat format;
+    bool hsl;
+  };
+  for (const Case c : {Case{32, IPF_BGRA, false}, Case{24, IPF_RGB, false},
+                       Case{32, IPF_RGBA, true}, Case{24, IPF_BGR, true}}) {
+    SCOPED_TRACE(std::to_string(c.bpp) + (c.hsl ? " bits, HSL" : " bits, RGB"));
+    const unsigned w = 27, h = 19;
+    Image image = NoiseImage(w, h, c.bpp, c.format, ((c.bpp * w + 31) >> 3) & ~3u, 41);
+    // Planes as the red, green and blue bytes of each pixel (hue, saturation and lightness).
+    std::vector<uint8_t> planes[3], alpha;
+    for (unsigned i = 0; i < w * h; ++i) {
+      const tagRGBQUAD q = image->GetPixelColor(i % w, i / w, true);
+      const tagRGBQUAD t = c.hsl ? CxImage::RGBtoHSL(q) : q;
+      planes[0].push_back(t.rgbRed);
+      planes[1].push_back(t.rgbGreen);
+      planes[2].push_back(t.rgbBlue);
+      alpha.push_back(q.rgbReserved);
+    }
+    for (auto& plane : planes) {
+      const std::vector<uint8_t> before = plane;
+      dct_Denosing(plane.data(), plane.data(), w, h, w, sigma);
+      EXPECT_NE(plane, before);  // hue and saturation change too
+    }
+    ASSERT_EQ(c.hsl ? deNoiseLumiance(image.get(), strength) : deNoiseRGB(image.get(), strength),
+              image.get());
+    for (unsigned i = 0; i < w * h; ++i) {
+      tagRGBQUAD expected = (c.hsl ? CxImage::HSLtoRGB
+                                   : Same)(tagRGBQUAD{planes[2][i], planes[1][i], planes[0][i], 0});
+      expected.rgbReserved = c.bpp == 32 ? alpha[i] : 0;
+      const tagRGBQUAD actual = image->GetPixelColor(i % w, i / w, true);
+      ASSERT_EQ(std::memcmp(&expected, &actual, 4), 0) << "pixel " << i;
+    }
+  }
+}
+
+TEST(DctDenoise, ReturnsImagesItCannotFilterUntouched) {
+  const Image bgra = NoiseImage(30, 20, 32, IPF_BGRA, 120, 51);
+  const Image grey = NoiseImage(30, 20, 8, IPF_Gray8, 32, 52);
+  const Image rgb16 = NoiseImage(30, 20, 16, IPF_RGB, 60, 53);
+  CxImage empty;
+  // Headers that lie about a small buffer: rows shorter than their pixels, and a size past
+  // 32 bits (the stored size wraps).
+  std::vector<uint8_t> small(30 * 20 * 4, 7);
+  uint8_t* smallBits = small.data();
+  CxImage narrowStride(&smallBits, 30, 20, 32, 100, IPF_BGRA);
+  CxImage huge(&smallBits, 70000, 70000, 32, 280000, IPF_BGRA);
+  struct Case {
+    CxImage* image;
+    float strength;
+    size_t bytes;  // of the buffer, compared before and after
+  };
+  const Case cases[] = {{bgra.get(), 0.0f, bgra->GetSize()},
+                        {grey.get(), 50.0f, 640},
+                        {rgb16.get(), 50.0f, 1200},
+                        {&empty, 50.0f, 0},
+                        {&narrowStride, 50.0f, small.size()},
+                        {&huge, 50.0f, small.size()},
+                        {nullptr, 50.0f, 0}};
+  for (const Case& c : cases) {
+    for (auto* denoise : {deNoiseRGB, deNoiseLumiance}) {
+      SCOPED_TRACE(&c - cases);
+      uint8_t* bits = c.image ? c.image->GetBits() : nullptr;
+      const std::vector<uint8_t> before(bits, bits + c.bytes);
+      EXPECT_EQ(denoise(c.image, c.strength), c.image);
+      if (c.image) {
+        EXPECT_EQ(c.image->GetBits(), bits);
+      }
+      EXPECT_TRUE(std::equal(before.begin(), before.end(), bits));
+    }
+  }
+}
+
+}  // namespace
