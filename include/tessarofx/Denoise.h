@@ -35,6 +35,7 @@ TFX_API CxImage* deNoiseLumiance(CxImage* image, float strength);
 // the stored variance byte v (fastWindowVarianceFilter, so wrapped) over a window of
 // `windowSize` (radius (windowSize - 1) / 2), each pixel p becomes p k + m (1 - k) with
 // k = v / (v + noise), truncated into 0..255. Noise 0 keeps every pixel whose variance byte is
-// non-zero; where it is 0 the mean is written.
+// non-zero; where it is 0 the mean is written. A null plane, a size or window size below 1, or a
+// plane over 2^31 - 1 bytes does nothing.
 TFX_API void channelDenoise(unsigned char* plane, int width, int height, int windowSize,
                             float noise);
