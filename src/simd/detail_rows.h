@@ -1,0 +1,19 @@
+// Row kernels of the detail and haze filters, compiled once per instruction set and picked at the
+// time of each call (hwy::SetSupportedTargetsForTest included).
+//
+// Every kernel works on 4-byte pixels, rewrites bytes 0..2 and keeps byte 3, and gives the bytes
+// of the plain per-pixel form beside its caller in enhance/: the same float and double
+// expressions in the same order. Each result v becomes 0 below 0, else trunc(min(v, 255)).
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+namespace tfx {
+
+// Haze removal: (c - L) / (1 - L / air), with L = min(dark[i], trunc(mean[i] * k)) and
+// 0 <= k <= 0.9.
+void HazeStretchRow(uint8_t* pixels, const uint8_t* dark, const uint8_t* mean, size_t count,
+                    float k, float air);
+
+}  // namespace tfx

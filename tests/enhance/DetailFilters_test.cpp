@@ -1,0 +1,241 @@
+#include "tessarofx/DetailFilters.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <cstdint>
+#include <cstring>
+#include <functional>
+#include <limits>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "support/EveryTarget.h"
+#include "support/ImageBuilders.h"
+#include "tessarofx/Blur.h"
+
+namespace {
+
+using tfx_test::Image;
+using tfx_test::NoiseImage;
+using tfx_test::SameBuffer;
+
+// ---- references written from the definitions, over one packed run of pixels ------------------
+
+using Pixels = std::vector<uint8_t>;
+
+uint8_t ToByte(float v) { return v < 0.0f ? 0 : uint8_t(int(std::min(v, 255.0f))); }
+
+// The image's rows without their padding, and back.
+Pixels Packed(const CxImage& image) {
+  const size_t row = size_t(image.GetWidth()) * image.GetBpp() / 8;
+  Pixels p(row * image.GetHeight());
+  for (size_t y = 0; y < image.GetHeight(); ++y) {
+    std::memcpy(&p[y * row], image.GetBits() + y * image.GetEffWidth(), row);
+  }
+  return p;
+}
+
+Pixels Unpacked(const CxImage& image, const Pixels& p) {
+  const size_t row = size_t(image.GetWidth()) * image.GetBpp() / 8;
+  Pixels all(image.GetBits(), image.GetBits() + image.GetSize());
+  for (size_t y = 0; y < image.GetHeight(); ++y) {
+    std::memcpy(&all[y * image.GetEffWidth()], &p[y * row], row);
+  }
+  return all;
+}
+
+// Every colour byte (not a fourth byte) through fn(index).
+template <class Fn>
+Pixels MapColour(Pixels p, int ch, Fn fn) {
+  for (size_t i = 0; i < p.size(); ++i) {
+    if (i % size_t(ch) < 3) p[i] = fn(i);
+  }
+  return p;
+}
+
+// Each reference takes the packed pixels, width, height, bytes per pixel and strength.
+Pixels RefDehaze(const Pixels& src, int w, int h, int ch, float s) {
+  const float t = s / 100;
+  if (s < 0) {
+    // The formula, with its row term y / h (integer division), and the promise that adding
+    // haze never darkens.
+    return MapColour(src, ch, [&](size_t i) {
+      const float tRow = float(int(i / size_t(ch)) / w / h) + t;
+      return std::max(src[i], ToByte((src[i] - 255 * tRow) / (1 - tRow)));
+    });
+  }
+  const size_t n = size_t(w) * size_t(h);
+  Pixels M(n), Mave(n);
+  int maxRGB = 0;
+  uint64_t sum = 0;
+  for (size_t i = 0; i < n; ++i) {
+    const uint8_t* p = &src[i * size_t(ch)];
+    M[i] = std::min({p[0], p[1], p[2]});
+    maxRGB = std::max<int>(maxRGB, std::max({p[0], p[1], p[2]}));
+    sum += M[i];
+  }
+  fastWindowAverageFilter(M.data(), Mave.data(), w, h, 7);
+  const float k = std::min(t * 1.6f * float(sum / n) / 255, 0.9f);
+  const float A = 0.5f * float(*std::max_element(Mave.begin(), Mave.end()) + maxRGB);
+  return MapColour(src, ch, [&](size_t i) {
+    const size_t p = i / size_t(ch);
+    const int L = std::min<int>(M[p], uint8_t(int(Mave[p] * k)));
+    return ToByte((src[i] - L) / (1 - L / A));
+  });
+}
+
+// ---- images -----------------------------------------------------------------------------------
+
+Image Noise(unsigned w, unsigned h, unsigned bpp, uint32_t salt, unsigned padding = 0) {
+  return NoiseImage(w, h, bpp, bpp == 24 ? IPF_BGR : IPF_BGRA, w * bpp / 8 + padding, salt);
+}
+
+// Noise squeezed into 64..191, so that no filter clips most of it.
+Image Mid(Image image) {
+  for (uint32_t i = 0; i < image->GetSize(); ++i)
+    image->GetBits()[i] = 64 + image->GetBits()[i] / 2;
+  return image;
+}
+
+using Filter = std::function<CxImage*(CxImage*, float)>;
+
+struct Named {
+  const char* name;
+  Filter filter;
+  Pixels (*ref)(const Pixels&, int, int, int, float);
+  std::vector<float> strengths;  // both signs, clipping, and each one's thresholds
+  bool large;                    // also on 128 x 24 pixels
+};
+
+const Named kFilters[] = {
+    {"dehaze", dehaze, RefDehaze, {30, 100, 250, -30, -100, -1000}, true},
+};
+
+// ---- every filter ------------------------------------------------------------------------------
+
+TEST(DetailFilters, MatchTheirDefinitionsOnEveryTarget) {
+  // Vector bodies and tails; 128 x 24 gives dehaze's divisions enough pixels to show a rounding
+  // that differs. Padded rows are walked one by one: their pixels are those of the packed rows,
+  // and the padding stays.
+  const unsigned sizes[][3] = {{3, 3, 0}, {5, 4, 3}, {37, 11, 0}, {20, 17, 7}, {128, 24, 0}};
+  tfx_test::ForEveryTarget([&] {
+    for (const Named& f : kFilters) {
+      for (const float s : f.strengths) {
+        for (const auto& size : sizes) {
+          if (size[0] == 128 && !f.large) continue;
+          for (const unsigned bpp : {24u, 32u}) {
+            SCOPED_TRACE(testing::Message() << f.name << ' ' << s << ' ' << size[0] << 'x'
+                                            << size[1] << '+' << size[2] << " bpp " << bpp);
+            Image image = Mid(Noise(size[0], size[1], bpp, 5, size[2]));
+            const Pixels expected = Unpacked(
+                *image, f.ref(Packed(*image), int(size[0]), int(size[1]), int(bpp / 8), s));
+            f.filter(image.get(), s);
+            ASSERT_EQ(Pixels(image->GetBits(), image->GetBits() + image->GetSize()), expected);
+          }
+        }
+      }
+    }
+  });
+}
+
+TEST(DetailFilters, LeaveTheImageAloneWhereTheyDoNothing) {
+  const float nan = std::numeric_limits<float>::quiet_NaN(),
+              inf = std::numeric_limits<float>::infinity();
+  std::vector<std::pair<std::string, std::function<void(CxImage*)>>> cases;
+  for (const Named& f : kFilters) {
+    for (const float s : {0.0f, -0.0f, nan, inf, -inf}) {
+      cases.push_back(
+          {f.name + (" " + std::to_string(s)), [&f, s](CxImage* i) { f.filter(i, s); }});
+    }
+  }
+  for (const auto& [name, run] : cases) {
+    SCOPED_TRACE(name);
+    const Image original = Noise(9, 7, 32, 3);
+    const Image image = tfx_test::Clone(*original);
+    run(image.get());
+    EXPECT_TRUE(SameBuffer(*original, *image));
+  }
+}
+
+TEST(DetailFilters, ReturnImagesTheyCannotWalkUntouched) {
+  std::vector<uint8_t> buffer(64, 0x5a);
+  uint8_t* bits = buffer.data();
+  CxImage empty;
+  std::unique_ptr<CxImage> cases[] = {
+      std::make_unique<CxImage>(&bits, 8u, 8u, 8u, 8u, IPF_Gray8),
+      std::make_unique<CxImage>(&bits, 4u, 8u, 16u, 8u, IPF_BGR),
+      std::make_unique<CxImage>(&bits, 4u, 4u, 32u, 12u, IPF_BGRA),  // stride below a row
+      // 65536 rows of 65536 bytes: the 32-bit size wraps to 0.
+      std::make_unique<CxImage>(&bits, 16384u, 65536u, 32u, 65536u, IPF_BGRA),
+      std::make_unique<CxImage>(&bits, 0u, 4u, 32u, 16u, IPF_BGRA),
+  };
+  for (const auto& image : cases) {
+    for (const Named& f : kFilters) {
+      SCOPED_TRACE(testing::Message() << f.name << ' ' << image->GetWidth() << 'x'
+                                      << image->GetHeight() << " bpp " << image->GetBpp());
+      EXPECT_EQ(f.filter(image.get(), 60.0f), image.get());
+      EXPECT_EQ(f.filter(image.get(), -60.0f), image.get());
+      EXPECT_EQ(f.filter(nullptr, 60.0f), nullptr);
+      EXPECT_EQ(f.filter(&empty, 60.0f), &empty);
+    }
+    uint32_t maxRGB = 7, maxDark = 7;
+    EXPECT_EQ(getMinDarkChannel(image.get(), &maxRGB, &maxDark), nullptr);
+    EXPECT_EQ(maxRGB + maxDark, 0u);
+  }
+  EXPECT_TRUE(std::all_of(buffer.begin(), buffer.end(), [](uint8_t v) { return v == 0x5a; }));
+}
+
+// ---- single filters ----------------------------------------------------------------------------
+
+TEST(Dehaze, AddingHazeNeverDarkens) {
+  // Some strengths, -99.9 among them, round (255 - 255 t) / (1 - t) just below 255 in float.
+  const Image original = Noise(16, 16, 32, 12);
+  std::memset(original->GetBits(), 255, 16);
+  for (float s = -0.05f; s > -200.0f; s *= 1.37f) {
+    for (const float strength : {s, -99.9f}) {
+      SCOPED_TRACE(strength);
+      const Image image = tfx_test::Clone(*original);
+      dehaze(image.get(), strength);
+      for (uint32_t i = 0; i < image->GetSize(); ++i) {
+        ASSERT_GE(image->GetBits()[i], original->GetBits()[i]) << i;
+      }
+    }
+  }
+}
+
+TEST(Dehaze, PlanesHoldTheDarkChannelAndTheHazeLevel) {
+  // Pixels (B, G, R, A): alpha never counts.
+  std::vector<uint8_t> px = {10, 20, 30, 255, 200, 90, 120, 0, 5, 5, 5, 9, 70, 60, 80, 1};
+  uint8_t* bits = px.data();
+  CxImage image(&bits, 2, 2, 32, 8, IPF_BGRA);
+  uint32_t maxRGB = 0, maxDark = 0;
+  std::unique_ptr<uint8_t[]> dark(getMinDarkChannel(&image, &maxRGB, &maxDark));
+  ASSERT_NE(dark, nullptr);
+  EXPECT_EQ(Pixels(dark.get(), dark.get() + 4), (Pixels{10, 90, 5, 60}));
+  EXPECT_EQ(maxRGB, 200u);
+  EXPECT_EQ(maxDark, 90u);
+  dark.reset(getMinDarkChannel(&image, nullptr, nullptr));  // the out-values are optional
+  EXPECT_NE(dark, nullptr);
+  EXPECT_EQ(getMinDarkChannel(nullptr, &maxRGB, &maxDark), nullptr);
+  EXPECT_EQ(maxRGB + maxDark, 0u);
+
+  const uint8_t d[] = {100, 100, 100, 0, 255, 7}, mean[] = {50, 200, 255, 255, 255, 1};
+  std::unique_ptr<uint8_t[]> L(calL(d, mean, 3, 2, 0.9f));
+  ASSERT_NE(L, nullptr);
+  // 0.9 * 255 = 229.5 truncates to 229, 0.9 * 1 to 0.
+  EXPECT_EQ(Pixels(L.get(), L.get() + 6), (Pixels{45, 100, 100, 0, 229, 0}));
+  // The product keeps its low byte: 255 * 1.2 = 306 -> 50; -255 -> 1.
+  L.reset(calL(d, mean, 3, 2, 1.2f));
+  EXPECT_EQ(L[4], 50);
+  L.reset(calL(d, mean, 3, 2, -1.0f));
+  EXPECT_EQ(L[4], 1);
+  EXPECT_EQ(calL(nullptr, mean, 3, 2, 1.0f), nullptr);
+  EXPECT_EQ(calL(d, nullptr, 3, 2, 1.0f), nullptr);
+  EXPECT_EQ(calL(d, mean, 0, 2, 1.0f), nullptr);
+  EXPECT_EQ(calL(d, mean, 3, -2, 1.0f), nullptr);
+}
+
+}  // namespace
