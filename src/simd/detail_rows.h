@@ -16,4 +16,12 @@ namespace tfx {
 void HazeStretchRow(uint8_t* pixels, const uint8_t* dark, const uint8_t* mean, size_t count,
                     float k, float air);
 
+// Destination pixel i from the 4-neighbour Laplacian around pixel i of `centre`, a row of a
+// packed copy whose rows are `line` bytes apart: centre + lap * k. The caller points `dst` one
+// pixel right of `centre`'s column.
+void SharpenRow(const uint8_t* centre, ptrdiff_t line, uint8_t* dst, size_t count, float k);
+
+// Unsharp mask: c + (c - blurred) * k.
+void UnsharpRow(uint8_t* pixels, const uint8_t* blurred, size_t count, float k);
+
 }  // namespace tfx

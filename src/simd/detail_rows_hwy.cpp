@@ -87,6 +87,75 @@ void HazeStretchRowOfTarget(uint8_t* pixels, const uint8_t* dark, const uint8_t*
   StretchVectors(hn::CappedTag<uint32_t, 1>(), pixels, dark, mean, count, k, air, i);
 }
 
+// ---- sharpen -----------------------------------------------------------------------------------
+
+template <int kShift, class D>
+HWY_INLINE hn::Vec<D> SharpenChannel(D d, hn::Vec<D> c, hn::Vec<D> up, hn::Vec<D> left,
+                                     hn::Vec<D> right, hn::Vec<D> down, FloatOf<D> k) {
+  const hn::RebindToFloat<D> df;
+  const IntOf<D> centre = Channel<kShift>(d, c);
+  const IntOf<D> lap =
+      hn::Sub(hn::Sub(hn::Sub(hn::Sub(hn::ShiftLeft<2>(centre), Channel<kShift>(d, up)),
+                              Channel<kShift>(d, left)),
+                      Channel<kShift>(d, right)),
+              Channel<kShift>(d, down));
+  return ToByte(d, hn::Add(hn::ConvertTo(df, centre), hn::Mul(hn::ConvertTo(df, lap), k)));
+}
+
+template <class D>
+HWY_INLINE void SharpenVectors(D d, const uint8_t* centre, ptrdiff_t line, uint8_t* dst,
+                               size_t count, float k, size_t& i) {
+  const FloatOf<D> vk = hn::Set(hn::RebindToFloat<D>(), k);
+  const size_t n = hn::Lanes(d);
+  for (; i + n <= count; i += n) {
+    const uint8_t* c = centre + 4 * i;
+    const hn::Vec<D> mid = LoadPixels(d, c), up = LoadPixels(d, c - line),
+                     left = LoadPixels(d, c - 4), right = LoadPixels(d, c + 4),
+                     down = LoadPixels(d, c + line);
+    const hn::Vec<D> p = LoadPixels(d, dst + 4 * i);
+    const hn::Vec<D> out = Pack(d, p, SharpenChannel<0>(d, mid, up, left, right, down, vk),
+                                SharpenChannel<8>(d, mid, up, left, right, down, vk),
+                                SharpenChannel<16>(d, mid, up, left, right, down, vk));
+    hn::StoreU(out, d, reinterpret_cast<uint32_t*>(dst + 4 * i));
+  }
+}
+
+void SharpenRowOfTarget(const uint8_t* centre, ptrdiff_t line, uint8_t* dst, size_t count,
+                        float k) {
+  size_t i = 0;
+  SharpenVectors(hn::ScalableTag<uint32_t>(), centre, line, dst, count, k, i);
+  SharpenVectors(hn::CappedTag<uint32_t, 1>(), centre, line, dst, count, k, i);
+}
+
+// ---- unsharp mask ------------------------------------------------------------------------------
+
+template <int kShift, class D>
+HWY_INLINE hn::Vec<D> UnsharpChannel(D d, hn::Vec<D> p, hn::Vec<D> b, FloatOf<D> k) {
+  const hn::RebindToFloat<D> df;
+  const IntOf<D> c = Channel<kShift>(d, p);
+  const IntOf<D> diff = hn::Sub(c, Channel<kShift>(d, b));
+  return ToByte(d, hn::Add(hn::ConvertTo(df, c), hn::Mul(hn::ConvertTo(df, diff), k)));
+}
+
+template <class D>
+HWY_INLINE void UnsharpVectors(D d, uint8_t* pixels, const uint8_t* blurred, size_t count, float k,
+                               size_t& i) {
+  const FloatOf<D> vk = hn::Set(hn::RebindToFloat<D>(), k);
+  const size_t n = hn::Lanes(d);
+  for (; i + n <= count; i += n) {
+    const hn::Vec<D> p = LoadPixels(d, pixels + 4 * i), b = LoadPixels(d, blurred + 4 * i);
+    const hn::Vec<D> out = Pack(d, p, UnsharpChannel<0>(d, p, b, vk),
+                                UnsharpChannel<8>(d, p, b, vk), UnsharpChannel<16>(d, p, b, vk));
+    hn::StoreU(out, d, reinterpret_cast<uint32_t*>(pixels + 4 * i));
+  }
+}
+
+void UnsharpRowOfTarget(uint8_t* pixels, const uint8_t* blurred, size_t count, float k) {
+  size_t i = 0;
+  UnsharpVectors(hn::ScalableTag<uint32_t>(), pixels, blurred, count, k, i);
+  UnsharpVectors(hn::CappedTag<uint32_t, 1>(), pixels, blurred, count, k, i);
+}
+
 }  // namespace HWY_NAMESPACE
 }  // namespace detail_rows
 }  // namespace tfx
@@ -97,12 +166,22 @@ namespace tfx {
 namespace detail_rows {
 
 HWY_EXPORT(HazeStretchRowOfTarget);
+HWY_EXPORT(SharpenRowOfTarget);
+HWY_EXPORT(UnsharpRowOfTarget);
 
 }  // namespace detail_rows
 
 void HazeStretchRow(uint8_t* pixels, const uint8_t* dark, const uint8_t* mean, size_t count,
                     float k, float air) {
   HWY_DYNAMIC_DISPATCH(detail_rows::HazeStretchRowOfTarget)(pixels, dark, mean, count, k, air);
+}
+
+void SharpenRow(const uint8_t* centre, ptrdiff_t line, uint8_t* dst, size_t count, float k) {
+  HWY_DYNAMIC_DISPATCH(detail_rows::SharpenRowOfTarget)(centre, line, dst, count, k);
+}
+
+void UnsharpRow(uint8_t* pixels, const uint8_t* blurred, size_t count, float k) {
+  HWY_DYNAMIC_DISPATCH(detail_rows::UnsharpRowOfTarget)(pixels, blurred, count, k);
 }
 
 }  // namespace tfx

@@ -87,6 +87,46 @@ Pixels RefDehaze(const Pixels& src, int w, int h, int ch, float s) {
   });
 }
 
+Pixels RefSharpen(const Pixels& src, int w, int h, int ch, float a) {
+  if (ch != 4 || w < 3 || h < 3) return src;
+  Pixels out = src;
+  for (int y = 1; y < h - 1; ++y) {
+    for (int x = 1; x < w - 1; ++x) {
+      for (int j = 0; j < 3; ++j) {
+        const int i = y * w * 4 + (x - 1) * 4 + j;  // the copy, one pixel to the left
+        const int lap = 4 * src[i] - src[i - w * 4] - src[i - 4] - src[i + 4] - src[i + w * 4];
+        const float v = std::trunc(src[i] + lap * (a / 255));
+        out[size_t(y * w * 4 + x * 4 + j)] = uint8_t(std::clamp(v, 0.0f, 255.0f));
+      }
+    }
+  }
+  return out;
+}
+
+// gaussianBlur at the stride it expects, rows rounded up to 4 bytes.
+void Blur(Pixels& p, int w, int h, int ch, int radius) {
+  const size_t row = size_t(w * ch), stride = (row + 3) & ~size_t{3};
+  Pixels padded(stride * size_t(h));
+  for (size_t y = 0; y < size_t(h); ++y) std::memcpy(&padded[y * stride], &p[y * row], row);
+  gaussianBlur(padded.data(), w, h, ch, radius);
+  for (size_t y = 0; y < size_t(h); ++y) std::memcpy(&p[y * row], &padded[y * stride], row);
+}
+
+Pixels RefClarity(const Pixels& src, int w, int h, int ch, float a) {
+  Pixels blurred = src;
+  if (std::fabs(a) > 2 && std::fabs(a) < 254) Blur(blurred, w, h, ch, a > 0 ? int(0.5f * a) : 2);
+  return MapColour(src, ch,
+                   [&](size_t i) { return ToByte(src[i] + (src[i] - blurred[i]) * (a / 200)); });
+}
+
+Pixels RefDiffuse(const Pixels& src, int w, int h, int ch, float a) {
+  const double pi = 3.14159265358979323846;
+  const float gain = float(std::fabs(std::cos(-pi * a / 1440 + pi / 2)) + 1);
+  Pixels out = MapColour(src, ch, [&](size_t i) { return ToByte(src[i] * gain); });
+  if (a > 0) Blur(out, w, h, ch, 1);
+  return out;
+}
+
 // ---- images -----------------------------------------------------------------------------------
 
 Image Noise(unsigned w, unsigned h, unsigned bpp, uint32_t salt, unsigned padding = 0) {
@@ -112,6 +152,9 @@ struct Named {
 
 const Named kFilters[] = {
     {"dehaze", dehaze, RefDehaze, {30, 100, 250, -30, -100, -1000}, true},
+    {"sharpen", sharpen, RefSharpen, {255, 30, -80, 1e30f}, false},
+    {"clarity", clarity, RefClarity, {2.5f, 40, -40, 253, -3}, false},
+    {"diffuse", diffuse, RefDiffuse, {90, -300, 1440, 5000}, false},
 };
 
 // ---- every filter ------------------------------------------------------------------------------
@@ -150,6 +193,10 @@ TEST(DetailFilters, LeaveTheImageAloneWhereTheyDoNothing) {
       cases.push_back(
           {f.name + (" " + std::to_string(s)), [&f, s](CxImage* i) { f.filter(i, s); }});
     }
+  }
+  // Clarity blurs only for 2 < |amount| < 254; without a blur the values stay.
+  for (const float a : {1.0f, -1.0f, 2.0f, -2.0f, 254.0f, 300.0f}) {
+    cases.push_back({"clarity " + std::to_string(a), [a](CxImage* i) { clarity(i, a); }});
   }
   for (const auto& [name, run] : cases) {
     SCOPED_TRACE(name);
@@ -236,6 +283,19 @@ TEST(Dehaze, PlanesHoldTheDarkChannelAndTheHazeLevel) {
   EXPECT_EQ(calL(d, nullptr, 3, 2, 1.0f), nullptr);
   EXPECT_EQ(calL(d, mean, 0, 2, 1.0f), nullptr);
   EXPECT_EQ(calL(d, mean, 3, -2, 1.0f), nullptr);
+}
+
+TEST(Diffuse, At720DoublesAndBlursOnlyWhenPositive) {
+  const Image original = Noise(10, 9, 32, 6);
+  Pixels doubled = MapColour(Packed(*original), 4, [&](size_t i) {
+    return uint8_t(std::min(255, original->GetBits()[i] * 2));
+  });
+  const Image negative = tfx_test::Clone(*original), positive = tfx_test::Clone(*original);
+  diffuse(negative.get(), -720.0f);
+  EXPECT_EQ(Packed(*negative), doubled);
+  gaussianBlur(doubled.data(), 10, 9, 4, 1);
+  diffuse(positive.get(), 720.0f);
+  EXPECT_EQ(Packed(*positive), doubled);
 }
 
 }  // namespace
