@@ -24,4 +24,12 @@ void SharpenRow(const uint8_t* centre, ptrdiff_t line, uint8_t* dst, size_t coun
 // Unsharp mask: c + (c - blurred) * k.
 void UnsharpRow(uint8_t* pixels, const uint8_t* blurred, size_t count, float k);
 
+// The next `count` grain values of the ISO C reference generator, whose state `*state` carries
+// from call to call: per pixel one value skipped, then
+// float(sum of four * 5.28596089837e-05 - 3.46410161514 in double) * scale * 127.
+void GrainNoise(uint32_t* state, float scale, float* noise, size_t count);
+
+// c + noise[i], the same value on the three colour bytes of pixel i.
+void AddGrainRow(uint8_t* pixels, const float* noise, size_t count);
+
 }  // namespace tfx

@@ -156,6 +156,92 @@ void UnsharpRowOfTarget(uint8_t* pixels, const uint8_t* blurred, size_t count, f
   UnsharpVectors(hn::CappedTag<uint32_t, 1>(), pixels, blurred, count, k, i);
 }
 
+// ---- grain -------------------------------------------------------------------------------------
+
+constexpr uint32_t kMultiplier = 1103515245u;
+constexpr uint32_t kIncrement = 12345u;
+
+// The generator advanced `steps` times in one go: state * multiplier + increment.
+struct Jump {
+  uint32_t multiplier = 1;
+  uint32_t increment = 0;
+
+  explicit Jump(size_t steps) {
+    for (size_t s = 0; s < steps; ++s) {
+      multiplier *= kMultiplier;
+      increment = increment * kMultiplier + kIncrement;
+    }
+  }
+  uint32_t operator()(uint32_t state) const { return state * multiplier + increment; }
+};
+
+// Lanes in steps of doubles: lane l generates pixel i + l, from the state 5 l values ahead.
+template <class D64>
+HWY_INLINE void GrainVectors(D64 d64, uint32_t* state, float scale, float* noise, size_t count,
+                             size_t& i) {
+  const hn::Rebind<uint32_t, D64> du;
+  const hn::Rebind<int32_t, D64> di;
+  const hn::Rebind<float, D64> df;
+  using VU = hn::Vec<decltype(du)>;
+  const size_t n = hn::Lanes(d64);
+  if (i + n > count) return;
+  HWY_ALIGN uint32_t start[hn::MaxLanes(du)];
+  const Jump pixel(5);
+  start[0] = *state;
+  for (size_t l = 1; l < n; ++l) start[l] = pixel(start[l - 1]);
+  // After its five values a lane skips the pixels of the other lanes.
+  const Jump skip(5 * (n - 1));
+  const VU multiplier = hn::Set(du, kMultiplier), increment = hn::Set(du, kIncrement);
+  const VU skipMultiplier = hn::Set(du, skip.multiplier),
+           skipIncrement = hn::Set(du, skip.increment);
+  const auto next = [&](VU& s) {
+    s = hn::Add(hn::Mul(s, multiplier), increment);
+    return hn::BitCast(di, hn::And(hn::ShiftRight<16>(s), hn::Set(du, 32767u)));
+  };
+  VU s = hn::Load(du, start);
+  for (; i + n <= count; i += n) {
+    next(s);
+    const auto a = next(s);
+    const auto b = next(s);
+    const auto c = next(s);
+    const auto e = next(s);
+    const auto sum = hn::Add(hn::Add(hn::Add(a, b), c), e);
+    const auto normal = hn::Sub(hn::Mul(hn::PromoteTo(d64, sum), hn::Set(d64, 5.28596089837e-05)),
+                                hn::Set(d64, 3.46410161514));
+    const auto scaled =
+        hn::Mul(hn::Mul(hn::DemoteTo(df, normal), hn::Set(df, scale)), hn::Set(df, 127.0f));
+    hn::StoreU(scaled, df, noise + i);
+    s = hn::Add(hn::Mul(s, skipMultiplier), skipIncrement);
+  }
+  *state = hn::GetLane(s);
+}
+
+void GrainNoiseOfTarget(uint32_t* state, float scale, float* noise, size_t count) {
+  size_t i = 0;
+  GrainVectors(hn::ScalableTag<double>(), state, scale, noise, count, i);
+  GrainVectors(hn::CappedTag<double, 1>(), state, scale, noise, count, i);
+}
+
+template <class D>
+HWY_INLINE void AddGrainVectors(D d, uint8_t* pixels, const float* noise, size_t count, size_t& i) {
+  const hn::RebindToFloat<D> df;
+  const size_t n = hn::Lanes(d);
+  for (; i + n <= count; i += n) {
+    const hn::Vec<D> p = LoadPixels(d, pixels + 4 * i);
+    const FloatOf<D> v = hn::LoadU(df, noise + i);
+    const hn::Vec<D> out = Pack(d, p, ToByte(d, hn::Add(hn::ConvertTo(df, Channel<0>(d, p)), v)),
+                                ToByte(d, hn::Add(hn::ConvertTo(df, Channel<8>(d, p)), v)),
+                                ToByte(d, hn::Add(hn::ConvertTo(df, Channel<16>(d, p)), v)));
+    hn::StoreU(out, d, reinterpret_cast<uint32_t*>(pixels + 4 * i));
+  }
+}
+
+void AddGrainRowOfTarget(uint8_t* pixels, const float* noise, size_t count) {
+  size_t i = 0;
+  AddGrainVectors(hn::ScalableTag<uint32_t>(), pixels, noise, count, i);
+  AddGrainVectors(hn::CappedTag<uint32_t, 1>(), pixels, noise, count, i);
+}
+
 }  // namespace HWY_NAMESPACE
 }  // namespace detail_rows
 }  // namespace tfx
@@ -168,6 +254,8 @@ namespace detail_rows {
 HWY_EXPORT(HazeStretchRowOfTarget);
 HWY_EXPORT(SharpenRowOfTarget);
 HWY_EXPORT(UnsharpRowOfTarget);
+HWY_EXPORT(GrainNoiseOfTarget);
+HWY_EXPORT(AddGrainRowOfTarget);
 
 }  // namespace detail_rows
 
@@ -182,6 +270,14 @@ void SharpenRow(const uint8_t* centre, ptrdiff_t line, uint8_t* dst, size_t coun
 
 void UnsharpRow(uint8_t* pixels, const uint8_t* blurred, size_t count, float k) {
   HWY_DYNAMIC_DISPATCH(detail_rows::UnsharpRowOfTarget)(pixels, blurred, count, k);
+}
+
+void GrainNoise(uint32_t* state, float scale, float* noise, size_t count) {
+  HWY_DYNAMIC_DISPATCH(detail_rows::GrainNoiseOfTarget)(state, scale, noise, count);
+}
+
+void AddGrainRow(uint8_t* pixels, const float* noise, size_t count) {
+  HWY_DYNAMIC_DISPATCH(detail_rows::AddGrainRowOfTarget)(pixels, noise, count);
 }
 
 }  // namespace tfx

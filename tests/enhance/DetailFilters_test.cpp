@@ -127,6 +127,25 @@ Pixels RefDiffuse(const Pixels& src, int w, int h, int ch, float a) {
   return out;
 }
 
+// addNoiseFilter with a factor of 80.
+Pixels RefNoise(const Pixels& src, int, int, int ch, float a) {
+  uint32_t next = 0;
+  const auto rand = [&] {
+    next = next * 1103515245 + 12345;
+    return int((next / 65536) % 32768);
+  };
+  const float s = (a / 100) * (80.0f / 100);
+  Pixels out = src;
+  for (size_t p = 0; p < out.size(); p += size_t(ch)) {
+    rand();
+    int sum = rand();
+    for (int k = 0; k < 3; ++k) sum += rand();
+    const float n = float(sum * 5.28596089837e-05 - 3.46410161514);
+    for (size_t j = 0; j < 3; ++j) out[p + j] = ToByte(src[p + j] + n * s * 127);
+  }
+  return out;
+}
+
 // ---- images -----------------------------------------------------------------------------------
 
 Image Noise(unsigned w, unsigned h, unsigned bpp, uint32_t salt, unsigned padding = 0) {
@@ -155,14 +174,19 @@ const Named kFilters[] = {
     {"sharpen", sharpen, RefSharpen, {255, 30, -80, 1e30f}, false},
     {"clarity", clarity, RefClarity, {2.5f, 40, -40, 253, -3}, false},
     {"diffuse", diffuse, RefDiffuse, {90, -300, 1440, 5000}, false},
+    {"addNoiseFilter",
+     [](CxImage* i, float a) { return addNoiseFilter(i, a, 80.0f); },
+     RefNoise,
+     {60, -45},
+     true},
 };
 
 // ---- every filter ------------------------------------------------------------------------------
 
 TEST(DetailFilters, MatchTheirDefinitionsOnEveryTarget) {
-  // Vector bodies and tails; 128 x 24 gives dehaze's divisions enough pixels to show a rounding
-  // that differs. Padded rows are walked one by one: their pixels are those of the packed rows,
-  // and the padding stays.
+  // Vector bodies and tails; 128 x 24 carries the grain generator across batches of pixels and
+  // gives dehaze's divisions enough pixels to show a rounding that differs. Padded rows are
+  // walked one by one: their pixels are those of the packed rows, and the padding stays.
   const unsigned sizes[][3] = {{3, 3, 0}, {5, 4, 3}, {37, 11, 0}, {20, 17, 7}, {128, 24, 0}};
   tfx_test::ForEveryTarget([&] {
     for (const Named& f : kFilters) {
@@ -198,6 +222,7 @@ TEST(DetailFilters, LeaveTheImageAloneWhereTheyDoNothing) {
   for (const float a : {1.0f, -1.0f, 2.0f, -2.0f, 254.0f, 300.0f}) {
     cases.push_back({"clarity " + std::to_string(a), [a](CxImage* i) { clarity(i, a); }});
   }
+  cases.push_back({"grain factor 0", [](CxImage* i) { addNoiseFilter(i, 50.0f, 0.0f); }});
   for (const auto& [name, run] : cases) {
     SCOPED_TRACE(name);
     const Image original = Noise(9, 7, 32, 3);
@@ -296,6 +321,33 @@ TEST(Diffuse, At720DoublesAndBlursOnlyWhenPositive) {
   gaussianBlur(doubled.data(), 10, 9, 4, 1);
   diffuse(positive.get(), 720.0f);
   EXPECT_EQ(Packed(*positive), doubled);
+}
+
+TEST(AddNoiseFilter, GrainIsMonochromeWithZeroMeanAndDeviationS127) {
+  // Mid grey, s = 0.5 * 0.4: the grain's deviation is 0.2 * 127 = 25.4, far from clipping.
+  const unsigned w = 256, h = 128;
+  std::vector<uint8_t> px(size_t(w) * h * 4, 128), again;
+  uint8_t* bits = px.data();
+  CxImage image(&bits, w, h, 32, w * 4, IPF_BGRA);
+  addNoiseFilter(&image, 50.0f, 40.0f);
+  double sum = 0, squares = 0;
+  for (size_t i = 0; i < px.size(); i += 4) {
+    ASSERT_EQ(px[i], px[i + 1]);
+    ASSERT_EQ(px[i], px[i + 2]);
+    ASSERT_EQ(px[i + 3], 128);
+    const double d = px[i] - 128.0;
+    sum += d;
+    squares += d * d;
+  }
+  const double n = double(w) * h, mean = sum / n;
+  EXPECT_NEAR(mean, -0.5, 0.3);  // truncation costs half a level on average
+  EXPECT_NEAR(std::sqrt(squares / n - mean * mean), 25.4, 0.5);
+  // The generator restarts: a second grey image gets the same grain.
+  again.assign(px.size(), 128);
+  bits = again.data();
+  CxImage second(&bits, w, h, 32, w * 4, IPF_BGRA);
+  addNoiseFilter(&second, 50.0f, 40.0f);
+  EXPECT_EQ(again, px);
 }
 
 }  // namespace
