@@ -3,6 +3,7 @@
 // kept to its own release function in the interface, as a host that swaps the allocator expects.
 #include "tessarofx/AlignedMemory.h"
 
+#include <cstdint>
 #include <cstdlib>
 #include <cstring>
 
@@ -11,6 +12,8 @@ namespace {
 constexpr size_t kAllocAlignment = 32;
 
 void* AllocateAligned(size_t size, size_t alignment) {
+  // No object may span more than half the address space; refuse before the allocator sees it.
+  if (size > static_cast<size_t>(PTRDIFF_MAX)) return nullptr;
   void* block = nullptr;
   // A request for nothing still gets a block of its own, which the caller may free.
   if (posix_memalign(&block, alignment, size == 0 ? 1 : size) != 0) return nullptr;

@@ -224,11 +224,12 @@ void BoxBlur(uint8_t* pixels, int width, int height, int channels, int radius) {
   const BoxDivide divide(static_cast<uint64_t>(2 * r + 1));
   const size_t lanes = static_cast<size_t>(w * kBlurred);
   const size_t mid_bytes = lanes * static_cast<size_t>(h);
-  const ScratchBlock scratch(mid_bytes + lanes * sizeof(uint64_t) + static_cast<size_t>(w));
+  const size_t sum_bytes = lanes * sizeof(uint64_t);
+  const ScratchBlock scratch(sum_bytes + mid_bytes + static_cast<size_t>(w));
   if (!scratch) return;
-  uint8_t* mid = scratch.As<uint8_t>();
-  void* sums = scratch.As<void>(mid_bytes);
-  uint8_t* out_row = scratch.As<uint8_t>(mid_bytes + lanes * sizeof(uint64_t));
+  void* sums = scratch.As<void>();
+  uint8_t* mid = scratch.As<uint8_t>(sum_bytes);
+  uint8_t* out_row = scratch.As<uint8_t>(sum_bytes + mid_bytes);
   BoxRows<kBlurred>(pixels, w, h, channels, r, divide, mid);
   BoxColumns<kBlurred>(mid, w, h, channels, r, divide, pixels, out_row, sums);
 }
