@@ -34,28 +34,52 @@ uint32_t TargetOf(int64_t count, float fraction) {
   return static_cast<uint32_t>(std::clamp<int64_t>(target, 1, 256 * 255 + 1));
 }
 
-// The smallest v of `bins` whose running count reaches `target`, given the sums of its eight-bin
-// groups and the total `below` of the groups before `group`; kNone when the total stays below.
-uint32_t Scan(const uint8_t* bins, const uint64_t* groups, uint32_t group, uint64_t below,
-              uint32_t target) {
+// The sums of one window's bins: groups[g] over bins 8g..8g+7, and blocks[b] over the groups
+// b * per_block .. (b + 1) * per_block - 1, per_block being the groups of one vector.
+struct BinSums {
+  HWY_ALIGN uint64_t groups[32];
+  uint64_t blocks[32];
+  uint32_t per_block;
+
+  // The total of the groups before `group`. Block totals keep this off the chain from one
+  // pixel's result to the next pixel's scan.
+  uint64_t Below(uint32_t group) const {
+    const uint32_t block = group / per_block;
+    uint64_t below = 0;
+    for (uint32_t b = 0; b < block; ++b) below += blocks[b];
+    for (uint32_t g = block * per_block; g < group; ++g) below += groups[g];
+    return below;
+  }
+};
+
+// The smallest v of `bins` whose running count reaches `target`, walking from `group`; kNone
+// when the total stays below.
+uint32_t Scan(const uint8_t* bins, const BinSums& sums, uint32_t group, uint32_t target) {
   // Find the group whose running totals before and after it straddle the target. Before group
   // 0 the total is 0, below any target.
+  uint64_t below = sums.Below(group);
   if (below >= target) {
-    while (below >= target) below -= groups[--group];
+    while (below >= target) below -= sums.groups[--group];
   } else {
-    while (group < 32 && below + groups[group] < target) below += groups[group++];
+    while (group < 32 && below + sums.groups[group] < target) below += sums.groups[group++];
     if (group == 32) return kNone;
   }
-  uint32_t v = 8 * group;
-  while ((below += bins[v]) < target) ++v;
-  return v;
+  // The bins of the group: the number whose running total stays below the target is v's
+  // offset, counted without a branch, since where it stops varies from pixel to pixel.
+  const uint8_t* group_bins = bins + 8 * group;
+  uint32_t offset = 0;
+  for (int i = 0; i < 7; ++i) {
+    below += group_bins[i];
+    offset += below < target ? 1 : 0;
+  }
+  return 8 * group + offset;
 }
 
 #if HWY_TARGET == HWY_SCALAR
 
-uint64_t Combine(uint8_t* window, const uint8_t* add, const uint8_t* remove, uint64_t* groups,
-                 uint32_t group) {
-  uint64_t below = 0;
+void Combine(uint8_t* window, const uint8_t* add, const uint8_t* remove, BinSums& sums) {
+  sums.per_block = 32;
+  sums.blocks[0] = 0;
   for (uint32_t g = 0; g < 32; ++g) {
     uint64_t sum = 0;
     for (uint32_t b = 8 * g; b < 8 * g + 8; ++b) {
@@ -63,33 +87,29 @@ uint64_t Combine(uint8_t* window, const uint8_t* add, const uint8_t* remove, uin
       if (add != nullptr) window[b] = static_cast<uint8_t>(window[b] + add[b]);
       sum += window[b];
     }
-    groups[g] = sum;
-    if (g < group) below += sum;
+    sums.groups[g] = sum;
+    sums.blocks[0] += sum;
   }
-  return below;
 }
 
 #else
 
-// window += add - remove (either may be null), then the sums of the window's eight-bin groups;
-// returns the total of the groups before `group`.
-uint64_t Combine(uint8_t* HWY_RESTRICT window, const uint8_t* add, const uint8_t* remove,
-                 uint64_t* HWY_RESTRICT groups, uint32_t group) {
+// window += add - remove (either may be null), then the sums of the window's bins.
+void Combine(uint8_t* HWY_RESTRICT window, const uint8_t* add, const uint8_t* remove,
+             BinSums& sums) {
   const hn::ScalableTag<uint8_t> d8;
   const hn::Repartition<uint64_t, decltype(d8)> d64;
   const size_t n = hn::Lanes(d8);
-  auto below = hn::Zero(d64);
+  sums.per_block = static_cast<uint32_t>(n / 8);
   for (size_t i = 0; i < 256; i += n) {
     auto v = hn::Load(d8, window + i);
     if (remove != nullptr) v = hn::Sub(v, hn::LoadU(d8, remove + i));
     if (add != nullptr) v = hn::Add(v, hn::LoadU(d8, add + i));
     hn::Store(v, d8, window + i);
-    const auto sums = hn::SumsOf8(v);
-    hn::StoreU(sums, d64, groups + i / 8);
-    const size_t before = group > i / 8 ? group - i / 8 : 0;  // lanes of groups before `group`
-    below = hn::Add(below, hn::IfThenElseZero(hn::FirstN(d64, before), sums));
+    const auto groups = hn::SumsOf8(v);
+    hn::Store(groups, d64, sums.groups + i / 8);
+    sums.blocks[i / n] = hn::GetLane(hn::SumOfLanes(d64, groups));
   }
-  return hn::GetLane(hn::SumOfLanes(d64, below));
 }
 
 #endif
@@ -99,13 +119,10 @@ uint64_t Combine(uint8_t* HWY_RESTRICT window, const uint8_t* add, const uint8_t
 void WindowHistogramRowOfTarget(const uint8_t* columns, uint8_t* out, int64_t width, int64_t radius,
                                 int64_t rows, float fraction) {
   HWY_ALIGN uint8_t window[256] = {};
-  HWY_ALIGN uint64_t groups[32];
+  BinSums sums{};
   uint32_t group = 0;  // where the previous pixel's value was found
-  uint64_t below = 0;
   const int64_t first_right = std::min(width - 1, radius);
-  for (int64_t j = 0; j <= first_right; ++j) {
-    below = Combine(window, columns + j * 256, nullptr, groups, group);
-  }
+  for (int64_t j = 0; j <= first_right; ++j) Combine(window, columns + j * 256, nullptr, sums);
   for (int64_t x = 0; x < width; ++x) {
     const int64_t left = std::max<int64_t>(0, x - radius);
     const int64_t right = std::min(width - 1, x + radius);
@@ -115,10 +132,10 @@ void WindowHistogramRowOfTarget(const uint8_t* columns, uint8_t* out, int64_t wi
       const uint8_t* remove = x - radius > 0 ? columns + (x - radius - 1) * 256 : nullptr;
       const uint8_t* add =
           right == width - 1 && right - left < 2 * radius ? nullptr : columns + right * 256;
-      below = Combine(window, add, remove, groups, group);
+      Combine(window, add, remove, sums);
     }
     const uint32_t target = TargetOf((right - left + 1) * rows, fraction);
-    const uint32_t v = Scan(window, groups, group, below, target);
+    const uint32_t v = Scan(window, sums, group, target);
     if (v != kNone) group = v / 8;
     out[x] = static_cast<uint8_t>(v);  // none gives 256, whose low byte is 0
   }
