@@ -62,18 +62,21 @@ StackblurWalk MakeWalk(unsigned radius, bool alpha) {
   return walk;
 }
 
-// Pass 2: the lanes are the bytes of a row, taken in strips narrow enough for the sums and the
-// ring to stay in cache while the walk goes down the image.
+// Pass 2: the lanes are the bytes of a row, taken in strips as wide as the sums and the ring
+// allow while staying in the second-level cache: whole rows read in order help the prefetcher
+// most, but at large radii the ring of saved rows would crowd them out.
 void BlurColumns(uint8_t* pixels, ptrdiff_t pitch, size_t row_bytes, size_t height,
                  const StackblurWalk& walk) {
-  constexpr size_t kStrip = 1024;
-  const size_t lanes = std::min(kStrip, row_bytes);
-  const ScratchBlock scratch(lanes * (3 * sizeof(uint32_t) + walk.radius + 1));
+  constexpr size_t kScratchBytes = 512 * 1024;
+  const size_t bytes_per_lane = 3 * sizeof(uint32_t) + walk.radius + 1;
+  const size_t strip = std::max<size_t>(256, kScratchBytes / bytes_per_lane / 64 * 64);
+  const size_t lanes = std::min(strip, row_bytes);
+  const ScratchBlock scratch(lanes * bytes_per_lane);
   if (!scratch) return;
   auto* sums = scratch.As<uint32_t>();
   auto* ring = reinterpret_cast<uint8_t*>(sums + 3 * lanes);
-  for (size_t j = 0; j < row_bytes; j += kStrip) {
-    StackblurLanesVector(pixels + j, pitch, std::min(kStrip, row_bytes - j), height, walk, sums,
+  for (size_t j = 0; j < row_bytes; j += strip) {
+    StackblurLanesVector(pixels + j, pitch, std::min(strip, row_bytes - j), height, walk, sums,
                          ring);
   }
 }
@@ -94,19 +97,26 @@ void BlurRows(uint8_t* pixels, ptrdiff_t pitch, size_t width, size_t height,
   std::memset(band, 0, width * kLanes);
   for (size_t y0 = 0; y0 < height; y0 += kBand) {
     const size_t rows = std::min(kBand, height - y0);
-    for (size_t i = 0; i < rows; ++i) {
-      const uint8_t* row = pixels + static_cast<ptrdiff_t>(y0 + i) * pitch;
-      uint8_t* lane = band + i * kChannels;
-      for (size_t x = 0; x < width; ++x) {
-        std::memcpy(lane + x * kLanes, row + x * kChannels, kChannels);
+    uint8_t* first_row = pixels + static_cast<ptrdiff_t>(y0) * pitch;
+    if (kChannels == 4) {
+      tfx::TurnPixels(first_row, pitch, band, kLanes, rows, width);
+    } else {
+      for (size_t i = 0; i < rows; ++i) {
+        const uint8_t* row = first_row + static_cast<ptrdiff_t>(i) * pitch;
+        for (size_t x = 0; x < width; ++x) {
+          std::memcpy(band + x * kLanes + i * kChannels, row + x * kChannels, kChannels);
+        }
       }
     }
     StackblurLanesVector(band, kLanes, kLanes, width, walk, sums, ring);
-    for (size_t i = 0; i < rows; ++i) {
-      uint8_t* row = pixels + static_cast<ptrdiff_t>(y0 + i) * pitch;
-      const uint8_t* lane = band + i * kChannels;
-      for (size_t x = 0; x < width; ++x) {
-        std::memcpy(row + x * kChannels, lane + x * kLanes, kChannels);
+    if (kChannels == 4) {
+      tfx::TurnPixels(band, kLanes, first_row, pitch, width, rows);
+    } else {
+      for (size_t i = 0; i < rows; ++i) {
+        uint8_t* row = first_row + static_cast<ptrdiff_t>(i) * pitch;
+        for (size_t x = 0; x < width; ++x) {
+          std::memcpy(row + x * kChannels, band + x * kLanes + i * kChannels, kChannels);
+        }
       }
     }
   }

@@ -25,6 +25,12 @@ struct StackblurWalk {
 void StackblurLanesVector(uint8_t* first, ptrdiff_t stride, size_t lanes, size_t count,
                           const StackblurWalk& walk, uint32_t* sums, uint8_t* ring);
 
+// Turns `rows` rows of `columns` 4-byte pixels (row r at src + r * src_pitch) into `columns` rows
+// of `rows` pixels (row c at dst + c * dst_pitch): pixel c of source row r becomes pixel r of
+// destination row c. Rows need no alignment.
+void TurnPixels(const uint8_t* src, ptrdiff_t src_pitch, uint8_t* dst, ptrdiff_t dst_pitch,
+                size_t rows, size_t columns);
+
 // The name of the instruction set StackblurLanesVector would run now.
 const char* StackblurLanesTarget();
 

@@ -9,6 +9,7 @@
 // lanes are done in. Outputs overwrite their line, so a ring keeps the last radius + 1 lines as
 // they were for the samples that leave the window later.
 #include <algorithm>
+#include <cstring>
 
 #include "simd/stackblur_lanes.h"
 
@@ -162,7 +163,54 @@ void Walk(const LaneWalk& w) {
 
 #endif  // HWY_TARGET == HWY_SCALAR
 
+// dst[c * dst_pitch + 4 r .. + 3] = src[r * src_pitch + 4 c .. + 3]: 4-byte pixels turned, one
+// at a time.
+void TurnPixelsOneByOne(const uint8_t* src, ptrdiff_t src_pitch, uint8_t* dst, ptrdiff_t dst_pitch,
+                        size_t r0, size_t r1, size_t c0, size_t c1) {
+  for (size_t r = r0; r < r1; ++r) {
+    for (size_t c = c0; c < c1; ++c) {
+      std::memcpy(dst + static_cast<ptrdiff_t>(c) * dst_pitch + 4 * r,
+                  src + static_cast<ptrdiff_t>(r) * src_pitch + 4 * c, 4);
+    }
+  }
+}
+
 }  // namespace
+
+void TurnPixelsOfTarget(const uint8_t* src, ptrdiff_t src_pitch, uint8_t* dst, ptrdiff_t dst_pitch,
+                        size_t rows, size_t columns) {
+#if HWY_TARGET == HWY_SCALAR
+  TurnPixelsOneByOne(src, src_pitch, dst, dst_pitch, 0, rows, 0, columns);
+#else
+  // Blocks of 4 x 4 pixels, each pixel one 32-bit lane of a 128-bit vector.
+  const hn::FixedTag<uint32_t, 4> d;
+  const hn::Repartition<uint64_t, decltype(d)> d64;
+  const size_t rows4 = rows & ~size_t{3}, columns4 = columns & ~size_t{3};
+  auto load = [&](size_t r, size_t c) {
+    return hn::LoadU(
+        d, reinterpret_cast<const uint32_t*>(src + static_cast<ptrdiff_t>(r) * src_pitch) + c);
+  };
+  auto store = [&](hn::Vec<decltype(d64)> v, size_t c, size_t r) {
+    hn::StoreU(hn::BitCast(d, v), d,
+               reinterpret_cast<uint32_t*>(dst + static_cast<ptrdiff_t>(c) * dst_pitch) + r);
+  };
+  for (size_t r = 0; r < rows4; r += 4) {
+    for (size_t c = 0; c < columns4; c += 4) {
+      const auto a = load(r, c), b = load(r + 1, c), e = load(r + 2, c), f = load(r + 3, c);
+      const auto ab_low = hn::BitCast(d64, hn::InterleaveLower(d, a, b));
+      const auto ab_high = hn::BitCast(d64, hn::InterleaveUpper(d, a, b));
+      const auto ef_low = hn::BitCast(d64, hn::InterleaveLower(d, e, f));
+      const auto ef_high = hn::BitCast(d64, hn::InterleaveUpper(d, e, f));
+      store(hn::InterleaveLower(d64, ab_low, ef_low), c, r);
+      store(hn::InterleaveUpper(d64, ab_low, ef_low), c + 1, r);
+      store(hn::InterleaveLower(d64, ab_high, ef_high), c + 2, r);
+      store(hn::InterleaveUpper(d64, ab_high, ef_high), c + 3, r);
+    }
+  }
+  TurnPixelsOneByOne(src, src_pitch, dst, dst_pitch, 0, rows4, columns4, columns);
+  TurnPixelsOneByOne(src, src_pitch, dst, dst_pitch, rows4, rows, 0, columns);
+#endif
+}
 
 void StackblurLanesOfTarget(uint8_t* first, ptrdiff_t stride, size_t lanes, size_t count,
                             const StackblurWalk& walk, uint32_t* sums, uint8_t* ring) {
@@ -182,6 +230,12 @@ namespace tfx {
 
 HWY_EXPORT(StackblurLanesOfTarget);
 HWY_EXPORT(StackblurTargetOfTarget);
+HWY_EXPORT(TurnPixelsOfTarget);
+
+void TurnPixels(const uint8_t* src, ptrdiff_t src_pitch, uint8_t* dst, ptrdiff_t dst_pitch,
+                size_t rows, size_t columns) {
+  HWY_DYNAMIC_DISPATCH(TurnPixelsOfTarget)(src, src_pitch, dst, dst_pitch, rows, columns);
+}
 
 void StackblurLanesVector(uint8_t* first, ptrdiff_t stride, size_t lanes, size_t count,
                           const StackblurWalk& walk, uint32_t* sums, uint8_t* ring) {

@@ -150,7 +150,7 @@ TEST(Stackblur, EachPassMatchesItsDefinitionOnEveryTarget) {
   const Case cases[] = {{1, 1, 3, 1},    {1, 7, 4, 3},     {7, 1, 3, 5},     {5, 6, 3, 2},
                         {13, 11, 4, 4},  {9, 9, 4, 0},     {3, 4, 3, 20},    {300, 70, 4, 7},
                         {347, 33, 3, 2}, {6, 300, 4, 255}, {300, 3, 3, 255}, {17, 19, 4, 254},
-                        {40, 65, 3, 31}, {2, 2, 4, 100}};
+                        {40, 65, 3, 31}, {2, 2, 4, 100},   {700, 5, 4, 200}, {900, 4, 3, 200}};
   for (const Case& c : cases) {
     for (const int pass : {1, 2}) {
       SCOPED_TRACE(testing::Message() << c.width << "x" << c.height << " channels " << c.channels
