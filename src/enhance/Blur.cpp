@@ -5,6 +5,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+#include <type_traits>
 
 #include "enhance/Scratch.h"
 #include "simd/box_rows.h"
@@ -149,100 +150,131 @@ struct BoxDivide {
   }
 };
 
-// The row pass of the box blur: channel k of each row, its edge samples repeated, into byte k of
-// kBlurred-byte pixels of `mid`. The window slides by one sample in and one out; in the middle of
-// the row neither end is clamped.
+// The box blur, a row of the row pass at a time: each column of the column pass slides down
+// over rows of the row pass kept in a ring of 2 radius + 2, which holds every row between the
+// one leaving the window and the one entering it. Row i of the row pass is made before output row
+// i is written over its source, and only ever from rows not yet written.
 template <int kBlurred>
-void BoxRows(const uint8_t* pixels, int64_t w, int64_t h, ptrdiff_t channels, int64_t r,
-             const BoxDivide& divide, uint8_t* mid) {
-  const int64_t inside = std::min(r, w - 1);
-  // Columns [r, w - r - 1) have both window ends inside the row.
-  const int64_t middle_begin = std::min(r, w);
-  const int64_t middle_end = std::max(middle_begin, w - r - 1);
-  for (int64_t y = 0; y < h; ++y) {
-    const uint8_t* row = pixels + y * w * channels;
-    uint8_t* out = mid + y * w * kBlurred;
+class BoxBlur {
+ public:
+  BoxBlur(uint8_t* pixels, int64_t w, int64_t h, int64_t channels, int64_t r)
+      : pixels_(pixels),
+        w_(w),
+        h_(h),
+        channels_(channels),
+        r_(r),
+        lanes_(static_cast<size_t>(w * kBlurred)),
+        ring_rows_(std::min(h, 2 * r + 2)),
+        divide_(static_cast<uint64_t>(2 * r + 1)) {}
+
+  void Run() {
+    // Column sums (32 or 64 bits), the running totals of one extended row, the ring and one
+    // output row.
+    const size_t sum_bytes = lanes_ * (divide_.by_multiply ? 4 : 8);
+    const size_t running_bytes = static_cast<size_t>((w_ + 2 * r_ + 2) * kBlurred) * 4;
+    const size_t ring_bytes = lanes_ * static_cast<size_t>(ring_rows_);
+    const ScratchBlock scratch(sum_bytes + running_bytes + ring_bytes + static_cast<size_t>(w_));
+    if (!scratch) return;
+    running_ = scratch.As<uint32_t>(sum_bytes);
+    ring_ = scratch.As<uint8_t>(sum_bytes + running_bytes);
+    out_row_ = scratch.As<uint8_t>(sum_bytes + running_bytes + ring_bytes);
+    if (divide_.by_multiply) {
+      Columns(scratch.As<uint32_t>());
+    } else {
+      Columns(scratch.As<uint64_t>());
+    }
+  }
+
+ private:
+  uint8_t* Row(int64_t y) const { return pixels_ + y * w_ * channels_; }
+  uint8_t* Mid(int64_t y) const { return ring_ + static_cast<size_t>(y % ring_rows_) * lanes_; }
+
+  // Row y of the row pass: channel k of each pixel, edge samples repeated, into byte k of
+  // kBlurred-byte pixels.
+  void MakeMid(int64_t y) {
+    const uint8_t* row = Row(y);
+    uint8_t* mid = Mid(y);
+    if (divide_.by_multiply) {
+      // Running totals of the row extended by radius copies of its first pixel and radius + 1 of
+      // its last: every window sum is then one difference, and a vector of them goes at once.
+      uint32_t* total = running_;
+      for (int k = 0; k < kBlurred; ++k) total[k] = 0;
+      auto push = [&](const uint8_t* sample) {
+        for (int k = 0; k < kBlurred; ++k) total[kBlurred + k] = total[k] + sample[k];
+        total += kBlurred;
+      };
+      for (int64_t e = 0; e < r_; ++e) push(row);
+      for (int64_t x = 0; x < w_; ++x) push(row + x * channels_);
+      for (int64_t e = 0; e <= r_; ++e) push(row + (w_ - 1) * channels_);
+      tfx::BoxRowDifference(running_, static_cast<size_t>((2 * r_ + 1) * kBlurred), mid, lanes_,
+                            divide_.quotient);
+      return;
+    }
+    // Large radii: the window slides by one sample in and one out.
+    const int64_t inside = std::min(r_, w_ - 1);
     for (int k = 0; k < kBlurred; ++k) {
       const uint8_t* p = row + k;
-      uint64_t sum = static_cast<uint64_t>(r + 1) * p[0] + (r - inside) * p[(w - 1) * channels];
-      for (int64_t i = 1; i <= inside; ++i) sum += p[i * channels];
-      auto clamped_step = [&](int64_t x) {
-        out[x * kBlurred + k] = divide(sum);
-        sum += p[std::min(x + r + 1, w - 1) * channels];
-        sum -= p[std::max<int64_t>(x - r, 0) * channels];
-      };
-      int64_t x = 0;
-      for (; x < middle_begin; ++x) clamped_step(x);
-      for (; x < middle_end; ++x) {
-        out[x * kBlurred + k] = divide(sum);
-        sum += p[(x + r + 1) * channels];
-        sum -= p[(x - r) * channels];
+      uint64_t sum = static_cast<uint64_t>(r_ + 1) * p[0] + (r_ - inside) * p[(w_ - 1) * channels_];
+      for (int64_t i = 1; i <= inside; ++i) sum += p[i * channels_];
+      for (int64_t x = 0; x < w_; ++x) {
+        mid[x * kBlurred + k] = divide_(sum);
+        sum += p[std::min(x + r_ + 1, w_ - 1) * channels_];
+        sum -= p[std::max<int64_t>(x - r_, 0) * channels_];
       }
-      for (; x < w; ++x) clamped_step(x);
     }
   }
-}
 
-// The column pass: each byte position of `mid`'s rows slides down the rows; only negative rows
-// are clamped for the first window, which the height above the radius makes enough.
-template <int kBlurred>
-void BoxColumns(const uint8_t* mid, int64_t w, int64_t h, ptrdiff_t channels, int64_t r,
-                const BoxDivide& divide, uint8_t* pixels, uint8_t* out_row, void* sums_block) {
-  const size_t lanes = static_cast<size_t>(w * kBlurred);
-  auto mid_row = [&](int64_t y) { return mid + y * static_cast<int64_t>(lanes); };
-  auto output = [&](int64_t y) {
-    return kBlurred == channels ? pixels + y * w * channels : out_row;
-  };
-  auto scatter = [&](int64_t y) {
-    if (kBlurred == channels) return;
-    uint8_t* row = pixels + y * w * channels;
-    for (int64_t x = 0; x < w; ++x) row[x * channels] = out_row[x];
-  };
-  if (divide.by_multiply) {
-    auto* sums = static_cast<uint32_t*>(sums_block);
-    std::fill(sums, sums + lanes, 0u);
-    tfx::BoxRowAccumulate(sums, mid_row(0), lanes, static_cast<uint32_t>(r + 1));
-    for (int64_t i = 1; i <= r; ++i) tfx::BoxRowAccumulate(sums, mid_row(i), lanes, 1);
-    for (int64_t y = 0; y < h; ++y) {
-      tfx::BoxRowStep(sums, mid_row(std::min(y + r + 1, h - 1)),
-                      mid_row(std::max<int64_t>(y - r, 0)), output(y), lanes, divide.quotient);
-      scatter(y);
+  // The column pass. The first window of a column reaches rows 0..radius, all below the height.
+  // 32-bit sums go with the multiply-and-shift quotient, 64-bit ones with a division.
+  template <class Sum>
+  void Columns(Sum* sums) {
+    constexpr bool kByMultiply = std::is_same_v<Sum, uint32_t>;
+    int64_t made = -1;  // the last row of the row pass made
+    auto make_through = [&](int64_t y) {
+      while (made < y) MakeMid(++made);
+    };
+    make_through(r_);
+    std::fill(sums, sums + lanes_, Sum{0});
+    for (int64_t i = 0; i <= r_; ++i) {
+      const uint32_t weight = i == 0 ? static_cast<uint32_t>(r_ + 1) : 1;
+      if constexpr (kByMultiply) {
+        tfx::BoxRowAccumulate(sums, Mid(i), lanes_, weight);
+      } else {
+        for (size_t j = 0; j < lanes_; ++j) sums[j] += Sum{weight} * Mid(i)[j];
+      }
     }
-    return;
-  }
-  auto* sums = static_cast<uint64_t*>(sums_block);
-  for (size_t j = 0; j < lanes; ++j) sums[j] = static_cast<uint64_t>(r + 1) * mid_row(0)[j];
-  for (int64_t i = 1; i <= r; ++i) {
-    for (size_t j = 0; j < lanes; ++j) sums[j] += mid_row(i)[j];
-  }
-  for (int64_t y = 0; y < h; ++y) {
-    const uint8_t* entering = mid_row(std::min(y + r + 1, h - 1));
-    const uint8_t* leaving = mid_row(std::max<int64_t>(y - r, 0));
-    uint8_t* out = output(y);
-    for (size_t j = 0; j < lanes; ++j) {
-      out[j] = divide(sums[j]);
-      sums[j] += entering[j];
-      sums[j] -= leaving[j];
+    for (int64_t y = 0; y < h_; ++y) {
+      const int64_t entering = std::min(y + r_ + 1, h_ - 1);
+      make_through(entering);
+      uint8_t* out = kBlurred == channels_ ? Row(y) : out_row_;
+      if constexpr (kByMultiply) {
+        tfx::BoxRowStep(sums, Mid(entering), Mid(std::max<int64_t>(y - r_, 0)), out, lanes_,
+                        divide_.quotient);
+      } else {
+        const uint8_t* in = Mid(entering);
+        const uint8_t* gone = Mid(std::max<int64_t>(y - r_, 0));
+        for (size_t j = 0; j < lanes_; ++j) {
+          out[j] = divide_(sums[j]);
+          sums[j] += in[j];
+          sums[j] -= gone[j];
+        }
+      }
+      if (kBlurred != channels_) {
+        uint8_t* row = Row(y);
+        for (int64_t x = 0; x < w_; ++x) row[x * channels_] = out_row_[x];
+      }
     }
-    scatter(y);
   }
-}
 
-template <int kBlurred>
-void BoxBlur(uint8_t* pixels, int width, int height, int channels, int radius) {
-  const int64_t w = width, h = height, r = radius;
-  const BoxDivide divide(static_cast<uint64_t>(2 * r + 1));
-  const size_t lanes = static_cast<size_t>(w * kBlurred);
-  const size_t mid_bytes = lanes * static_cast<size_t>(h);
-  const size_t sum_bytes = lanes * sizeof(uint64_t);
-  const ScratchBlock scratch(sum_bytes + mid_bytes + static_cast<size_t>(w));
-  if (!scratch) return;
-  void* sums = scratch.As<void>();
-  uint8_t* mid = scratch.As<uint8_t>(sum_bytes);
-  uint8_t* out_row = scratch.As<uint8_t>(sum_bytes + mid_bytes);
-  BoxRows<kBlurred>(pixels, w, h, channels, r, divide, mid);
-  BoxColumns<kBlurred>(mid, w, h, channels, r, divide, pixels, out_row, sums);
-}
+  uint8_t* pixels_;
+  int64_t w_, h_, channels_, r_;
+  size_t lanes_;
+  int64_t ring_rows_;
+  BoxDivide divide_;
+  uint32_t* running_ = nullptr;
+  uint8_t* ring_ = nullptr;
+  uint8_t* out_row_ = nullptr;
+};
 
 }  // namespace
 
@@ -291,9 +323,9 @@ void fastAverageBlur(unsigned char* pixels, int width, int height, int channels,
   const uint64_t area = static_cast<uint64_t>(width) * static_cast<uint64_t>(height);
   if (area > kMaxBytes / static_cast<uint64_t>(channels)) return;
   if (channels == 3) {
-    BoxBlur<3>(pixels, width, height, channels, radius);
+    BoxBlur<3>(pixels, width, height, channels, radius).Run();
   } else {
     // With 4 channels only byte 0 is blurred, as with 2 or more than 4.
-    BoxBlur<1>(pixels, width, height, channels, radius);
+    BoxBlur<1>(pixels, width, height, channels, radius).Run();
   }
 }

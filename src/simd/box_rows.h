@@ -21,4 +21,9 @@ void BoxRowAccumulate(uint32_t* sums, const uint8_t* row, size_t lanes, uint32_t
 void BoxRowStep(uint32_t* sums, const uint8_t* entering, const uint8_t* leaving, uint8_t* out,
                 size_t lanes, BoxQuotient quotient);
 
+// out[j] = floor((running[j + span] - running[j]) / div) for j < lanes, the differences taken
+// modulo 2^32: running totals may wrap, the window sums between them do not.
+void BoxRowDifference(const uint32_t* running, size_t span, uint8_t* out, size_t lanes,
+                      BoxQuotient quotient);
+
 }  // namespace tfx

@@ -50,6 +50,25 @@ void BoxRowStepOfTarget(uint32_t* HWY_RESTRICT sums, const uint8_t* entering,
   }
 }
 
+void BoxRowDifferenceOfTarget(const uint32_t* running, size_t span, uint8_t* out, size_t lanes,
+                              BoxQuotient quotient) {
+  const hn::ScalableTag<uint32_t> du;
+  const hn::RebindToSigned<decltype(du)> di;
+  const hn::Rebind<uint8_t, decltype(du)> d8;
+  const size_t n = hn::Lanes(du);
+  const auto mul = hn::Set(du, quotient.mul);
+  size_t j = 0;
+  for (; j + n <= lanes; j += n) {
+    const auto sum = hn::Sub(hn::LoadU(du, running + j + span), hn::LoadU(du, running + j));
+    const auto q = hn::ShiftRightSame(hn::Mul(sum, mul), quotient.shift);
+    hn::StoreU(hn::DemoteTo(d8, hn::BitCast(di, q)), d8, out + j);
+  }
+  for (; j < lanes; ++j) {
+    const uint32_t sum = running[j + span] - running[j];
+    out[j] = static_cast<uint8_t>((sum * quotient.mul) >> quotient.shift);
+  }
+}
+
 }  // namespace HWY_NAMESPACE
 }  // namespace tfx
 HWY_AFTER_NAMESPACE();
@@ -59,6 +78,12 @@ namespace tfx {
 
 HWY_EXPORT(BoxRowAccumulateOfTarget);
 HWY_EXPORT(BoxRowStepOfTarget);
+HWY_EXPORT(BoxRowDifferenceOfTarget);
+
+void BoxRowDifference(const uint32_t* running, size_t span, uint8_t* out, size_t lanes,
+                      BoxQuotient quotient) {
+  HWY_DYNAMIC_DISPATCH(BoxRowDifferenceOfTarget)(running, span, out, lanes, quotient);
+}
 
 void BoxRowAccumulate(uint32_t* sums, const uint8_t* row, size_t lanes, uint32_t weight) {
   HWY_DYNAMIC_DISPATCH(BoxRowAccumulateOfTarget)(sums, row, lanes, weight);
