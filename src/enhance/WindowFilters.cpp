@@ -188,9 +188,7 @@ bool MeanOrVariance(const uint8_t* src, uint8_t* dst, int64_t w, int64_t h, int6
     sum.Accumulate(w);
     if (kVariance) square.Accumulate(w);
     uint8_t* out = dst + y * w;
-    for (int64_t x = 0; x < w; ++x) {
-      const ColumnSpan span = SpanAt(x, w, r);
-      const Divider& by_count = divide[span.right - span.left + 1];
+    auto output = [&](int64_t x, const ColumnSpan& span, const Divider& by_count) {
       const uint64_t s = sum.Window(span);
       if (kVariance) {
         // The low byte, not a clamp: callers rely on variances above 255 wrapping.
@@ -199,6 +197,23 @@ bool MeanOrVariance(const uint8_t* src, uint8_t* dst, int64_t w, int64_t h, int6
       } else {
         out[x] = static_cast<uint8_t>(by_count(s));
       }
+    };
+    // Columns radius .. width - radius - 1 have whole windows: 2 radius + 1 columns, all summed
+    // (planes that skip a column are too narrow to have any).
+    const int64_t middle_begin = std::min(r, w), middle_end = std::max(middle_begin, w - r);
+    for (int64_t x = 0; x < middle_begin; ++x) {
+      const ColumnSpan span = SpanAt(x, w, r);
+      output(x, span, divide[span.right - span.left + 1]);
+    }
+    if (middle_begin < middle_end) {
+      const Divider by_count = divide[2 * r + 1];
+      for (int64_t x = middle_begin; x < middle_end; ++x) {
+        output(x, ColumnSpan{x - r, x + r, x + r}, by_count);
+      }
+    }
+    for (int64_t x = middle_end; x < w; ++x) {
+      const ColumnSpan span = SpanAt(x, w, r);
+      output(x, span, divide[span.right - span.left + 1]);
     }
   }
   return true;
