@@ -99,7 +99,7 @@ void BlurRows(uint8_t* pixels, ptrdiff_t pitch, size_t width, size_t height,
   for (size_t y0 = 0; y0 < height; y0 += kBand) {
     const size_t rows = std::min(kBand, height - y0);
     uint8_t* first_row = pixels + static_cast<ptrdiff_t>(y0) * pitch;
-    if (kChannels == 4) {
+    if constexpr (kChannels == 4) {
       tfx::TurnPixels(first_row, pitch, band, kLanes, rows, width);
     } else {
       for (size_t i = 0; i < rows; ++i) {
@@ -110,7 +110,7 @@ void BlurRows(uint8_t* pixels, ptrdiff_t pitch, size_t width, size_t height,
       }
     }
     StackblurLanesVector(band, kLanes, kLanes, width, walk, sums, ring);
-    if (kChannels == 4) {
+    if constexpr (kChannels == 4) {
       tfx::TurnPixels(band, kLanes, first_row, pitch, width, rows);
     } else {
       for (size_t i = 0; i < rows; ++i) {
