@@ -5,8 +5,8 @@
 // Output buffers travel as a pointer to the caller's pointer plus its size: a function that
 // needs another size releases the old buffer with delete[] and allocates a zero-filled one with
 // new[], so a host can call it again and again with the same buffer and finally delete[] it.
-// Output rows are width * 4 bytes. Failures return 0 or false; the output may already have
-// been reallocated by then.
+// Output rows are width * 4 bytes; an image, mask or temporary above INT_MAX bytes is refused.
+// Failures return 0 or false; the output may already have been reallocated by then.
 //
 // Threads: no state is shared between calls.
 #pragma once
@@ -22,7 +22,8 @@ struct PIPNLERGB {
 };
 
 // Releases *buffer when set and stores a zero-filled new[] block of width * height *
-// bytesPerPixel bytes. False for a null `buffer` or a size below 1.
+// bytesPerPixel bytes. False for a null `buffer`, a size below 1 or a block above INT_MAX bytes,
+// which leave *buffer as it was.
 TFX_API bool reMallocImage(unsigned char** buffer, int width, int height, int bytesPerPixel);
 
 // A coloured outline `border` pixels wide around the pixels of `src` whose alpha is above 50,
@@ -43,7 +44,9 @@ TFX_API int scaleImage(unsigned char** out, int* outWidth, int* outHeight, const
 // Source-over blend of a copyWidth x copyHeight block of `src` from (srcX, srcY) onto `dst` at
 // (dstX, dstY) (negative positions clip), both images stored bottom-up, each alpha first scaled
 // by its opacity in percent. -1 as a copy size means the source's. Integer arithmetic with
-// truncating divisions. False for a null image, else true.
+// truncating divisions. False for a null image, else true; sizes below 1, a source stride
+// below its row, opacities outside 0..100 or a block starting left of or above the source leave
+// `dst` as it was.
 TFX_API bool mergeImage(unsigned char* dst, const unsigned char* src, int dstWidth, int dstHeight,
                         int srcWidth, int srcHeight, int srcStride, int dstX, int dstY,
                         int copyWidth, int copyHeight, int srcX, int srcY, int srcOpacity,
