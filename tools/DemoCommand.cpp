@@ -100,10 +100,11 @@ std::vector<DemoFxStep> DemoFxSteps() {
       {"clarity", "", {{"clarity", {"60"}}}, "clarity 60"},
       {"diffuse", "", {{"diffuse", {"240"}}}, "diffuse 240"},
       // The keyed figure with a gold outline: the outline on a canvas 2 x 8 pixels larger, then
-      // the cut-out merged back over it.
+      // the cut-out merged back over it. The frame writes its red field into byte 0, which is
+      // blue in BGRA, so gold is given as red 40, blue 255.
       {"cutout-frame",
        "ChromeKeyCombine",
-       {{"frame", {"255", "190", "40", "255", "8"}}, {"merge", {"8", "8", "100", "100"}, "input"}},
+       {{"frame", {"40", "190", "255", "255", "8"}}, {"merge", {"8", "8", "100", "100"}, "input"}},
        "makeImageFrame 8 px + mergeImage"},
   };
 }

@@ -427,7 +427,8 @@ const std::vector<ImageFunction>& EnhanceFunctions() {
        "_Z10fastFilterPKhPhiiif",
        RunPercentile,
        {{"RADIUS", 0, 1000}, {"PERCENTILE", 0, 1}},
-       "each colour plane: 0 minimum, 0.5 median, 1 maximum (its 8-bit counts wrap above radius 7)"},
+       "each colour plane: 0 minimum, 0.5 median, 1 maximum (its 8-bit counts wrap above radius "
+       "7)"},
       {"denoise",
        "deNoiseRGB",
        "_Z10deNoiseRGBP7CxImagef",
@@ -524,7 +525,8 @@ const std::vector<ImageFunction>& EnhanceFunctions() {
        "the balance placeholder: copies the first row into a transparent image"},
       {"frame", "makeImageFrame", "_Z14makeImageFramePPhPiS1_PKhiiii9PIPNLERGBi", RunFrame,
        ColourAnd({"BORDER", 0, 200}),
-       "an outline BORDER wide around the opaque part (alpha > 50), on a canvas 2 BORDER larger"},
+       "an outline BORDER wide around the opaque part (alpha > 50), on a canvas 2 BORDER larger; "
+       "RED lands in byte 0 (blue in BGRA), BLUE in byte 2"},
       {"scale-alpha", "scaleImage", "_Z10scaleImagePPhPiS1_PKhiii9PIPNLERGBi", RunScaleAlpha,
        ColourAnd({"BORDER", 0, 1000}),
        "the colour with the image's alpha, on a canvas 2 BORDER larger"},
