@@ -11,6 +11,7 @@
 #include <utility>
 #include <vector>
 
+#include "tessarofx/CxImage.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"
 
@@ -129,4 +130,23 @@ inline void RegisterEffectCases(const char* name, const wchar_t* guid,
                     size, guid, params);
     }
   }
+}
+
+// An exported function on a frame-sized BGRA CxImage, in place; the frame is restored outside
+// the timed part.
+template <class Fn>
+void BM_ImageFunction(benchmark::State& state, BenchSize size, Fn fn) {
+  const std::vector<uint8_t> input = RandomBgra(size.width, size.height);
+  std::vector<uint8_t> frame = input;
+  uint8_t* bits = frame.data();
+  CxImage image(&bits, static_cast<unsigned>(size.width), static_cast<unsigned>(size.height), 32,
+                static_cast<unsigned>(size.width * 4), IPF_BGRA);
+  for (auto _ : state) {
+    state.PauseTiming();
+    std::memcpy(frame.data(), input.data(), frame.size());
+    state.ResumeTiming();
+    fn(&image);
+    benchmark::ClobberMemory();
+  }
+  state.SetItemsProcessed(state.iterations() * size.width * size.height);
 }

@@ -10,24 +10,6 @@
 
 namespace {
 
-// The filters work in place; the frame is restored outside the timed part.
-template <class Fn>
-void BM_DetailFilter(benchmark::State& state, BenchSize size, Fn fn) {
-  const std::vector<uint8_t> input = RandomBgra(size.width, size.height);
-  std::vector<uint8_t> frame = input;
-  uint8_t* bits = frame.data();
-  CxImage image(&bits, static_cast<unsigned>(size.width), static_cast<unsigned>(size.height), 32,
-                static_cast<unsigned>(size.width * 4), IPF_BGRA);
-  for (auto _ : state) {
-    state.PauseTiming();
-    std::memcpy(frame.data(), input.data(), frame.size());
-    state.ResumeTiming();
-    fn(&image);
-    benchmark::ClobberMemory();
-  }
-  state.SetItemsProcessed(state.iterations() * size.width * size.height);
-}
-
 const struct Registrar {
   Registrar() {
     using ImageFn = CxImage* (*)(CxImage*);
@@ -49,7 +31,7 @@ const struct Registrar {
       RegisterMemcpy(size);
       for (const auto& c : cases) {
         RegisterTimed(std::string("BM_") + c.name + "/" + size.label + "/" + c.strength,
-                      BM_DetailFilter<ImageFn>, size, c.fn);
+                      BM_ImageFunction<ImageFn>, size, c.fn);
       }
     }
   }
