@@ -299,8 +299,14 @@ PIPNLERGB Colour(const FxContext& fx) {
   return PIPNLERGB{ArgI(fx, 0), ArgI(fx, 1), ArgI(fx, 2), ArgI(fx, 3)};
 }
 
-Status Failed(const FxContext& fx) {
-  return Status::Error(std::string(fx.function.function) + " failed");
+// The outcome of a function that makes a buffer: on success the buffer becomes the image; on
+// failure whatever it allocated is freed.
+Status Adopt(const FxContext& fx, int ok, unsigned char* out, int w, int h) {
+  if (!ok) {
+    delete[] out;
+    return Status::Error(std::string(fx.function.function) + " failed");
+  }
+  return TakeBuffer(out, w, h, fx.image);
 }
 
 Status RunFrame(const FxContext& fx) {
@@ -311,11 +317,7 @@ Status RunFrame(const FxContext& fx) {
   int w = 0, h = 0;
   const int ok = fn(&out, &w, &h, src.data, src.cols, src.rows, static_cast<int>(src.step[0]), 32,
                     Colour(fx), ArgI(fx, 4));
-  if (!ok) {
-    delete[] out;
-    return Failed(fx);
-  }
-  return TakeBuffer(out, w, h, fx.image);
+  return Adopt(fx, ok, out, w, h);
 }
 
 Status RunScaleAlpha(const FxContext& fx) {
@@ -324,11 +326,8 @@ Status RunScaleAlpha(const FxContext& fx) {
   const cv::Mat src = Packed(*fx.image);
   unsigned char* out = nullptr;
   int w = 0, h = 0;
-  if (!fn(&out, &w, &h, src.data, src.cols, src.rows, 32, Colour(fx), ArgI(fx, 4))) {
-    delete[] out;
-    return Failed(fx);
-  }
-  return TakeBuffer(out, w, h, fx.image);
+  const int ok = fn(&out, &w, &h, src.data, src.cols, src.rows, 32, Colour(fx), ArgI(fx, 4));
+  return Adopt(fx, ok, out, w, h);
 }
 
 Status RunPadBlur(const FxContext& fx) {
@@ -337,11 +336,8 @@ Status RunPadBlur(const FxContext& fx) {
   const cv::Mat src = Packed(*fx.image);
   unsigned char* out = nullptr;
   int w = 0, h = 0;
-  if (!fn(&out, &w, &h, src.data, src.cols, src.rows, 32, ArgI(fx, 0))) {
-    delete[] out;
-    return Failed(fx);
-  }
-  return TakeBuffer(out, w, h, fx.image);
+  const int ok = fn(&out, &w, &h, src.data, src.cols, src.rows, 32, ArgI(fx, 0));
+  return Adopt(fx, ok, out, w, h);
 }
 
 // The second image over the first at (X, Y), top-down as images are read; the function itself
@@ -354,7 +350,7 @@ Status RunMerge(const FxContext& fx) {
   cv::flip(*fx.second, src, 0);
   if (!fn(dst.data, src.data, dst.cols, dst.rows, src.cols, src.rows, static_cast<int>(src.step[0]),
           ArgI(fx, 0), ArgI(fx, 1), -1, -1, 0, 0, ArgI(fx, 2), ArgI(fx, 3))) {
-    return Failed(fx);
+    return Status::Error("mergeImage failed");
   }
   cv::flip(dst, *fx.image, 0);
   return Status::Ok();
@@ -373,7 +369,7 @@ Status RunClip(const FxContext& fx) {
   cv::Mat dst(h, w, CV_8UC4);
   if (!fn(src.data, dst.data, src.cols, src.rows, static_cast<int>(src.step[0]), w, h,
           static_cast<int>(dst.step[0]))) {
-    return Failed(fx);
+    return Status::Error("clipOutBorder failed");
   }
   *fx.image = dst;
   return Status::Ok();
