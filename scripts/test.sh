@@ -22,7 +22,7 @@ cmake --preset asan-ubsan
 cmake --build --preset asan-ubsan -j "$jobs"
 ctest --preset asan-ubsan -j "$jobs"
 
-echo "== fuzz: LUT files (libFuzzer, ASan + UBSan; corpus replay, then 60 s)"
+echo "== fuzz: LUT files (libFuzzer, ASan + UBSan; corpus replay, then 30 s)"
 cmake --preset fuzz
 cmake --build --preset fuzz -j "$jobs"
 fuzzer=build/fuzz/bin/CubeLutLoad_fuzz
@@ -32,5 +32,5 @@ mkdir -p build/fuzz/artifacts
 scratch=$(mktemp -d)
 trap 'rm -rf "$scratch"' EXIT
 cp fuzz/corpus/* "$scratch"/
-"$fuzzer" -max_total_time=60 -timeout=10 -print_final_stats=1 \
+"$fuzzer" -max_total_time=30 -timeout=10 -print_final_stats=1 \
   -artifact_prefix=build/fuzz/artifacts/ "$scratch"
