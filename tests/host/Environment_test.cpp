@@ -4,24 +4,10 @@
 #include <optional>
 #include <string>
 
+#include "support/ScopedVariable.h"
 #include "tessarofx/NLEHost.h"
 
 namespace {
-
-// Sets a variable for one test and puts the old value back afterwards.
-class ScopedVariable {
- public:
-  ScopedVariable(const char* name, const char* value) : name_(name) {
-    if (const char* old = std::getenv(name)) old_ = old;
-    Set(value);
-  }
-  ~ScopedVariable() { Set(old_ ? old_->c_str() : nullptr); }
-
- private:
-  void Set(const char* value) { value ? setenv(name_, value, 1) : unsetenv(name_); }
-  const char* name_;
-  std::optional<std::string> old_;
-};
 
 NLEComPtr<INLEEnviroment> GetEnvironment() {
   NLEComPtr<INLEEnviroment> env;

@@ -10,6 +10,7 @@
 #include <utility>
 #include <vector>
 
+#include "support/ScopedVariable.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/NLEOpenCL.h"
 
@@ -20,21 +21,6 @@ using Lines = std::vector<std::pair<int32_t, std::wstring>>;
 void CaptureSink(void* context, int32_t level, const wchar_t* message) {
   static_cast<Lines*>(context)->emplace_back(level, message);
 }
-
-// Sets a variable for one test and puts the old value back afterwards.
-class ScopedVariable {
- public:
-  ScopedVariable(const char* name, const char* value) : name_(name) {
-    if (const char* old = std::getenv(name)) old_ = old;
-    Set(value);
-  }
-  ~ScopedVariable() { Set(old_ ? old_->c_str() : nullptr); }
-  void Set(const char* value) { value ? setenv(name_, value, 1) : unsetenv(name_); }
-
- private:
-  const char* name_;
-  std::optional<std::string> old_;
-};
 
 std::vector<NLEOpenCLDeviceInfo> ListDevices() {
   uint32_t count = 0;
