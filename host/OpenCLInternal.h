@@ -30,6 +30,7 @@ class OpenCLMemory final : public OPENCL::openclMemory {
 
   OPENCL::openclMemoryInfo getOpenCLMemoryInfo() const override { return info_; }
   bool copyToMemory(OPENCL::openclMemory* source, bool copy) override;
+  bool copyFromMemory(OPENCL::openclMemory* source) override;
   bool writeData2OpenCLMemory(const char* data, size_t size, size_t offset, bool blocking,
                               cl_command_queue queue) override;
   bool readDataFromOpenCLMemory(char* data, size_t size, size_t offset, bool blocking,
@@ -68,6 +69,8 @@ class OpenCLKernel final : public OPENCL::openclKernel {
 
   bool setKernelParameters(int index, OPENCL::DataType kind, void* value, size_t size) override;
   bool runKernel(unsigned w, unsigned h, unsigned d, bool wait) override;
+  // Enqueues over `global` in work-groups of `local` (cl::NullRange: the runtime chooses).
+  bool Run(const cl::NDRange& global, const cl::NDRange& local, bool wait);
 
  private:
   const OpenCLContext& cl_;
@@ -84,6 +87,8 @@ class OpenCLProgram final : public OPENCL::openclProgram {
   bool isLoaded() const override { return loaded_; }
   const char* getName() const override { return name_.c_str(); }
   OPENCL::openclKernel* getopenclKernel(const char* name) override;
+  bool runProgramKernel(OPENCL::openclKernel* kernel, unsigned w, unsigned h, unsigned localW,
+                        unsigned localH, bool wait) override;
 
  private:
   bool Build(const std::string& source, const char* options);

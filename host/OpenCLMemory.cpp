@@ -66,33 +66,35 @@ bool OpenCLMemory::readDataFromOpenCLMemory(char* data, size_t size, size_t offs
 }
 
 bool OpenCLMemory::copyToMemory(OPENCL::openclMemory* source, bool copy) {
+  if (copy && source) return copyFromMemory(source);
+  // Filling (clEnqueueFill*) would need the runtime's 1.2 fill support for images in every
+  // driver; a zeroed host copy works everywhere and frames are cleared rarely.
+  try {
+    std::vector<char> zeros(info_.size, 0);
+    return writeData2OpenCLMemory(zeros.data(), zeros.size(), 0, true, nullptr);
+  } catch (const std::bad_alloc&) {
+    return false;
+  }
+}
+
+bool OpenCLMemory::copyFromMemory(OPENCL::openclMemory* source) {
+  if (!source) return false;
+  const OPENCL::openclMemoryInfo from = source->getOpenCLMemoryInfo();
+  if (from.kind != info_.kind || from.width != info_.width || from.height != info_.height ||
+      from.size != info_.size) {
+    return false;
+  }
+  const auto* other = static_cast<OpenCLMemory*>(source);
   cl_int err = CL_SUCCESS;
-  if (copy && source) {
-    const OPENCL::openclMemoryInfo from = source->getOpenCLMemoryInfo();
-    if (from.kind != info_.kind || from.width != info_.width || from.height != info_.height ||
-        from.size != info_.size) {
-      return false;
-    }
-    const auto* other = static_cast<OpenCLMemory*>(source);
-    if (info_.kind == OPENCL::kMemoryImage2D) {
-      const cl::array<cl::size_type, 3> origin{0, 0, 0};
-      const cl::array<cl::size_type, 3> region{static_cast<size_t>(info_.width),
-                                               static_cast<size_t>(info_.height), 1};
-      err = queue_.enqueueCopyImage(cl::Image2D(other->memory_(), true),
-                                    cl::Image2D(memory_(), true), origin, origin, region);
-    } else {
-      err = queue_.enqueueCopyBuffer(cl::Buffer(other->memory_(), true),
-                                     cl::Buffer(memory_(), true), 0, 0, info_.size);
-    }
+  if (info_.kind == OPENCL::kMemoryImage2D) {
+    const cl::array<cl::size_type, 3> origin{0, 0, 0};
+    const cl::array<cl::size_type, 3> region{static_cast<size_t>(info_.width),
+                                             static_cast<size_t>(info_.height), 1};
+    err = queue_.enqueueCopyImage(cl::Image2D(other->memory_(), true), cl::Image2D(memory_(), true),
+                                  origin, origin, region);
   } else {
-    // Filling (clEnqueueFill*) would need the runtime's 1.2 fill support for images in every
-    // driver; a zeroed host copy works everywhere and frames are cleared rarely.
-    try {
-      std::vector<char> zeros(info_.size, 0);
-      return writeData2OpenCLMemory(zeros.data(), zeros.size(), 0, true, nullptr);
-    } catch (const std::bad_alloc&) {
-      return false;
-    }
+    err = queue_.enqueueCopyBuffer(cl::Buffer(other->memory_(), true), cl::Buffer(memory_(), true),
+                                   0, 0, info_.size);
   }
   return err == CL_SUCCESS && queue_.finish() == CL_SUCCESS;
 }

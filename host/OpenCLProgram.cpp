@@ -118,10 +118,27 @@ bool OpenCLKernel::setKernelParameters(int index, OPENCL::DataType kind, void* v
   return false;
 }
 
+bool OpenCLProgram::runProgramKernel(OPENCL::openclKernel* kernel, unsigned w, unsigned h,
+                                     unsigned localW, unsigned localH, bool wait) {
+  OpenCLKernel* own = nullptr;
+  for (const auto& entry : kernels_) {
+    if (entry.second.get() == kernel) own = entry.second.get();
+  }
+  if (!own || w == 0 || h == 0) return false;
+  if (localW == 0 && localH == 0) return own->Run(cl::NDRange(w, h), cl::NullRange, wait);
+  if (localW == 0 || localH == 0 || w % localW != 0 || h % localH != 0) return false;
+  return own->Run(cl::NDRange(w, h), cl::NDRange(localW, localH), wait);
+}
+
 bool OpenCLKernel::runKernel(unsigned w, unsigned h, unsigned d, bool wait) {
   if (w == 0 || h == 0 || d == 0) return false;
-  const cl::NDRange range = d > 1 ? cl::NDRange(w, h, d) : cl::NDRange(w, h);
-  if (cl_.queue.enqueueNDRangeKernel(kernel_, cl::NullRange, range) != CL_SUCCESS) return false;
+  return Run(d > 1 ? cl::NDRange(w, h, d) : cl::NDRange(w, h), cl::NullRange, wait);
+}
+
+bool OpenCLKernel::Run(const cl::NDRange& global, const cl::NDRange& local, bool wait) {
+  if (cl_.queue.enqueueNDRangeKernel(kernel_, cl::NullRange, global, local) != CL_SUCCESS) {
+    return false;
+  }
   return !wait || cl_.queue.finish() == CL_SUCCESS;
 }
 

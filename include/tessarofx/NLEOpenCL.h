@@ -71,6 +71,9 @@ class TFX_HOST_API openclMemory {
   // kind and size is given (false otherwise). Without a source, or with `copy` clear, this memory
   // is filled with zeros (transparent black for frames). Waits for the copy to finish.
   virtual bool copyToMemory(openclMemory* source, bool copy) = 0;
+  // Device-side copy of all of `source` into this memory; false when the two differ in kind or
+  // size. Waits for the copy to finish.
+  virtual bool copyFromMemory(openclMemory* source) = 0;
   // Uploads `size` bytes at byte `offset`. Buffers take any range inside them. Images take whole
   // rows packed at rowPitch: offset and size must be multiples of it. `queue` null uses the
   // device's queue; a non-blocking write must keep `data` alive until the queue finishes.
@@ -128,6 +131,11 @@ class TFX_HOST_API openclProgram {
   // The kernel of that function name, made once and cached; null when the program is not built
   // or has no such kernel.
   virtual openclKernel* getopenclKernel(const char* name) = 0;
+  // Runs one of this program's kernels over a w x h range in work-groups of localW x localH
+  // (0 x 0: the runtime chooses) and, when `wait` is set, waits for it. False for a kernel of
+  // another program, an empty range, a range the work-group does not divide, or a runtime failure.
+  virtual bool runProgramKernel(openclKernel* kernel, unsigned w, unsigned h, unsigned localW,
+                                unsigned localH, bool wait) = 0;
 
  protected:
   ~openclProgram() = default;
