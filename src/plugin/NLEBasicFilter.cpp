@@ -192,6 +192,12 @@ double NLEBasicFilter::ParamDouble(const wchar_t* name, double fallback) const {
   return fallback;
 }
 
+int NLEBasicFilter::ParamInt(const wchar_t* name) const {
+  const double v = ParamDouble(name);
+  if (!(v > -2147483648.0 && v < 2147483648.0)) return 0;
+  return static_cast<int>(v);
+}
+
 std::wstring NLEBasicFilter::GetParamWString(const wchar_t* name,
                                              const std::wstring& fallback) const {
   auto it = paramIndex_.find(name);

@@ -50,6 +50,8 @@ class NLEBasicFilter : public scombase::CUnknown, public INLECGFilter {
   // Current value of the parameter with this friendly name, or `fallback` when the filter has no
   // such parameter or its value is not a number.
   double ParamDouble(const wchar_t* name, double fallback = 0.0) const;
+  // An integer parameter, which arrives as a number; absent, non-numeric or outside int32: 0.
+  int ParamInt(const wchar_t* name) const;
   // Current value of a text parameter, at most kMaxParamText wide characters, or `fallback` when
   // the filter has no such parameter.
   static constexpr size_t kMaxParamText = 512;

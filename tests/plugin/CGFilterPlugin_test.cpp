@@ -47,7 +47,7 @@ struct LogCapture {
   int32_t level;
 };
 
-// A device that offers OpenCL handles but no program loader behind them.
+// A device that offers the OpenCL operations but has no program manager or memory behind them.
 class FakeDevice final : public scombase::CUnknown,
                          public INLECGDevice,
                          public INLECGOpenCLOperate {
@@ -66,8 +66,8 @@ class FakeDevice final : public scombase::CUnknown,
     return NLE_S_OK;
   }
   HRESULT GetOpenCLHandles(void** manager, void** memory) override {
-    *manager = this;
-    *memory = this;
+    *manager = nullptr;
+    *memory = nullptr;
     return NLE_S_OK;
   }
 
@@ -176,7 +176,7 @@ TEST(CreateFilterFromGUID, ChoosesTheClassByTheDevice) {
   EXPECT_EQ(
       CreateFilterFromGUID(device, L"D8651B53-F47A-4B98-B8E9-35B491D5EADC", nullptr, "", &filter),
       NLE_E_INVALIDARG);
-  // OpenCL classes cannot bind without a program loader, nor to a device without OpenCL.
+  // OpenCL classes cannot bind without a program manager, nor to a device without OpenCL.
   EXPECT_EQ(CreateFilterFromGUID(device, L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356", nullptr, nullptr,
                                  &filter),
             NLE_E_INVALIDARG);

@@ -1,0 +1,36 @@
+#include "effects/ChromeKeyTables.h"
+
+namespace {
+
+uint8_t KeyByte(int v) { return static_cast<uint8_t>(v < 0 ? 0 : (v > 255 ? 255 : v)); }
+
+}  // namespace
+
+ChromeKeyTables::ChromeKeyTables() : beauty_(new CubeLut()), alpha_(new CubeLut()) {
+  // 64 points, so that the tables are applied over the whole lattice the generator fills.
+  beauty_->generateLUT3DData(NLEChromeKeyLut3dGenerator::kPoints);
+  alpha_->generateLUT3DData(NLEChromeKeyLut3dGenerator::kPoints);
+}
+
+ChromeKeyTables::Rebuilt ChromeKeyTables::KeepCurrent(int red, int green, int blue, double contrast,
+                                                      double offset) {
+  const bool keyChanged = red != lastRed_ || green != lastGreen_ || blue != lastBlue_;
+  if (keyChanged) {
+    lastRed_ = red;
+    lastGreen_ = green;
+    lastBlue_ = blue;
+  }
+  const bool shapeChanged = contrast != lastContrast_ || offset != lastOffset_;
+  if (shapeChanged) {
+    lastContrast_ = contrast;
+    lastOffset_ = offset;
+  }
+  if (!keyChanged && !shapeChanged) return {};
+  generator_.setLutParam(NLEChromeKeyLut3dGenerator::DefaultParam(KeyByte(red), KeyByte(green),
+                                                                  KeyByte(blue), contrast, offset));
+  if (keyChanged) {
+    generator_.getBeautyLut(beauty_->getLut3DData(nullptr, nullptr, nullptr, nullptr));
+  }
+  generator_.getAlphaLut(alpha_->getLut3DData(nullptr, nullptr, nullptr, nullptr));
+  return {keyChanged, true};
+}

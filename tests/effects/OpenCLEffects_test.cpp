@@ -1,0 +1,306 @@
+// The OpenCL classes against their CPU twins on the same frames, and the "LUT" kernel against
+// the plain tetrahedral formula over every 8-bit colour.
+#include <gtest/gtest.h>
+#include <stdlib.h>
+
+#include <cmath>
+#include <fstream>
+#include <limits>
+#include <random>
+#include <string>
+
+#include "../tools/DemoScene.h"
+#include "lut/CubeLutApply.h"
+#include "support/EffectHarness.h"
+#include "support/OpenCLHarness.h"
+#include "tessarofx/CubeLut.h"
+
+namespace {
+
+using tfx_test::Bytes;
+using tfx_test::CompareBytes;
+namespace Key = NLEKey::Filter;
+constexpr const wchar_t* kAToWhite = L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356";
+constexpr const wchar_t* kWhiteBalance = L"39509FB9-39FB-4516-9464-3D891DD61D62";
+constexpr const wchar_t* kLut = L"74EB022D-1D73-4D1E-9F70-487C356D46CD";
+constexpr const wchar_t* kChromeKey = L"DB4BBA18-48FC-4164-B572-E59757B02796";
+
+Bytes RandomPixels(int width, int height, unsigned salt) {
+  std::mt19937 rng(salt);
+  Bytes out(static_cast<size_t>(width) * height * 4);
+  for (auto& b : out) b = static_cast<uint8_t>(rng());
+  return out;
+}
+
+Bytes DemoPixels() {
+  const cv::Mat scene = tfxtool::MakeDemoScene(960, 540);
+  return Bytes(scene.data, scene.data + scene.total() * scene.elemSize());
+}
+
+// Host settings with one text parameter.
+NLEComPtr<INLEProperties> TextSettings(const wchar_t* name, const std::wstring& value) {
+  NLEComPtr<INLEProperties> props, p;
+  NLECommon::CreateProperties(&props);
+  NLECommon::CreateProperties(&p);
+  p->SetString(Key::Property::kVariantName, name);
+  p->SetString(Key::Property::kFriendName, name);
+  p->SetInt(Key::Property::kType, NLEFilterPropertyType_String);
+  p->SetString(Key::Property::kValue_Default, L"");
+  p->SetString(Key::Property::kValue_Current, value.c_str());
+  props->SetInterface(Key::Property::kParamsArray[0], p.get());
+  props->SetInt(Key::Property::kCount, 1);
+  return props;
+}
+
+class OpenCLEffects : public tfx_test::OpenCLEffectTest {};
+
+TEST_F(OpenCLEffects, AToWhiteMatchesTheCpuClassExactly) {
+  Bytes pixels = RandomPixels(333, 97, 1);
+  for (size_t i = 3; i < pixels.size(); i += 16) pixels[i] = 0;  // every fourth pixel clear
+  NLEComPtr<INLECGFilter> cpu = tfx_test::CreateEffect(kAToWhite, nullptr);
+  NLEComPtr<INLECGFilter> gpu = CreateOnDevice(kAToWhite, nullptr);
+  const Bytes expected = RunOnCpu(cpu.get(), pixels, 333, 97);
+  EXPECT_EQ(RunOnDevice(gpu.get(), pixels, 333, 97), expected);
+  EXPECT_EQ(RunOnDevice(gpu.get(), {10, 20, 30, 0, 10, 20, 30, 1}, 2, 1),
+            (Bytes{0, 0, 0, 255, 10, 20, 30, 1}));
+}
+
+TEST_F(OpenCLEffects, WhiteBalanceFollowsTheCpuClassWithinALevel) {
+  const Bytes pixels = RandomPixels(256, 64, 2);
+  size_t differing = 0;
+  for (double temperature : {-100.0, -37.0, 0.0, 13.0, 100.0}) {
+    for (double tint : {-100.0, -51.0, 0.0, 77.0, 100.0}) {
+      // Gains are accepted and, on both paths, left out.
+      NLEComPtr<INLEProperties> settings = tfx_test::Settings(
+          {{L"u_temperature", temperature}, {L"u_tint", tint}, {L"u_rgain", 3.0}});
+      NLEComPtr<INLECGFilter> cpu = tfx_test::CreateEffect(kWhiteBalance, settings.get());
+      NLEComPtr<INLECGFilter> gpu = CreateOnDevice(kWhiteBalance, settings.get());
+      const Bytes expected = RunOnCpu(cpu.get(), pixels, 256, 64);
+      const tfx_test::ByteDiff d = CompareBytes(RunOnDevice(gpu.get(), pixels, 256, 64), expected);
+      EXPECT_LE(d.largest, 1) << temperature << " " << tint;
+      differing += d.count;
+      if (temperature == 0 && tint == 0) {
+        EXPECT_EQ(expected, pixels);
+      }
+    }
+  }
+  // The factors are derived in two precisions; they rarely land on different sides of a level.
+  EXPECT_LT(differing, pixels.size() / 100);
+}
+
+// Every byte triple once: a 4096 x 4096 frame.
+Bytes EveryColour() {
+  Bytes out(size_t{1} << 26);
+  for (uint32_t i = 0; i < (1u << 24); ++i) {
+    out[4 * size_t{i}] = static_cast<uint8_t>(i);
+    out[4 * size_t{i} + 1] = static_cast<uint8_t>(i >> 8);
+    out[4 * size_t{i} + 2] = static_cast<uint8_t>(i >> 16);
+    out[4 * size_t{i} + 3] = static_cast<uint8_t>(i * 7);
+  }
+  return out;
+}
+
+// A lattice of N points whose values reach every branch of the byte rounding: below -0.5 (wraps),
+// above 255, exact halves, NaN, infinities and values outside 32 bits.
+void FillHostileLattice(CubeLut* lut, int n, unsigned salt) {
+  lut->generateLUT3DData(n);
+  float* lattice = lut->getLut3DData(nullptr, nullptr, nullptr, nullptr);
+  std::mt19937 rng(salt);
+  std::uniform_real_distribution<float> value(-300.0f, 600.0f);
+  const float specials[] = {std::numeric_limits<float>::quiet_NaN(),
+                            std::numeric_limits<float>::infinity(),
+                            -std::numeric_limits<float>::infinity(),
+                            -2147483648.0f,
+                            -2147483904.0f,
+                            3e9f,
+                            254.5f,
+                            -0.5f,
+                            -1.5f,
+                            0.49999997f,
+                            -300.5f};
+  for (int i = 0; i < n; ++i) {
+    for (int j = 0; j < n; ++j) {
+      for (int k = 0; k < n; ++k) {
+        float* p = lattice + ((i * 64 + j) * 64 + k) * 3;
+        for (int c = 0; c < 3; ++c) {
+          const uint32_t pick = rng() % 64;
+          p[c] = pick < std::size(specials) ? specials[pick]
+                 : pick < 40                ? std::round(value(rng) * 2.0f) / 2.0f
+                                            : value(rng);
+        }
+      }
+    }
+  }
+}
+
+TEST_F(OpenCLEffects, LutKernelIsTheTetrahedralFormulaToTheByte) {
+  NLEComPtr<INLECGOpenCLOperate> operate;
+  ASSERT_EQ(device_.QueryInterface(IID_INLECGOpenCLOperate, &operate), NLE_S_OK);
+  void* programs = nullptr;
+  void* handle = nullptr;
+  ASSERT_EQ(operate->GetOpenCLHandles(&programs, &handle), NLE_S_OK);
+  auto* manager = static_cast<OPENCL::openclProgramManager*>(programs);
+  auto* memory = static_cast<OPENCL::openclMemManager*>(handle);
+  OPENCL::openclProgram* program = manager->createOpenCLProgram("LUT");
+  ASSERT_TRUE(program && program->loadProgram(TFX_KERNEL_DIR, nullptr, nullptr, 0));
+  OPENCL::openclKernel* kernel = program->getopenclKernel("MAIN");
+  ASSERT_NE(kernel, nullptr);
+
+  const Bytes every = EveryColour();
+  const Bytes sample(every.begin(), every.begin() + (size_t{1} << 22));  // a quarter of the reds
+  struct Case {
+    int n;
+    const Bytes* pixels;
+  };
+  for (const Case& c : {Case{64, &every}, Case{2, &sample}, Case{17, &sample}, Case{33, &sample},
+                        Case{52, &sample}}) {
+    CubeLut lut;
+    FillHostileLattice(&lut, c.n, static_cast<unsigned>(c.n));
+    const int width = 4096, height = static_cast<int>(c.pixels->size() / 4 / 4096);
+    Bytes expected = *c.pixels;
+    const tfx::TetraTable table{lut.getLut3DData(nullptr, nullptr, nullptr, nullptr),
+                                lut.getFTData(nullptr), lut.getGTData(nullptr), c.n};
+    tfx::TetraRowReference(table, expected.data(), width * height, 4);
+
+    OPENCL::openclMemory *src = nullptr, *dst = nullptr, *lattice = nullptr, *ft = nullptr,
+                         *gt = nullptr;
+    ASSERT_TRUE(memory->createOpenCLFrameMem(width, height, OPENCL::kMemoryFrameBuffer,
+                                             c.pixels->data(), 0, &src));
+    ASSERT_TRUE(
+        memory->createOpenCLFrameMem(width, height, OPENCL::kMemoryFrameBuffer, nullptr, 0, &dst));
+    ASSERT_TRUE(memory->createOpenCLMem(OPENCL::kMemBufferReadOnly, 64 * 64 * 64 * 3 * 4,
+                                        table.lattice, &lattice));
+    ASSERT_TRUE(memory->createOpenCLMem(OPENCL::kMemBufferReadOnly, 1024, table.ft, &ft));
+    ASSERT_TRUE(memory->createOpenCLMem(OPENCL::kMemBufferReadOnly, 1024, table.gt, &gt));
+    int32_t axis = 64, point = 3, n = c.n;
+    OPENCL::openclMemory* args[] = {src, dst, lattice, ft, gt};
+    for (int i = 0; i < 5; ++i) {
+      ASSERT_TRUE(kernel->setKernelParameters(i, OPENCL::kDataMemory, &args[i], 8));
+    }
+    ASSERT_TRUE(kernel->setKernelParameters(5, OPENCL::kDataScalar, &axis, 4));
+    ASSERT_TRUE(kernel->setKernelParameters(6, OPENCL::kDataScalar, &point, 4));
+    ASSERT_TRUE(kernel->setKernelParameters(7, OPENCL::kDataScalar, &n, 4));
+    ASSERT_TRUE(program->runProgramKernel(kernel, width, height, 0, 0, true));
+    Bytes got(expected.size());
+    ASSERT_TRUE(dst->readDataFromOpenCLMemory(reinterpret_cast<char*>(got.data()), got.size(), 0,
+                                              true, nullptr));
+    const tfx_test::ByteDiff d = CompareBytes(got, expected);
+    EXPECT_EQ(d.count, 0u) << "N = " << c.n << ", largest difference " << d.largest;
+    for (OPENCL::openclMemory* m : args) memory->releaseOpenCLMem(m);
+  }
+}
+
+class OpenCLLutFiles : public OpenCLEffects {
+ protected:
+  void SetUp() override {
+    OpenCLEffects::SetUp();
+    char pattern[] = "/tmp/tfx-opencl-lut-XXXXXX";
+    ASSERT_NE(mkdtemp(pattern), nullptr);
+    dir_ = pattern;
+  }
+  void TearDown() override { std::system(("rm -rf '" + dir_ + "'").c_str()); }
+
+  std::wstring Write(const std::string& name, const std::string& text) {
+    std::ofstream(dir_ + "/" + name) << text;
+    const std::string path = dir_ + "/" + name;
+    return std::wstring(path.begin(), path.end());
+  }
+
+  std::string dir_;
+};
+
+TEST_F(OpenCLLutFiles, LutMatchesTheCpuClassOnTheDemoGradeAndPassesUnreadableFilesThrough) {
+  const Bytes scene = DemoPixels();
+  const Bytes noise = RandomPixels(640, 360, 3);
+  for (int size : {17, 33, 64}) {
+    NLEComPtr<INLEProperties> settings =
+        TextSettings(L"lut3dPath", Write("grade.cube", tfxtool::MakeDemoLut(size)));
+    NLEComPtr<INLECGFilter> cpu = tfx_test::CreateEffect(kLut, settings.get());
+    NLEComPtr<INLECGFilter> gpu = CreateOnDevice(kLut, settings.get());
+    EXPECT_EQ(RunOnDevice(gpu.get(), scene, 960, 540), RunOnCpu(cpu.get(), scene, 960, 540))
+        << size;
+    EXPECT_EQ(RunOnDevice(gpu.get(), noise, 640, 360), RunOnCpu(cpu.get(), noise, 640, 360))
+        << size;
+  }
+
+  // A file that cannot be read, or one of 65 points, leaves a copy; an empty path is an error
+  // that leaves the destination as it was.
+  Write("big.cube", "LUT_3D_SIZE 65\n");
+  for (const std::wstring& path :
+       {Write("grade.txt", tfxtool::MakeDemoLut(9)), std::wstring(L"/nonexistent/x.cube"),
+        Write("big.cube", "LUT_3D_SIZE 65\n0 0 0\n")}) {
+    NLEComPtr<INLECGFilter> gpu = CreateOnDevice(kLut, TextSettings(L"lut3dPath", path).get());
+    EXPECT_EQ(RunOnDevice(gpu.get(), noise, 640, 360), noise);
+  }
+  NLEComPtr<INLECGFilter> empty = CreateOnDevice(kLut, TextSettings(L"lut3dPath", L"").get());
+  HRESULT status = 0;
+  EXPECT_EQ(RunOnDevice(empty.get(), noise, 640, 360, &status, 0xEE), Bytes(noise.size(), 0xEE));
+  EXPECT_EQ(status, NLE_E_RESOURCE);
+}
+
+TEST_F(OpenCLLutFiles, LutFollowsThePathFromFrameToFrame) {
+  const std::wstring warm = Write("warm.cube", tfxtool::MakeDemoLut(9));
+  const std::wstring flat = Write("flat.cube", "LUT_3D_SIZE 2\n" + std::string(8, ' ') +
+                                                   "0.5 0.5 0.5\n0.5 0.5 0.5\n0.5 0.5 0.5\n"
+                                                   "0.5 0.5 0.5\n0.5 0.5 0.5\n0.5 0.5 0.5\n"
+                                                   "0.5 0.5 0.5\n0.5 0.5 0.5\n");
+  NLEComPtr<INLEProperties> settings = TextSettings(L"lut3dPath", warm);
+  NLEComPtr<INLECGFilter> gpu = CreateOnDevice(kLut, settings.get());
+  NLEComPtr<INLECGFilter> cpu = tfx_test::CreateEffect(kLut, settings.get());
+  const Bytes noise = RandomPixels(64, 64, 4);
+  EXPECT_EQ(RunOnDevice(gpu.get(), noise, 64, 64), RunOnCpu(cpu.get(), noise, 64, 64));
+
+  NLEComPtr<INLEProperties> param;
+  ASSERT_EQ(gpu->GetParamPropertyFromName(L"lut3dPath", &param), NLE_S_OK);
+  param->SetString(Key::Property::kValue_Current, flat.c_str());
+  gpu->ParamValueChanged();
+  // The new table applies from the next frame: mid-grey everywhere, alpha kept.
+  NLEComPtr<INLECGFilter> cpuFlat =
+      tfx_test::CreateEffect(kLut, TextSettings(L"lut3dPath", flat).get());
+  const Bytes grey = RunOnDevice(gpu.get(), noise, 64, 64);
+  EXPECT_EQ(grey, RunOnCpu(cpuFlat.get(), noise, 64, 64));
+  for (size_t i = 0; i < grey.size(); ++i) {
+    ASSERT_TRUE(i % 4 == 3 ? grey[i] == noise[i] : grey[i] == 127 || grey[i] == 128) << i;
+  }
+}
+
+TEST_F(OpenCLEffects, ChromeKeyMatchesTheCpuClassInBothModes) {
+  const Bytes scene = DemoPixels();
+  const tfxtool::Rgb screen = tfxtool::DemoScreenColour();
+  NLEComPtr<INLEProperties> settings = tfx_test::Settings({{L"red", screen.r},
+                                                           {L"green", screen.g},
+                                                           {L"blue", screen.b},
+                                                           {L"contrast", 50.0},
+                                                           {L"offset", 0.0},
+                                                           {L"mode", 0}});
+  NLEComPtr<INLECGFilter> cpu = tfx_test::CreateEffect(kChromeKey, settings.get());
+  NLEComPtr<INLECGFilter> gpu = CreateOnDevice(kChromeKey, settings.get());
+  const auto expectSame = [&](const char* what) {
+    const Bytes expected = RunOnCpu(cpu.get(), scene, 960, 540);
+    const tfx_test::ByteDiff d = CompareBytes(RunOnDevice(gpu.get(), scene, 960, 540), expected);
+    EXPECT_EQ(d.count, 0u) << what << ": largest difference " << d.largest;
+    return expected;
+  };
+  const Bytes mask = expectSame("mask");
+  for (INLECGFilter* f : {cpu.get(), gpu.get()}) tfx_test::SetParam(f, L"mode", 1);
+  const Bytes beauty = expectSame("colours");
+  EXPECT_NE(mask, beauty);
+  for (INLECGFilter* f : {cpu.get(), gpu.get()}) tfx_test::SetParam(f, L"contrast", 80.0);
+  expectSame("colours after a contrast change");
+  for (INLECGFilter* f : {cpu.get(), gpu.get()}) tfx_test::SetParam(f, L"mode", 0);
+  expectSame("mask after a contrast change");
+
+  // Another mode keeps the table the device applied last; the CPU class copies instead.
+  tfx_test::SetParam(gpu.get(), L"mode", 2);
+  tfx_test::SetParam(gpu.get(), L"blue", screen.b + 40);  // rebuilt tables, still the mask
+  for (INLECGFilter* f : {cpu.get()}) tfx_test::SetParam(f, L"blue", screen.b + 40);
+  EXPECT_EQ(RunOnDevice(gpu.get(), scene, 960, 540), RunOnCpu(cpu.get(), scene, 960, 540));
+  // ... and a filter that never had a table has nothing to run.
+  NLEComPtr<INLECGFilter> fresh =
+      CreateOnDevice(kChromeKey, tfx_test::Settings({{L"green", 255}, {L"mode", 2}}).get());
+  HRESULT status = 0;
+  RunOnDevice(fresh.get(), scene, 960, 540, &status);
+  EXPECT_EQ(status, NLE_E_RESOURCE);
+}
+
+}  // namespace

@@ -1,0 +1,313 @@
+#include "plugin/NLEBasicCrossFilter.h"
+
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <map>
+
+#include "support/EffectHarness.h"
+#include "support/OpenCLHarness.h"
+#include "support/TestFrame.h"
+
+namespace {
+
+using tfx_test::Bytes;
+constexpr const wchar_t* kAToWhite = L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356";
+constexpr const wchar_t* kWhiteBalance = L"39509FB9-39FB-4516-9464-3D891DD61D62";
+constexpr const wchar_t* kLut = L"74EB022D-1D73-4D1E-9F70-487C356D46CD";
+constexpr const wchar_t* kChromeKey = L"DB4BBA18-48FC-4164-B572-E59757B02796";
+
+// Device memory that counts the uploads made into it.
+class CountingMemory final : public OPENCL::openclMemory {
+ public:
+  CountingMemory(OPENCL::openclMemory* real, int* writes) : real_(real), writes_(writes) {}
+  virtual ~CountingMemory() = default;
+  OPENCL::openclMemory* real() const { return real_; }
+
+  OPENCL::openclMemoryInfo getOpenCLMemoryInfo() const override {
+    return real_->getOpenCLMemoryInfo();
+  }
+  bool copyToMemory(OPENCL::openclMemory* source, bool copy) override {
+    return real_->copyToMemory(Unwrap(source), copy);
+  }
+  bool copyFromMemory(OPENCL::openclMemory* source) override {
+    return real_->copyFromMemory(Unwrap(source));
+  }
+  bool writeData2OpenCLMemory(const char* data, size_t size, size_t offset, bool blocking,
+                              cl_command_queue queue) override {
+    ++*writes_;
+    return real_->writeData2OpenCLMemory(data, size, offset, blocking, queue);
+  }
+  bool readDataFromOpenCLMemory(char* data, size_t size, size_t offset, bool blocking,
+                                cl_command_queue queue) override {
+    return real_->readDataFromOpenCLMemory(data, size, offset, blocking, queue);
+  }
+  void* getNativeHandle() const override { return real_->getNativeHandle(); }
+
+  static OPENCL::openclMemory* Unwrap(OPENCL::openclMemory* m) {
+    auto* counted = dynamic_cast<CountingMemory*>(m);
+    return counted ? counted->real_ : m;
+  }
+
+ private:
+  OPENCL::openclMemory* real_;
+  int* writes_;
+};
+
+// A real device whose memory manager counts what the plug-in makes, uploads and frees.
+class CountingDevice final : public scombase::CUnknown,
+                             public INLECGDevice,
+                             public INLECGOpenCLOperate,
+                             public OPENCL::openclMemManager {
+ public:
+  explicit CountingDevice(INLECGDevice* real) : CUnknown(L"CountingDevice", nullptr), real_(real) {
+    NLEComPtr<INLECGOpenCLOperate> operate;
+    EXPECT_EQ(real_.QueryInterface(IID_INLECGOpenCLOperate, &operate), NLE_S_OK);
+    void* memory = nullptr;
+    EXPECT_EQ(operate->GetOpenCLHandles(&programs_, &memory), NLE_S_OK);
+    memory_ = static_cast<OPENCL::openclMemManager*>(memory);
+  }
+  ~CountingDevice() override { EXPECT_TRUE(live_.empty()) << live_.size() << " not freed"; }
+
+  NLE_DECLARE_IUNKNOWN
+  HRESULT NonDelegatingQueryInterface(REFIID iid, void** out) override {
+    if (iid == IID_INLECGDevice) return GetInterface(static_cast<INLECGDevice*>(this), out);
+    if (iid == IID_INLECGOpenCLOperate)
+      return GetInterface(static_cast<INLECGOpenCLOperate*>(this), out);
+    return CUnknown::NonDelegatingQueryInterface(iid, out);
+  }
+  HRESULT GetName(wchar_t* buf, uint32_t capacity) override {
+    return real_->GetName(buf, capacity);
+  }
+  HRESULT GetOpenCLHandles(void** manager, void** memory) override {
+    *manager = programs_;
+    *memory = static_cast<OPENCL::openclMemManager*>(this);
+    return NLE_S_OK;
+  }
+
+  bool createOpenCLMem(OPENCL::MemoryType type, int size, const void* init,
+                       OPENCL::openclMemory** out) override {
+    ++creates;
+    if (!memory_->createOpenCLMem(type, size, init, out)) return false;
+    *out = Track(*out);
+    return true;
+  }
+  bool createOpenCLFrameMem(int width, int height, OPENCL::MemoryKind kind, const void* bgra,
+                            int stride, OPENCL::openclMemory** out) override {
+    if (!memory_->createOpenCLFrameMem(width, height, kind, bgra, stride, out)) return false;
+    *out = Track(*out);
+    return true;
+  }
+  void releaseOpenCLMem(OPENCL::openclMemory* memory) override {
+    if (!memory) return;
+    ++releases;
+    auto* counted = static_cast<CountingMemory*>(memory);
+    EXPECT_EQ(live_.erase(counted), 1u);
+    memory_->releaseOpenCLMem(counted->real());
+    delete counted;
+  }
+
+  int creates = 0;
+  int writes = 0;
+  int releases = 0;
+
+ private:
+  OPENCL::openclMemory* Track(OPENCL::openclMemory* real) {
+    auto* counted = new CountingMemory(real, &writes);
+    live_[counted] = true;
+    return counted;
+  }
+
+  NLEComPtr<INLECGDevice> real_;
+  void* programs_ = nullptr;
+  OPENCL::openclMemManager* memory_ = nullptr;
+  std::map<CountingMemory*, bool> live_;
+};
+
+class CrossFilter : public tfx_test::OpenCLEffectTest {
+ protected:
+  // The filter object behind the host's interface, as this library made it.
+  static NLEBasicCrossFilter* Object(INLECGFilter* filter) {
+    return dynamic_cast<NLEBasicCrossFilter*>(filter);
+  }
+};
+
+TEST_F(CrossFilter, RunningNeedsABoundFilterAndADeviceDestination) {
+  NLEBasicCrossFilter* unbound = NLEBasicCrossFilter::create(kAToWhite);
+  ASSERT_NE(unbound, nullptr);
+  NLEComPtr<INLECGFilter> hold(unbound);
+  NLEComPtr<INLEOpenCLFrame> src = DeviceFrame(4, 2, Bytes(32, 7));
+  NLEComPtr<INLEOpenCLFrame> dst = DeviceFrame(4, 2);
+  unbound->SetForeground(src.get());
+  EXPECT_EQ(unbound->Running(nullptr), NLE_E_INVALIDARG);
+  EXPECT_EQ(unbound->Running(dst.get()), NLE_E_RESOURCE);  // before InitFilter
+
+  NLEComPtr<INLECGFilter> filter = CreateOnDevice(kAToWhite, nullptr);
+  ASSERT_TRUE(filter);
+  filter->SetForeground(src.get());
+  // Destinations without device memory: a memory frame, and a mapped surface.
+  NLEComPtr<TestFrame> memory(new TestFrame(4, 2, 0, false, 9));
+  NLEComPtr<TestFrame> mapped(new TestFrame(4, 2, 0, true, 9));
+  EXPECT_EQ(filter->Running(memory.get()), NLE_E_INVALIDARG);
+  EXPECT_EQ(filter->Running(mapped.get()), NLE_E_INVALIDARG);
+  EXPECT_EQ(memory->pixels, Bytes(32, 9));
+  EXPECT_EQ(mapped->surfaceReleases, 1);  // the surface was given back
+  // No source frame at all, and a source of another size.
+  filter->SetForeground(nullptr);
+  EXPECT_EQ(filter->Running(dst.get()), NLE_E_RESOURCE);
+  NLEComPtr<INLEOpenCLFrame> other = DeviceFrame(2, 4);
+  filter->SetForeground(other.get());
+  EXPECT_EQ(filter->Running(dst.get()), NLE_E_INVALIDARG);
+  // The background serves when it is the only device frame.
+  filter->SetForeground(memory.get());
+  filter->SetBackground(src.get());
+  EXPECT_EQ(filter->Running(dst.get()), NLE_S_OK);
+  EXPECT_EQ(Download(dst.get()), Bytes(32, 7));
+}
+
+TEST_F(CrossFilter, EveryOpenCLClassIsCreatedOnADeviceWithTheShippedKernels) {
+  for (const wchar_t* guid : {kAToWhite, kWhiteBalance, kLut, kChromeKey}) {
+    NLEComPtr<INLECGFilter> filter;
+    ASSERT_EQ(CreateFilterFromGUID(device_.get(), guid, nullptr, TFX_KERNEL_DIR,
+                                   reinterpret_cast<void**>(&filter)),
+              NLE_S_OK);
+    ASSERT_NE(Object(filter.get()), nullptr);  // the OpenCL class, not the CPU one
+  }
+  // A fresh device has none of the programs yet, and no kernel directory to build them from.
+  NLEComPtr<INLECGDevice> fresh;
+  ASSERT_EQ(NLECommon::CreateOpenCLDevice(-1, &fresh), NLE_S_OK);
+  void* filter = nullptr;
+  EXPECT_EQ(CreateFilterFromGUID(fresh.get(), kWhiteBalance, nullptr, "/nonexistent", &filter),
+            NLE_E_INVALIDARG);
+  EXPECT_EQ(filter, nullptr);
+}
+
+TEST_F(CrossFilter, FiltersOnOneDeviceShareTheirProgram) {
+  NLEComPtr<INLECGOpenCLOperate> operate;
+  ASSERT_EQ(device_.QueryInterface(IID_INLECGOpenCLOperate, &operate), NLE_S_OK);
+  void* programs = nullptr;
+  void* memory = nullptr;
+  ASSERT_EQ(operate->GetOpenCLHandles(&programs, &memory), NLE_S_OK);
+  auto* manager = static_cast<OPENCL::openclProgramManager*>(programs);
+  EXPECT_EQ(manager->getOpenCLProgram("lutAToWhiteEffect"), nullptr);
+
+  NLEComPtr<INLECGFilter> first = CreateOnDevice(kAToWhite, nullptr);
+  OPENCL::openclProgram* program = manager->getOpenCLProgram("lutAToWhiteEffect");
+  ASSERT_NE(program, nullptr);
+  EXPECT_TRUE(program->isLoaded());
+  // The second filter finds the built program, so a directory without the source is no obstacle.
+  NLEComPtr<INLECGFilter> second;
+  ASSERT_EQ(CreateFilterFromGUID(device_.get(), kAToWhite, nullptr, "/nonexistent",
+                                 reinterpret_cast<void**>(&second)),
+            NLE_S_OK);
+  EXPECT_EQ(manager->getOpenCLProgram("lutAToWhiteEffect"), program);
+  // The LUT and chroma-key classes share "LUT" the same way.
+  NLEComPtr<INLECGFilter> lut = CreateOnDevice(kLut, nullptr);
+  NLEComPtr<INLECGFilter> key;
+  EXPECT_EQ(CreateFilterFromGUID(device_.get(), kChromeKey, nullptr, "/nonexistent",
+                                 reinterpret_cast<void**>(&key)),
+            NLE_S_OK);
+
+  // Both run with their own kernel objects.
+  Bytes pixels = {1, 2, 3, 0, 4, 5, 6, 7};
+  EXPECT_EQ(RunOnDevice(first.get(), pixels, 2, 1), (Bytes{0, 0, 0, 255, 4, 5, 6, 7}));
+  EXPECT_EQ(RunOnDevice(second.get(), pixels, 2, 1), (Bytes{0, 0, 0, 255, 4, 5, 6, 7}));
+}
+
+// Exposes the parameter block's device memory.
+class ParamProbe final : public NLEBasicCrossFilter {
+ public:
+  using NLEBasicCrossFilter::ParamMemory;
+};
+
+template <typename T>
+T At(const Bytes& block, size_t offset) {
+  T v;
+  std::memcpy(&v, block.data() + offset, sizeof v);
+  return v;
+}
+
+TEST_F(CrossFilter, TheParameterBlockIsUploadedOnlyWhenItChanges) {
+  CountingDevice* counting = new CountingDevice(device_.get());
+  NLEComPtr<INLECGDevice> device(counting);
+  {
+    NLEComPtr<ParamProbe> probe(new ParamProbe());
+    EXPECT_EQ(probe->CallParam(nullptr, nullptr), NLE_E_RESOURCE);  // not bound to a device
+    ASSERT_EQ(probe->InitFilter(device.get(), ""), NLE_S_OK);
+    OPENCL::openclMemory *a = nullptr, *b = nullptr;
+    ASSERT_TRUE(counting->createOpenCLFrameMem(6, 3, OPENCL::kMemoryFrameBuffer, nullptr, 0, &a));
+    ASSERT_TRUE(counting->createOpenCLFrameMem(5, 7, OPENCL::kMemoryFrameBuffer, nullptr, 0, &b));
+    const int framesWrites = counting->writes;
+
+    NLERational rate{30000, 1001};
+    probe->SetFramerate(rate);
+    probe->SetCurrentTime(90);
+    probe->SetTotalTime(300);
+    probe->SetRegionOfIntrest({0.25, 0.5, 0.5, 0.25}, {0.125, 0.0, 1.0, 0.75});
+    probe->SetAngle(30.0);
+    ASSERT_EQ(probe->CallParam(a, b), NLE_S_OK);
+    EXPECT_EQ(counting->creates, 1);
+    EXPECT_EQ(counting->writes, framesWrites);  // created from the block, not written after
+    OPENCL::openclMemory* block = probe->ParamMemory();
+    ASSERT_NE(block, nullptr);
+    ASSERT_EQ(block->getOpenCLMemoryInfo().size, 108u);
+    Bytes bytes(108);
+    ASSERT_TRUE(block->readDataFromOpenCLMemory(reinterpret_cast<char*>(bytes.data()), 108, 0, true,
+                                                nullptr));
+    EXPECT_EQ(At<int32_t>(bytes, 0), 6);
+    EXPECT_EQ(At<int32_t>(bytes, 4), 5);
+    EXPECT_EQ(At<int32_t>(bytes, 32), 3);
+    EXPECT_EQ(At<int32_t>(bytes, 36), 7);
+    EXPECT_EQ(At<float>(bytes, 64), static_cast<float>(90 / (30000.0 / 1001.0)));
+    EXPECT_EQ(At<float>(bytes, 68), static_cast<float>(300 / (30000.0 / 1001.0)));
+    EXPECT_EQ(At<float>(bytes, 72), 0.125f);  // inner region first
+    EXPECT_EQ(At<float>(bytes, 84), 0.75f);
+    EXPECT_EQ(At<float>(bytes, 88), 0.25f);  // then the region of interest
+    EXPECT_EQ(At<float>(bytes, 100), 0.25f);
+    EXPECT_EQ(At<float>(bytes, 104), 30.0f);
+    for (size_t zero : {8u, 28u, 40u, 60u}) EXPECT_EQ(At<int32_t>(bytes, zero), 0) << zero;
+
+    // The same block again is not uploaded; a changed one is, once.
+    ASSERT_EQ(probe->CallParam(a, b), NLE_S_OK);
+    EXPECT_EQ(counting->writes, framesWrites);
+    probe->SetCurrentTime(91);
+    ASSERT_EQ(probe->CallParam(a, b), NLE_S_OK);
+    ASSERT_EQ(probe->CallParam(a, b), NLE_S_OK);
+    EXPECT_EQ(counting->writes, framesWrites + 1);
+    ASSERT_EQ(probe->CallParam(b, nullptr), NLE_S_OK);  // the sizes are part of the block
+    EXPECT_EQ(counting->writes, framesWrites + 2);
+    EXPECT_EQ(counting->creates, 1);
+    ASSERT_TRUE(block->readDataFromOpenCLMemory(reinterpret_cast<char*>(bytes.data()), 108, 0, true,
+                                                nullptr));
+    EXPECT_EQ(At<int32_t>(bytes, 0), 5);
+    EXPECT_EQ(At<int32_t>(bytes, 4), 0);
+    counting->releaseOpenCLMem(a);
+    counting->releaseOpenCLMem(b);
+  }
+  // The filter gave its block back to the device's memory manager.
+  EXPECT_EQ(counting->releases, 3);
+}
+
+TEST_F(CrossFilter, LutTablesGoUpOnlyWhenTheTablesChange) {
+  CountingDevice* counting = new CountingDevice(device_.get());
+  NLEComPtr<INLECGDevice> device(counting);
+  // The class registers no parameters: a host hands them over with its settings.
+  NLEComPtr<INLEProperties> settings = tfx_test::Settings({{L"green", 255}, {L"contrast", 50}});
+  NLEComPtr<INLECGFilter> key;
+  ASSERT_EQ(CreateFilterFromGUID(device.get(), kChromeKey, settings.get(), TFX_KERNEL_DIR,
+                                 reinterpret_cast<void**>(&key)),
+            NLE_S_OK);
+  Bytes pixels(16 * 4, 200);
+  RunOnDevice(key.get(), pixels, 4, 4);
+  EXPECT_EQ(counting->creates, 6);  // both tables' three buffers
+  RunOnDevice(key.get(), pixels, 4, 4);
+  EXPECT_EQ(counting->creates, 6);
+  tfx_test::SetParam(key.get(), L"contrast", 70.0);  // the alpha table alone
+  RunOnDevice(key.get(), pixels, 4, 4);
+  EXPECT_EQ(counting->creates, 9);
+  EXPECT_EQ(counting->releases, 3);
+  key = nullptr;
+  EXPECT_EQ(counting->releases, 9);
+}
+
+}  // namespace
