@@ -21,6 +21,7 @@ Status ApplyCommand(const GlobalOptions& options, const Args& args);
 Status FxCommand(const GlobalOptions& options, const Args& args);
 Status DemoCommand(const GlobalOptions& options, const Args& args);
 Status LutCommand(const GlobalOptions& options, const Args& args);
+Status DevicesCommand(const GlobalOptions& options, const Args& args);
 
 // An option word, as opposed to a value: "-p", "--json", but not "-20" or "-.5", which are
 // negative numbers given as arguments.

@@ -27,6 +27,9 @@ Commands:
       including registered names the list does not show (ColorLut3dAdjust,
       ChromeKeyLut3d). INPUT is the foreground frame; the background is FILE (same size)
       or INPUT itself.
+  devices
+      OpenCL platforms and devices by index; * marks the default choice. Says so
+      when there is no OpenCL platform.
   fx FUNCTION [ARG]... INPUT [SECOND] [OUTPUT]
       Calls one of the plug-in's exported image functions on INPUT. Most write
       OUTPUT; merge and wb-rates read a SECOND image; white-point and wb-rates print
@@ -140,6 +143,8 @@ int Run(int argc, char** argv) {
     result = DemoCommand(options, args);
   } else if (command == "lut") {
     result = LutCommand(options, args);
+  } else if (command == "devices") {
+    result = DevicesCommand(options, args);
   } else {
     PrintError("unknown command '" + command + "' (see tessarofx --help)");
     return 2;

@@ -21,6 +21,8 @@
 #include <string_view>
 #include <vector>
 
+#include "tessarofx/NLEOpenCL.h"
+
 namespace {
 
 namespace fs = std::filesystem;
@@ -697,6 +699,76 @@ TEST_F(ToolTest, LutBakeOfAChainStaysCloseToTheFiltersInTurn) {
   ASSERT_EQ(a.size(), b.size());
   EXPECT_LE(cv::norm(a, b, cv::NORM_INF), 24);
   EXPECT_LE(cv::norm(a, b, cv::NORM_L1) / (3.0 * a.total()), 3.0);
+}
+
+std::vector<NLEOpenCLDeviceInfo> OpenCLDevices() {
+  uint32_t count = 0;
+  NLECommon::ListOpenCLDevices(nullptr, 0, &count);
+  std::vector<NLEOpenCLDeviceInfo> devices(count);
+  NLECommon::ListOpenCLDevices(devices.data(), count, &count);
+  devices.resize(std::min<size_t>(count, devices.size()));
+  return devices;
+}
+
+// The rows of `devices`: a '*' or blank mark, the index, then the type, platform and device.
+struct DeviceRow {
+  bool marked;
+  int index;
+  std::string rest;
+};
+std::vector<DeviceRow> DeviceRows(const std::string& out) {
+  std::vector<DeviceRow> rows;
+  std::istringstream lines(out);
+  for (std::string line; std::getline(lines, line);) {
+    if (line.size() < 3 || !std::isdigit(static_cast<unsigned char>(line[2]))) continue;
+    rows.push_back({line[0] == '*', std::atoi(line.c_str() + 2), line.substr(2)});
+  }
+  return rows;
+}
+
+TEST_F(ToolTest, DevicesListsEveryDeviceAndMarksTheDefaultChoice) {
+  // No platform at all is a plain answer, not a failure.
+  fs::create_directory(Path("no-vendors"));
+  const Outcome none = Run("devices", "OCL_ICD_VENDORS=" + Path("no-vendors"));
+  EXPECT_EQ(none.exitCode, 0) << none.err;
+  EXPECT_NE(none.out.find("No OpenCL device"), npos) << none.out;
+  EXPECT_TRUE(DeviceRows(none.out).empty());
+
+  const std::vector<NLEOpenCLDeviceInfo> devices = OpenCLDevices();
+  const Outcome r = Run("devices", "-u TESSAROFX_OPENCL_DEVICE");
+  ASSERT_EQ(r.exitCode, 0) << r.err;
+  const std::vector<DeviceRow> rows = DeviceRows(r.out);
+  ASSERT_EQ(rows.size(), devices.size()) << r.out;
+  if (devices.empty()) GTEST_SKIP() << "no OpenCL device on this machine (the runtime lists none)";
+  std::string marked;
+  for (size_t i = 0; i < rows.size(); ++i) {
+    SCOPED_TRACE(rows[i].rest);
+    EXPECT_EQ(rows[i].index, static_cast<int>(i));
+    std::istringstream words(rows[i].rest.substr(rows[i].rest.find(' ')));
+    std::string type;
+    words >> type;
+    EXPECT_TRUE(type == "GPU" || type == "CPU" || type == "accelerator" || type == "other");
+    EXPECT_NE(rows[i].rest.find(devices[i].platform), npos);
+    EXPECT_NE(rows[i].rest.find(devices[i].device), npos);
+    if (rows[i].marked) marked += devices[i].device;
+  }
+  // The mark is on the device the kit opens for -1, and moves where the environment points.
+  NLEComPtr<INLECGDevice> chosen;
+  ASSERT_EQ(NLECommon::CreateOpenCLDevice(-1, &chosen), NLE_S_OK);
+  wchar_t name[256] = {};
+  ASSERT_EQ(chosen->GetName(name, 256), NLE_S_OK);
+  EXPECT_EQ(marked, std::string(name, name + std::wcslen(name)));
+  const int last = static_cast<int>(devices.size()) - 1;
+  const std::vector<DeviceRow> moved =
+      DeviceRows(Run("devices", "TESSAROFX_OPENCL_DEVICE=" + std::to_string(last)).out);
+  ASSERT_EQ(moved.size(), devices.size());
+  EXPECT_TRUE(moved.back().marked);
+  EXPECT_EQ(std::count_if(moved.begin(), moved.end(), [](const DeviceRow& d) { return d.marked; }),
+            1);
+  const Outcome wrong = Run("devices", "TESSAROFX_OPENCL_DEVICE=" + std::to_string(last + 1));
+  EXPECT_EQ(wrong.exitCode, 0);
+  EXPECT_NE(wrong.out.find("names no device"), npos) << wrong.out;
+  for (const DeviceRow& d : DeviceRows(wrong.out)) EXPECT_FALSE(d.marked);
 }
 
 TEST_F(ToolTest, UsageGoesToStdoutOnRequestAndStderrOnMistakes) {

@@ -1,0 +1,43 @@
+#include <algorithm>
+#include <cstdio>
+#include <cstring>
+
+#include "Commands.h"
+#include "OpenCLDevices.h"
+
+namespace tfxtool {
+
+Status DevicesCommand(const GlobalOptions&, const Args& args) {
+  if (!args.empty()) return Status::Error("devices: unexpected argument '" + args[0] + "'");
+  std::vector<NLEOpenCLDeviceInfo> devices;
+  if (Status s = ListDevices(&devices); !s.ok()) return s;
+  // Having no OpenCL is a state of the machine, not a mistake on the command line.
+  if (devices.empty()) {
+    std::puts(
+        "No OpenCL device: no OpenCL platform was found, or none has a device. Install an "
+        "OpenCL runtime (a GPU driver's, or PoCL for the CPU) to use apply --opencl.");
+    return Status::Ok();
+  }
+  std::string why;
+  const int chosen = DefaultDeviceIndex(devices, &why);
+  int platformWidth = static_cast<int>(std::strlen("platform"));
+  for (const NLEOpenCLDeviceInfo& d : devices) {
+    platformWidth = std::max(platformWidth, static_cast<int>(std::strlen(d.platform)));
+  }
+  std::printf("  %-5s  %-11s  %-*s  %s\n", "index", "type", platformWidth, "platform", "device");
+  for (size_t i = 0; i < devices.size(); ++i) {
+    const NLEOpenCLDeviceInfo& d = devices[i];
+    std::printf("%c %-5zu  %-11s  %-*s  %s\n", static_cast<int>(i) == chosen ? '*' : ' ', i,
+                DeviceTypeName(d.type), platformWidth, d.platform, d.device);
+  }
+  if (chosen < 0) {
+    std::printf("\nNo default device: %s; apply --opencl needs --device N.\n", why.c_str());
+  } else {
+    std::puts(
+        "\n* the default choice (--device -1): TESSAROFX_OPENCL_DEVICE when set, else the first "
+        "GPU, else the first CPU, else the first device.");
+  }
+  return Status::Ok();
+}
+
+}  // namespace tfxtool
