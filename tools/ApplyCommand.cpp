@@ -1,15 +1,45 @@
+#include <sys/stat.h>
+
 #include <cstdio>
+#include <limits>
 
 #include "Commands.h"
 #include "FilterHost.h"
 #include "ImageFiles.h"
+#include "OpenCLDevices.h"
 #include "Text.h"
 
 namespace tfxtool {
+namespace {
+
+Status RunOpenCL(const PluginLibrary& plugin, const ResolvedFilter& filter,
+                 const std::vector<ParamSetting>& settings, int deviceIndex,
+                 const std::string& kernelDir, const cv::Mat& input, cv::Mat* result) {
+  // Asked before the device, so that the answer does not depend on the machine.
+  if (!filter.opencl) {
+    return Status::Error(filter.name + " has no OpenCL class; see tessarofx list");
+  }
+  NLEComPtr<INLECGDevice> device;
+  OpenCLTarget target;
+  if (Status s = OpenDevice(deviceIndex, device, &target.deviceName); !s.ok()) return s;
+  target.device = device.get();
+  target.kernelDir = kernelDir.empty() ? plugin.KernelDir() : kernelDir;
+  // The plug-in reports a missing directory like a failed build; this says it plainly.
+  struct stat info = {};
+  if (stat(target.kernelDir.c_str(), &info) != 0 || !S_ISDIR(info.st_mode)) {
+    return Status::Error(
+        "no kernel directory at " + target.kernelDir +
+        (kernelDir.empty() ? " (beside the plug-in; --kernels DIR names another)" : ""));
+  }
+  return RunFilterOpenCL(plugin, filter, settings, target, input, result);
+}
+
+}  // namespace
 
 Status ApplyCommand(const GlobalOptions& options, const Args& args) {
   std::vector<ParamSetting> settings;
-  std::string backgroundPath;
+  std::string backgroundPath, deviceText, kernelDir;
+  bool opencl = false;
   Args positional;
   bool optionsEnded = false;
   for (size_t i = 0; i < args.size(); ++i) {
@@ -23,7 +53,11 @@ Status ApplyCommand(const GlobalOptions& options, const Args& args) {
       ParamSetting setting;
       if (Status s = ParseParamSetting(value, &setting); !s.ok()) return s;
       settings.push_back(setting);
-    } else if (TakeOptionValue(args, &i, "--background", "-b", &backgroundPath, &error)) {
+    } else if (args[i] == "--opencl") {
+      opencl = true;
+    } else if (TakeOptionValue(args, &i, "--background", "-b", &backgroundPath, &error) ||
+               TakeOptionValue(args, &i, "--device", nullptr, &deviceText, &error) ||
+               TakeOptionValue(args, &i, "--kernels", nullptr, &kernelDir, &error)) {
       // stored
     } else if (error.ok()) {
       return Status::Error("apply: unknown option '" + args[i] + "'");
@@ -36,6 +70,21 @@ Status ApplyCommand(const GlobalOptions& options, const Args& args) {
   }
   if (positional.size() > 3) {
     return Status::Error("apply: unexpected argument '" + positional[3] + "'");
+  }
+  if (!opencl && (!deviceText.empty() || !kernelDir.empty())) {
+    return Status::Error(std::string(deviceText.empty() ? "--kernels" : "--device") +
+                         " only goes with --opencl");
+  }
+  if (opencl && !backgroundPath.empty()) {
+    return Status::Error(
+        "--background does not go with --opencl: the OpenCL filters adjust one "
+        "frame");
+  }
+  long long deviceIndex = -1;
+  if (!deviceText.empty() && (!ParseInteger(deviceText, &deviceIndex) || deviceIndex < -1 ||
+                              deviceIndex > std::numeric_limits<int>::max())) {
+    return Status::Error("bad --device '" + deviceText +
+                         "': a device index (see tessarofx devices), or -1 for the default");
   }
   const std::string& input = positional[1];
   const std::string& output = positional[2];
@@ -63,7 +112,14 @@ Status ApplyCommand(const GlobalOptions& options, const Args& args) {
   }
 
   cv::Mat result;
-  if (Status s = RunFilter(plugin, filter, settings, foreground, background, &result); !s.ok()) {
+  if (opencl) {
+    if (Status s = RunOpenCL(plugin, filter, settings, static_cast<int>(deviceIndex), kernelDir,
+                             foreground, &result);
+        !s.ok()) {
+      return s;
+    }
+  } else if (Status s = RunFilter(plugin, filter, settings, foreground, background, &result);
+             !s.ok()) {
     return s;
   }
   return WriteImage(output, result);

@@ -6,6 +6,7 @@
 #include "Text.h"
 #include "tessarofx/NLECGFilter.h"
 #include "tessarofx/NLEHost.h"
+#include "tessarofx/NLEOpenCL.h"
 
 namespace tfxtool {
 namespace {
@@ -284,6 +285,7 @@ Status ResolveFilter(const std::vector<PublishedFilter>& published, const std::s
   }
   filter->guid = match->guid;
   filter->name = name;
+  filter->opencl = match->opencl;
   filter->params = match->params;
   return Status::Ok();
 }
@@ -298,20 +300,69 @@ Status ParseParamSetting(const std::string& text, ParamSetting* setting) {
   return Status::Ok();
 }
 
+namespace {
+
+// The filter with the settings applied: its CPU class without a device, else its OpenCL class.
+// Both classes get the same property bag, so a setting means the same on either path.
+Status CreateFilter(const PluginLibrary& plugin, const ResolvedFilter& filter,
+                    const std::vector<ParamSetting>& settings, const OpenCLTarget* target,
+                    NLEComPtr<INLECGFilter>& fx) {
+  NLEComPtr<INLEProperties> props;
+  if (Status s = BuildProperties(filter, settings, props); !s.ok()) return s;
+  const std::wstring guid = Widen(filter.guid);
+  INLECGFilter* raw = nullptr;
+  const HRESULT hr = plugin.Create(guid.c_str(), props, &raw, target ? target->device : nullptr,
+                                   target ? target->kernelDir.c_str() : nullptr);
+  fx.Attach(raw);
+  if (NLE_SUCCEEDED(hr) && fx) return Status::Ok();
+  if (!target) {
+    return Status::Error("cannot create " + filter.name + ": " + DescribeResult(hr), hr);
+  }
+  // The plug-in answers a program that would not load or build with a bare code; the host kit
+  // has logged the file or the compiler's output just before.
+  return Status::Error("cannot create the OpenCL class of " + filter.name + " on " +
+                           target->deviceName + ": " + DescribeResult(hr) +
+                           "; its program could not be read from " + target->kernelDir +
+                           " or did not build (see the log above)",
+                       hr);
+}
+
+// One frame through the filter, driven as an editor drives it.
+HRESULT RunOnce(INLECGFilter* fx, INLEFrame* foreground, INLEFrame* background, INLEFrame* dst,
+                cv::Size size) {
+  fx->SetForeground(foreground);
+  fx->SetBackground(background);
+  fx->SetTotalTime(1);
+  fx->SetCurrentTime(0);
+  CGFilterParam param = {};
+  param.frameSize = {size.width, size.height};
+  param.quality = 1;
+  const HRESULT hr = fx->Prepare(param);
+  return NLE_SUCCEEDED(hr) ? fx->Running(dst) : hr;
+}
+
+// What a failed Running means on the OpenCL path, where the codes are few and broad.
+std::string OpenCLRunFailure(HRESULT hr) {
+  switch (static_cast<uint32_t>(hr)) {
+    case 0x80000001u:
+      return ": the filter has no way to run on this input";
+    case 0x80000003u:
+      return ": the filter refused the device frames";
+    case 0x80000008u:
+      return ": the kernel did not run, or its parameters or tables could not be placed on the "
+             "device";
+    default:
+      return "";
+  }
+}
+
+}  // namespace
+
 Status RunFilter(const PluginLibrary& plugin, const ResolvedFilter& filter,
                  const std::vector<ParamSetting>& settings, const cv::Mat& foreground,
                  const cv::Mat& background, cv::Mat* out) {
-  NLEComPtr<INLEProperties> props;
-  if (Status s = BuildProperties(filter, settings, props); !s.ok()) return s;
-
-  const std::wstring guid = Widen(filter.guid);
   NLEComPtr<INLECGFilter> fx;
-  INLECGFilter* raw = nullptr;
-  HRESULT hr = plugin.Create(guid.c_str(), props, &raw);
-  fx.Attach(raw);
-  if (NLE_FAILED(hr) || !fx) {
-    return Status::Error("cannot create " + filter.name + ": " + DescribeResult(hr), hr);
-  }
+  if (Status s = CreateFilter(plugin, filter, settings, nullptr, fx); !s.ok()) return s;
 
   cv::Mat dst(foreground.size(), CV_8UC4, cv::Scalar::all(0));
   NLEComPtr<INLEMemoryFrame> fgFrame, bgFrame, dstFrame;
@@ -319,21 +370,57 @@ Status RunFilter(const PluginLibrary& plugin, const ResolvedFilter& filter,
   if (Status s = WrapFrame(background, bgFrame); !s.ok()) return s;
   if (Status s = WrapFrame(dst, dstFrame); !s.ok()) return s;
 
-  fx->SetForeground(fgFrame.get());
-  fx->SetBackground(bgFrame.get());
-  fx->SetTotalTime(1);
-  fx->SetCurrentTime(0);
-  CGFilterParam param = {};
-  param.frameSize = {foreground.cols, foreground.rows};
-  param.quality = 1;
-  hr = fx->Prepare(param);
-  if (NLE_SUCCEEDED(hr)) hr = fx->Running(dstFrame.get());
+  const HRESULT hr =
+      RunOnce(fx.get(), fgFrame.get(), bgFrame.get(), dstFrame.get(), foreground.size());
   // The filter borrowed the frames; drop it before they go.
   fx.Reset();
   if (NLE_FAILED(hr)) {
     return Status::Error(filter.name + " failed: " + DescribeResult(hr), hr);
   }
   *out = dst;
+  return Status::Ok();
+}
+
+Status RunFilterOpenCL(const PluginLibrary& plugin, const ResolvedFilter& filter,
+                       const std::vector<ParamSetting>& settings, const OpenCLTarget& target,
+                       const cv::Mat& input, cv::Mat* out) {
+  NLEComPtr<INLECGFilter> fx;
+  if (Status s = CreateFilter(plugin, filter, settings, &target, fx); !s.ok()) return s;
+
+  // The shipped kernels take packed BGRA buffers; image-kind frames are refused.
+  NLEComPtr<INLEOpenCLFrame> src, dst;
+  HRESULT hr = NLECommon::CreateOpenCLFrame(target.device, input.cols, input.rows,
+                                            OPENCL::kMemoryFrameBuffer, &src);
+  if (NLE_SUCCEEDED(hr)) {
+    hr = NLECommon::CreateOpenCLFrame(target.device, input.cols, input.rows,
+                                      OPENCL::kMemoryFrameBuffer, &dst);
+  }
+  if (NLE_FAILED(hr) || !src || !dst) {
+    return Status::Error("cannot create a " + std::to_string(input.cols) + "x" +
+                             std::to_string(input.rows) + " frame on " + target.deviceName + ": " +
+                             DescribeResult(hr),
+                         hr);
+  }
+  hr = src->Upload(input.ptr<uint8_t>(), static_cast<int32_t>(input.step[0]));
+  if (NLE_FAILED(hr)) {
+    return Status::Error(
+        "cannot upload the input to " + target.deviceName + ": " + DescribeResult(hr), hr);
+  }
+
+  hr = RunOnce(fx.get(), src.get(), nullptr, dst.get(), input.size());
+  fx.Reset();
+  if (NLE_FAILED(hr)) {
+    return Status::Error(filter.name + " failed on " + target.deviceName + ": " +
+                             DescribeResult(hr) + OpenCLRunFailure(hr),
+                         hr);
+  }
+  cv::Mat result(input.size(), CV_8UC4);
+  hr = dst->Download(result.ptr<uint8_t>(), static_cast<int32_t>(result.step[0]));
+  if (NLE_FAILED(hr)) {
+    return Status::Error(
+        "cannot download the result from " + target.deviceName + ": " + DescribeResult(hr), hr);
+  }
+  *out = result;
   return Status::Ok();
 }
 

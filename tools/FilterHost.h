@@ -41,7 +41,8 @@ Status ReadPublishedFilters(const PluginLibrary& plugin, std::vector<PublishedFi
 
 struct ResolvedFilter {
   std::string guid;
-  std::string name;  // the name the user asked for, as registered
+  std::string name;     // the name the user asked for, as registered
+  bool opencl = false;  // the GUID has an OpenCL class
   std::vector<FilterParam> params;
 };
 
@@ -64,5 +65,19 @@ Status ParseParamSetting(const std::string& text, ParamSetting* setting);
 Status RunFilter(const PluginLibrary& plugin, const ResolvedFilter& filter,
                  const std::vector<ParamSetting>& settings, const cv::Mat& foreground,
                  const cv::Mat& background, cv::Mat* out);
+
+// The device and kernel directory the OpenCL class of a filter is created with.
+struct OpenCLTarget {
+  INLECGDevice* device = nullptr;
+  std::string deviceName;  // for messages
+  std::string kernelDir;
+};
+
+// RunFilter for the filter's OpenCL class: the same settings, with `input` uploaded into a frame
+// in the device's memory and the result downloaded into `out`. The OpenCL classes adjust one
+// frame, so there is no background.
+Status RunFilterOpenCL(const PluginLibrary& plugin, const ResolvedFilter& filter,
+                       const std::vector<ParamSetting>& settings, const OpenCLTarget& target,
+                       const cv::Mat& input, cv::Mat* out);
 
 }  // namespace tfxtool

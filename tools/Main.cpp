@@ -27,9 +27,15 @@ Commands:
       including registered names the list does not show (ColorLut3dAdjust,
       ChromeKeyLut3d). INPUT is the foreground frame; the background is FILE (same size)
       or INPUT itself.
+  apply --opencl [--device N] [--kernels DIR] FILTER [-p NAME=VALUE]... INPUT OUTPUT
+      Runs the filter's OpenCL class instead (filters whose list entry says OpenCL):
+      INPUT goes into a frame in the device's memory and the result comes back from it.
+      --device N picks a device from 'devices' (default -1: the default choice);
+      --kernels DIR holds the OpenCL programs (default: tessarofx/kernels beside the
+      plug-in). A program that does not build shows the compiler's log on stderr.
   devices
-      OpenCL platforms and devices by index; * marks the default choice. Says so
-      when there is no OpenCL platform.
+      OpenCL platforms and devices, with the index --device takes; * marks the
+      default choice. Says so when there is no OpenCL platform.
   fx FUNCTION [ARG]... INPUT [SECOND] [OUTPUT]
       Calls one of the plug-in's exported image functions on INPUT. Most write
       OUTPUT; merge and wb-rates read a SECOND image; white-point and wb-rates print

@@ -82,11 +82,21 @@ void* PluginLibrary::Symbol(const char* name, std::string* why) const {
   return p;
 }
 
-HRESULT PluginLibrary::Create(const wchar_t* guid, INLEProperties* props,
-                              INLECGFilter** filter) const {
+std::string PluginLibrary::KernelDir() const {
+  std::string file = path_;
+  Dl_info info = {};
+  if (getCount_ && dladdr(reinterpret_cast<void*>(getCount_), &info) != 0 && info.dli_fname) {
+    file = info.dli_fname;
+  }
+  const size_t slash = file.rfind('/');
+  const std::string dir = slash == std::string::npos ? "." : file.substr(0, slash);
+  return dir + "/tessarofx/kernels";
+}
+
+HRESULT PluginLibrary::Create(const wchar_t* guid, INLEProperties* props, INLECGFilter** filter,
+                              INLECGDevice* device, const char* kernelDir) const {
   void* out = nullptr;
-  // No device: the CPU class of the filter.
-  const HRESULT hr = create_(nullptr, guid, props, nullptr, &out);
+  const HRESULT hr = create_(device, guid, props, kernelDir, &out);
   *filter = NLE_SUCCEEDED(hr) ? static_cast<INLECGFilter*>(out) : nullptr;
   return hr;
 }

@@ -25,6 +25,9 @@ class PluginLibrary {
   Status Load(const std::string& explicitPath);
 
   const std::string& path() const { return path_; }
+  // Where the plug-in's OpenCL programs sit: the kernels directory beside the library file that
+  // was actually loaded (the loader's answer, so a bare name found on the search path works too).
+  std::string KernelDir() const;
   // Address of an exported symbol, or null (with the loader's reason in *why when given).
   void* Symbol(const char* name, std::string* why = nullptr) const;
   // The exported function `name` as a pointer of type Fn; the error names the missing symbol.
@@ -43,7 +46,10 @@ class PluginLibrary {
   HRESULT Properties(int index, INLEProperties** props) const {
     return getProperties_(index, props);
   }
-  HRESULT Create(const wchar_t* guid, INLEProperties* props, INLECGFilter** filter) const;
+  // The filter's CPU class without a device, else its OpenCL class on `device`, built from the
+  // programs in `kernelDir`.
+  HRESULT Create(const wchar_t* guid, INLEProperties* props, INLECGFilter** filter,
+                 INLECGDevice* device = nullptr, const char* kernelDir = nullptr) const;
 
  private:
   Status Open(const std::string& path);

@@ -710,6 +710,11 @@ std::vector<NLEOpenCLDeviceInfo> OpenCLDevices() {
   return devices;
 }
 
+#define SKIP_WITHOUT_OPENCL()                                                    \
+  if (OpenCLDevices().empty()) {                                                 \
+    GTEST_SKIP() << "no OpenCL device on this machine (the runtime lists none)"; \
+  }
+
 // The rows of `devices`: a '*' or blank mark, the index, then the type, platform and device.
 struct DeviceRow {
   bool marked;
@@ -769,6 +774,99 @@ TEST_F(ToolTest, DevicesListsEveryDeviceAndMarksTheDefaultChoice) {
   EXPECT_EQ(wrong.exitCode, 0);
   EXPECT_NE(wrong.out.find("names no device"), npos) << wrong.out;
   for (const DeviceRow& d : DeviceRows(wrong.out)) EXPECT_FALSE(d.marked);
+}
+
+TEST_F(ToolTest, ApplyOpenCLAgreesWithTheCpuClass) {
+  SKIP_WITHOUT_OPENCL();
+  // Some pixels fully transparent, which lutAToWhiteEffect fills; 33 columns leave a ragged
+  // edge for any vector width a runtime picks.
+  WriteInput("in.png", 33, 7);
+  cv::Mat in = Read("in.png");
+  in.forEach<cv::Vec4b>([](cv::Vec4b& p, const int* at) {
+    if ((at[0] + at[1]) % 3 == 0) p[3] = 0;
+  });
+  ASSERT_TRUE(cv::imwrite(Path("in.png"), in));
+  const struct {
+    std::string args;
+    double tolerance;  // per channel: the kernel computes in float where the CPU class may not
+  } cases[] = {
+      {"lutAToWhiteEffect", 0},
+      {"WhiteBalanceAdjust -p u_temperature=40 -p u_tint=-20", 1},
+      {"WhiteBalanceAdjust -p u_temperature=-100 -p u_tint=100", 1},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.args);
+    const Outcome cl = Run("apply --opencl " + c.args + " in.png cl.png");
+    ASSERT_EQ(cl.exitCode, 0) << cl.err;
+    ASSERT_EQ(Run("apply " + c.args + " in.png cpu.png").exitCode, 0);
+    const cv::Mat a = Read("cl.png"), b = Read("cpu.png");
+    ASSERT_EQ(a.size(), in.size());
+    ASSERT_EQ(a.type(), CV_8UC4);
+    EXPECT_LE(cv::norm(a, b, cv::NORM_INF), c.tolerance);
+    EXPECT_NE(cv::norm(b, in, cv::NORM_INF), 0) << "the case proves nothing";
+  }
+}
+
+// Mistakes the tool can see whatever the machine has: one line, exit 1, nothing written.
+TEST_F(ToolTest, ApplyOpenCLRefusesOptionsThatDoNotFit) {
+  WriteInput("in.png");
+  const struct {
+    const char* args;
+    const char* cause;
+  } cases[] = {
+      {"apply --opencl ColorAdjust in.png out.png",
+       "ColorAdjust has no OpenCL class; see tessarofx list"},
+      {"apply --device 0 WhiteBalanceAdjust in.png out.png", "--device only goes with --opencl"},
+      {"apply --kernels . WhiteBalanceAdjust in.png out.png", "--kernels only goes with --opencl"},
+      {"apply --opencl -b in.png WhiteBalanceAdjust in.png out.png",
+       "--background does not go with --opencl"},
+      {"apply --opencl --device gpu WhiteBalanceAdjust in.png out.png", "bad --device 'gpu'"},
+      {"apply --opencl --device -2 WhiteBalanceAdjust in.png out.png", "bad --device '-2'"},
+  };
+  const std::vector<std::string> before = Listing();
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.args);
+    const Outcome r = Run(c.args);
+    EXPECT_EQ(r.exitCode, 1);
+    EXPECT_NE(r.err.find(c.cause), npos) << r.err;
+    EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
+    EXPECT_EQ(Listing(), before);
+  }
+  const Outcome none = Run("apply --opencl WhiteBalanceAdjust in.png out.png",
+                           "OCL_ICD_VENDORS=" + Path("no-such-dir"));
+  EXPECT_EQ(none.exitCode, 1);
+  EXPECT_NE(none.err.find("no OpenCL device"), npos) << none.err;
+}
+
+TEST_F(ToolTest, ApplyOpenCLNamesTheDeviceOrProgramThatFailed) {
+  SKIP_WITHOUT_OPENCL();
+  WriteInput("in.png");
+  const std::string count = std::to_string(OpenCLDevices().size());
+  const Outcome range =
+      Run("apply --opencl --device " + count + " WhiteBalanceAdjust in.png o.png");
+  EXPECT_EQ(range.exitCode, 1);
+  EXPECT_NE(range.err.find("--device " + count + " is out of range"), npos) << range.err;
+
+  fs::create_directory(Path("empty"));
+  const Outcome missing = Run("apply --opencl --kernels empty WhiteBalanceAdjust in.png o.png");
+  EXPECT_EQ(missing.exitCode, 1);
+  EXPECT_NE(missing.err.find("empty/WhiteBalanceAdjust.cl"), npos) << missing.err;
+
+  // The compiler's own complaint reaches the user, not just a result code.
+  fs::create_directory(Path("broken"));
+  {
+    std::ofstream(Path("broken/WhiteBalanceAdjust.cl"))
+        << "__kernel void auto_white_balance(__global uchar4* p) { p[0] = undeclared_name; }\n";
+  }
+  const Outcome broken = Run("apply --opencl --kernels broken WhiteBalanceAdjust in.png o.png");
+  EXPECT_EQ(broken.exitCode, 1);
+  EXPECT_NE(broken.err.find("failed to build"), npos) << broken.err;
+  EXPECT_NE(broken.err.find("undeclared_name"), npos) << broken.err;
+  EXPECT_NE(broken.err.find("tessarofx: error: cannot create the OpenCL class of "
+                            "WhiteBalanceAdjust"),
+            npos)
+      << broken.err;
+  EXPECT_FALSE(fs::exists(Path("o.png")));
 }
 
 TEST_F(ToolTest, UsageGoesToStdoutOnRequestAndStderrOnMistakes) {
