@@ -20,19 +20,8 @@ constexpr const wchar_t* kColorLut = L"74EB022D-1D73-4D1E-9F70-487C356D46CD";
 
 std::wstring Wide(const std::string& s) { return std::wstring(s.begin(), s.end()); }
 
-// Host settings with "lut3dPath" as a text parameter.
 NLEComPtr<INLEProperties> PathSettings(const std::wstring& path) {
-  NLEComPtr<INLEProperties> props, p;
-  NLECommon::CreateProperties(&props);
-  NLECommon::CreateProperties(&p);
-  p->SetString(Key::Property::kVariantName, L"lut3dPath");
-  p->SetString(Key::Property::kFriendName, L"lut3dPath");
-  p->SetInt(Key::Property::kType, NLEFilterPropertyType_String);
-  p->SetString(Key::Property::kValue_Default, L"");
-  p->SetString(Key::Property::kValue_Current, path.c_str());
-  props->SetInterface(Key::Property::kParamsArray[0], p.get());
-  props->SetInt(Key::Property::kCount, 1);
-  return props;
+  return tfx_test::TextSettings(L"lut3dPath", path);
 }
 
 void SetPath(INLECGFilter* filter, const std::wstring& path) {

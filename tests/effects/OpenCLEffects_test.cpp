@@ -37,21 +37,6 @@ Bytes DemoPixels() {
   return Bytes(scene.data, scene.data + scene.total() * scene.elemSize());
 }
 
-// Host settings with one text parameter.
-NLEComPtr<INLEProperties> TextSettings(const wchar_t* name, const std::wstring& value) {
-  NLEComPtr<INLEProperties> props, p;
-  NLECommon::CreateProperties(&props);
-  NLECommon::CreateProperties(&p);
-  p->SetString(Key::Property::kVariantName, name);
-  p->SetString(Key::Property::kFriendName, name);
-  p->SetInt(Key::Property::kType, NLEFilterPropertyType_String);
-  p->SetString(Key::Property::kValue_Default, L"");
-  p->SetString(Key::Property::kValue_Current, value.c_str());
-  props->SetInterface(Key::Property::kParamsArray[0], p.get());
-  props->SetInt(Key::Property::kCount, 1);
-  return props;
-}
-
 class OpenCLEffects : public tfx_test::OpenCLEffectTest {};
 
 TEST_F(OpenCLEffects, AToWhiteMatchesTheCpuClassExactly) {
@@ -148,13 +133,9 @@ void FillHostileLattice(CubeLut* lut, int n, unsigned salt) {
 }
 
 TEST_F(OpenCLEffects, LutKernelIsTheTetrahedralFormulaToTheByte) {
-  NLEComPtr<INLECGOpenCLOperate> operate;
-  ASSERT_EQ(device_.QueryInterface(IID_INLECGOpenCLOperate, &operate), NLE_S_OK);
-  void* programs = nullptr;
-  void* handle = nullptr;
-  ASSERT_EQ(operate->GetOpenCLHandles(&programs, &handle), NLE_S_OK);
-  auto* manager = static_cast<OPENCL::openclProgramManager*>(programs);
-  auto* memory = static_cast<OPENCL::openclMemManager*>(handle);
+  OPENCL::openclProgramManager* manager = nullptr;
+  OPENCL::openclMemManager* memory = nullptr;
+  ASSERT_NO_FATAL_FAILURE(Handles(&manager, &memory));
   OPENCL::openclProgram* program = manager->createOpenCLProgram("LUT");
   ASSERT_TRUE(program && program->loadProgram(TFX_KERNEL_DIR, nullptr, nullptr, 0));
   OPENCL::openclKernel* kernel = program->getopenclKernel("MAIN");
@@ -228,7 +209,7 @@ TEST_F(OpenCLLutFiles, LutMatchesTheCpuClassOnTheDemoGradeAndPassesUnreadableFil
   const Bytes noise = RandomPixels(640, 360, 3);
   for (int size : {17, 33, 64}) {
     NLEComPtr<INLEProperties> settings =
-        TextSettings(L"lut3dPath", Write("grade.cube", tfxtool::MakeDemoLut(size)));
+        tfx_test::TextSettings(L"lut3dPath", Write("grade.cube", tfxtool::MakeDemoLut(size)));
     NLEComPtr<INLECGFilter> cpu = tfx_test::CreateEffect(kLut, settings.get());
     NLEComPtr<INLECGFilter> gpu = CreateOnDevice(kLut, settings.get());
     EXPECT_EQ(RunOnDevice(gpu.get(), scene, 960, 540), RunOnCpu(cpu.get(), scene, 960, 540))
@@ -243,10 +224,12 @@ TEST_F(OpenCLLutFiles, LutMatchesTheCpuClassOnTheDemoGradeAndPassesUnreadableFil
   for (const std::wstring& path :
        {Write("grade.txt", tfxtool::MakeDemoLut(9)), std::wstring(L"/nonexistent/x.cube"),
         Write("big.cube", "LUT_3D_SIZE 65\n0 0 0\n")}) {
-    NLEComPtr<INLECGFilter> gpu = CreateOnDevice(kLut, TextSettings(L"lut3dPath", path).get());
+    NLEComPtr<INLECGFilter> gpu =
+        CreateOnDevice(kLut, tfx_test::TextSettings(L"lut3dPath", path).get());
     EXPECT_EQ(RunOnDevice(gpu.get(), noise, 640, 360), noise);
   }
-  NLEComPtr<INLECGFilter> empty = CreateOnDevice(kLut, TextSettings(L"lut3dPath", L"").get());
+  NLEComPtr<INLECGFilter> empty =
+      CreateOnDevice(kLut, tfx_test::TextSettings(L"lut3dPath", L"").get());
   HRESULT status = 0;
   EXPECT_EQ(RunOnDevice(empty.get(), noise, 640, 360, &status, 0xEE), Bytes(noise.size(), 0xEE));
   EXPECT_EQ(status, NLE_E_RESOURCE);
@@ -258,7 +241,7 @@ TEST_F(OpenCLLutFiles, LutFollowsThePathFromFrameToFrame) {
                                                    "0.5 0.5 0.5\n0.5 0.5 0.5\n0.5 0.5 0.5\n"
                                                    "0.5 0.5 0.5\n0.5 0.5 0.5\n0.5 0.5 0.5\n"
                                                    "0.5 0.5 0.5\n0.5 0.5 0.5\n");
-  NLEComPtr<INLEProperties> settings = TextSettings(L"lut3dPath", warm);
+  NLEComPtr<INLEProperties> settings = tfx_test::TextSettings(L"lut3dPath", warm);
   NLEComPtr<INLECGFilter> gpu = CreateOnDevice(kLut, settings.get());
   NLEComPtr<INLECGFilter> cpu = tfx_test::CreateEffect(kLut, settings.get());
   const Bytes noise = RandomPixels(64, 64, 4);
@@ -270,7 +253,7 @@ TEST_F(OpenCLLutFiles, LutFollowsThePathFromFrameToFrame) {
   gpu->ParamValueChanged();
   // The new table applies from the next frame: mid-grey everywhere, alpha kept.
   NLEComPtr<INLECGFilter> cpuFlat =
-      tfx_test::CreateEffect(kLut, TextSettings(L"lut3dPath", flat).get());
+      tfx_test::CreateEffect(kLut, tfx_test::TextSettings(L"lut3dPath", flat).get());
   const Bytes grey = RunOnDevice(gpu.get(), noise, 64, 64);
   EXPECT_EQ(grey, RunOnCpu(cpuFlat.get(), noise, 64, 64));
   for (size_t i = 0; i < grey.size(); ++i) {

@@ -183,12 +183,9 @@ TEST_F(CrossFilter, EveryOpenCLClassIsCreatedOnADeviceWithTheShippedKernels) {
 }
 
 TEST_F(CrossFilter, FiltersOnOneDeviceShareTheirProgram) {
-  NLEComPtr<INLECGOpenCLOperate> operate;
-  ASSERT_EQ(device_.QueryInterface(IID_INLECGOpenCLOperate, &operate), NLE_S_OK);
-  void* programs = nullptr;
-  void* memory = nullptr;
-  ASSERT_EQ(operate->GetOpenCLHandles(&programs, &memory), NLE_S_OK);
-  auto* manager = static_cast<OPENCL::openclProgramManager*>(programs);
+  OPENCL::openclProgramManager* manager = nullptr;
+  OPENCL::openclMemManager* memory = nullptr;
+  ASSERT_NO_FATAL_FAILURE(Handles(&manager, &memory));
   EXPECT_EQ(manager->getOpenCLProgram("lutAToWhiteEffect"), nullptr);
 
   NLEComPtr<INLECGFilter> first = CreateOnDevice(kAToWhite, nullptr);

@@ -26,6 +26,20 @@ NLEComPtr<INLEProperties> Settings(const EffectParams& values) {
   return props;
 }
 
+NLEComPtr<INLEProperties> TextSettings(const wchar_t* name, const std::wstring& value) {
+  NLEComPtr<INLEProperties> props, p;
+  NLECommon::CreateProperties(&props);
+  NLECommon::CreateProperties(&p);
+  p->SetString(Key::Property::kVariantName, name);
+  p->SetString(Key::Property::kFriendName, name);
+  p->SetInt(Key::Property::kType, NLEFilterPropertyType_String);
+  p->SetString(Key::Property::kValue_Default, L"");
+  p->SetString(Key::Property::kValue_Current, value.c_str());
+  props->SetInterface(Key::Property::kParamsArray[0], p.get());
+  props->SetInt(Key::Property::kCount, 1);
+  return props;
+}
+
 NLEComPtr<INLECGFilter> CreateEffect(const wchar_t* guid, INLEProperties* settings) {
   NLEComPtr<INLECGFilter> filter;
   EXPECT_EQ(

@@ -17,6 +17,9 @@ using EffectParams = std::vector<std::pair<std::wstring, double>>;
 // Host settings carrying double parameters (default 0) the way a host's UI writes them.
 NLEComPtr<INLEProperties> Settings(const EffectParams& values);
 
+// Host settings with one text parameter, `name` = `value`.
+NLEComPtr<INLEProperties> TextSettings(const wchar_t* name, const std::wstring& value);
+
 // The effect `guid` built from `settings`; a failure to create it fails the running test.
 NLEComPtr<INLECGFilter> CreateEffect(const wchar_t* guid, INLEProperties* settings);
 

@@ -33,6 +33,17 @@ NLEComPtr<INLEOpenCLFrame> OpenCLEffectTest::DeviceFrame(int width, int height, 
   return frame;
 }
 
+void OpenCLEffectTest::Handles(OPENCL::openclProgramManager** programs,
+                               OPENCL::openclMemManager** memory) {
+  NLEComPtr<INLECGOpenCLOperate> operate;
+  ASSERT_EQ(device_.QueryInterface(IID_INLECGOpenCLOperate, &operate), NLE_S_OK);
+  void* p = nullptr;
+  void* m = nullptr;
+  ASSERT_EQ(operate->GetOpenCLHandles(&p, &m), NLE_S_OK);
+  *programs = static_cast<OPENCL::openclProgramManager*>(p);
+  *memory = static_cast<OPENCL::openclMemManager*>(m);
+}
+
 Bytes OpenCLEffectTest::Download(INLEOpenCLFrame* frame) {
   NLEFrameDesc desc{};
   EXPECT_EQ(frame->GetDescription(&desc, false, false), NLE_S_OK);

@@ -26,6 +26,8 @@ class OpenCLEffectTest : public testing::Test {
   // A width x height frame in device memory holding `bgra` (packed), or zeros.
   NLEComPtr<INLEOpenCLFrame> DeviceFrame(int width, int height, const Bytes& bgra = {});
   static Bytes Download(INLEOpenCLFrame* frame);
+  // The device's program manager and memory manager, as filters get them.
+  void Handles(OPENCL::openclProgramManager** programs, OPENCL::openclMemManager** memory);
 
   // One frame through a filter as a host runs it: `src` (width x height, packed BGRA) becomes the
   // foreground, the destination starts as `dstFill` bytes. The status lands in *status.
