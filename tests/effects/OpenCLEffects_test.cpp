@@ -8,6 +8,7 @@
 #include <limits>
 #include <random>
 #include <string>
+#include <thread>
 
 #include "../tools/DemoScene.h"
 #include "lut/CubeLutApply.h"
@@ -298,6 +299,57 @@ TEST_F(OpenCLEffects, ChromeKeyMatchesTheCpuClassInBothModes) {
   HRESULT status = 0;
   RunOnDevice(fresh.get(), scene, 960, 540, &status);
   EXPECT_EQ(status, NLE_E_RESOURCE);
+}
+
+// Render threads with a device each run at once and give what one thread gives.
+TEST_F(OpenCLEffects, FiltersOnTwoDevicesRunOnTwoThreads) {
+  const Bytes scene = DemoPixels();
+  const tfxtool::Rgb screen = tfxtool::DemoScreenColour();
+  NLEComPtr<INLEProperties> key = tfx_test::Settings(
+      {{L"red", screen.r}, {L"green", screen.g}, {L"blue", screen.b}, {L"mode", 1}});
+  NLEComPtr<INLEProperties> warm = tfx_test::Settings({{L"u_temperature", 60.0}});
+  NLEComPtr<INLECGFilter> cpuKey = tfx_test::CreateEffect(kChromeKey, key.get());
+  NLEComPtr<INLECGFilter> cpuWarm = tfx_test::CreateEffect(kWhiteBalance, warm.get());
+  const Bytes keyed = RunOnCpu(cpuKey.get(), scene, 960, 540);
+  const Bytes warmed = RunOnCpu(cpuWarm.get(), scene, 960, 540);
+
+  struct Worker {
+    NLEComPtr<INLECGDevice> device;
+    NLEComPtr<INLECGFilter> filter;
+    NLEComPtr<INLEOpenCLFrame> in, out;
+    Bytes result;
+  };
+  Worker workers[2];
+  INLEProperties* settings[2] = {key.get(), warm.get()};
+  const wchar_t* guids[2] = {kChromeKey, kWhiteBalance};
+  for (int i = 0; i < 2; ++i) {
+    Worker& w = workers[i];
+    ASSERT_EQ(NLECommon::CreateOpenCLDevice(-1, &w.device), NLE_S_OK);
+    ASSERT_EQ(CreateFilterFromGUID(w.device.get(), guids[i], settings[i], TFX_KERNEL_DIR,
+                                   reinterpret_cast<void**>(&w.filter)),
+              NLE_S_OK);
+    ASSERT_EQ(
+        NLECommon::CreateOpenCLFrame(w.device.get(), 960, 540, OPENCL::kMemoryFrameBuffer, &w.in),
+        NLE_S_OK);
+    ASSERT_EQ(
+        NLECommon::CreateOpenCLFrame(w.device.get(), 960, 540, OPENCL::kMemoryFrameBuffer, &w.out),
+        NLE_S_OK);
+  }
+  std::thread threads[2];
+  for (int i = 0; i < 2; ++i) {
+    threads[i] = std::thread([&w = workers[i], &scene] {
+      for (int frame = 0; frame < 4; ++frame) {
+        w.in->Upload(scene.data(), 0);
+        w.filter->SetForeground(w.in.get());
+        if (w.filter->Running(w.out.get()) != NLE_S_OK) return;
+        w.result.assign(scene.size(), 0);
+        w.out->Download(w.result.data(), 0);
+      }
+    });
+  }
+  for (std::thread& t : threads) t.join();
+  EXPECT_EQ(workers[0].result, keyed);
+  EXPECT_LE(CompareBytes(workers[1].result, warmed).largest, 1);
 }
 
 }  // namespace
