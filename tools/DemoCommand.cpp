@@ -10,6 +10,7 @@
 #include "FilterHost.h"
 #include "ImageFiles.h"
 #include "ImageFunctions.h"
+#include "OpenCLDevices.h"
 #include "Text.h"
 #include "tessarofx/NLEComBase.h"
 
@@ -137,6 +138,56 @@ Status MakeDirectories(const std::string& dir) {
   return Status::Ok();
 }
 
+// A step whose filter also has an OpenCL class: what it read and what the CPU class made of it.
+struct OpenCLTwin {
+  std::string label;
+  ResolvedFilter filter;
+  std::vector<ParamSetting> params;
+  cv::Mat input;
+  cv::Mat cpu;
+};
+
+// The steps again through their OpenCL classes on the default device, each picture written as
+// opencl-LABEL.png with how far it lies from the CPU class's. A machine without OpenCL skips
+// them; a device that cannot run them is a failure. Returns the number of failures.
+int RunOpenCLTwins(const PluginLibrary& plugin, const std::vector<OpenCLTwin>& twins,
+                   const std::string& dir) {
+  if (twins.empty()) return 0;
+  std::vector<NLEOpenCLDeviceInfo> devices;
+  if (!ListDevices(&devices).ok() || devices.empty()) {
+    std::printf("skipped the OpenCL classes: no OpenCL device on this machine\n");
+    return 0;
+  }
+  NLEComPtr<INLECGDevice> device;
+  OpenCLTarget target;
+  if (Status s = OpenDevice(-1, device, &target.deviceName); !s.ok()) {
+    std::fprintf(stderr, "tessarofx: error: %s\n", s.message().c_str());
+    return 1;
+  }
+  target.device = device.get();
+  target.kernelDir = plugin.KernelDir();
+  int failures = 0;
+  for (const OpenCLTwin& twin : twins) {
+    cv::Mat result;
+    const std::string file = dir + "/opencl-" + twin.label + ".png";
+    Status s = RunFilterOpenCL(plugin, twin.filter, twin.params, target, twin.input, &result);
+    if (s.ok()) s = WriteImage(file, result);
+    if (!s.ok()) {
+      std::fprintf(stderr, "tessarofx: error: %s on %s: %s\n", twin.label.c_str(),
+                   target.deviceName.c_str(), s.message().c_str());
+      ++failures;
+      continue;
+    }
+    const double apart = cv::norm(result, twin.cpu, cv::NORM_INF);
+    if (apart == 0) {
+      std::printf("wrote %s (the CPU class's bytes)\n", file.c_str());
+    } else {
+      std::printf("wrote %s (at most %.0f levels from the CPU class)\n", file.c_str(), apart);
+    }
+  }
+  return failures;
+}
+
 }  // namespace
 
 Status DemoCommand(const GlobalOptions& options, const Args& args) {
@@ -164,6 +215,7 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
 
   std::map<std::string, cv::Mat> results;
   std::vector<SheetTile> tiles = {{"Original", "before", scene}};
+  std::vector<OpenCLTwin> twins;
   int failures = 0;
   for (const DemoStep& step : DemoSteps(lutPath)) {
     auto input = [&](const std::string& name, const cv::Mat& fallback, cv::Mat* image) {
@@ -201,7 +253,11 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
     std::printf("wrote %s\n", file.c_str());
     results[step.Label()] = result;
     tiles.push_back({step.Label(), Caption(step), result});
+    if (filter.opencl && step.background.empty()) {
+      twins.push_back({step.Label(), filter, step.params, foreground, result});
+    }
   }
+  failures += RunOpenCLTwins(plugin, twins, dir);
 
   for (const DemoFxStep& step : DemoFxSteps()) {
     cv::Mat input = scene;

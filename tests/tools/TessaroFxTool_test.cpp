@@ -446,6 +446,17 @@ TEST_F(ToolTest, DemoWritesTheSceneEachFilterAndAContactSheet) {
     EXPECT_EQ(Read("demo-out/" + name + ".png").size(), scene.size()) << name;
   }
   EXPECT_EQ(Read("demo-out/cutout-frame.png").size(), cv::Size(976, 556));
+  // The filters with an OpenCL class ran again on the default device, to the CPU class's bytes
+  // where the kernels are exact, unless the machine has no OpenCL at all.
+  if (r.out.find("skipped the OpenCL classes: no OpenCL device") == npos) {
+    for (const std::string name : {"ColorLut3dAdjust", "ChromeKeyLut3d-alpha",
+                                   "ChromeKeyLut3d-beauty", "lutAToWhiteEffect"}) {
+      const cv::Mat opencl = Read("demo-out/opencl-" + name + ".png");
+      ASSERT_EQ(opencl.size(), scene.size()) << name;
+      EXPECT_EQ(cv::norm(opencl, Read("demo-out/" + name + ".png"), cv::NORM_INF), 0) << name;
+    }
+    EXPECT_TRUE(fs::exists(Path("demo-out/opencl-WhiteBalanceAdjust.png")));
+  }
   // The demo is deterministic: a second run into another directory gives the same scene bytes.
   ASSERT_EQ(Run("demo " + Path("again")).exitCode, 0);
   EXPECT_EQ(Slurp(Path("again/sample.png")), Slurp(Path("demo-out/sample.png")));
