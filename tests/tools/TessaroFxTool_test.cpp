@@ -86,6 +86,18 @@ class ToolTest : public ::testing::Test {
     return cv::imread(Path(name), cv::IMREAD_UNCHANGED);
   }
 
+  // `args` fails with exit code 1 and one error line naming `cause`, and the directory still
+  // holds what it held `before`.
+  void ExpectRefused(const std::string& args, const std::string& cause,
+                     const std::vector<std::string>& before) {
+    SCOPED_TRACE(args);
+    const Outcome r = Run(args);
+    EXPECT_EQ(r.exitCode, 1);
+    EXPECT_NE(r.err.find(cause), npos) << r.err;
+    EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
+    EXPECT_EQ(Listing(), before) << "output or temporary file left behind";
+  }
+
   std::vector<std::string> Listing() const {
     std::vector<std::string> names;
     for (const auto& e : fs::directory_iterator(dir_)) names.push_back(e.path().filename());
@@ -659,14 +671,7 @@ TEST_F(ToolTest, LutCommandsRefuseWithoutWritingAnything) {
       {"lut frobnicate", "unknown lut subcommand 'frobnicate'"},
   };
   const std::vector<std::string> before = Listing();
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.args);
-    const Outcome r = Run(c.args);
-    EXPECT_EQ(r.exitCode, 1);
-    EXPECT_NE(r.err.find(c.cause), npos) << r.err;
-    EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
-    EXPECT_EQ(Listing(), before) << "output or temporary file left behind";
-  }
+  for (const auto& c : cases) ExpectRefused(c.args, c.cause, before);
   EXPECT_EQ(Slurp(Path("out.cube")), "previous");
 }
 
@@ -835,14 +840,7 @@ TEST_F(ToolTest, ApplyOpenCLRefusesOptionsThatDoNotFit) {
       {"apply --opencl --device -2 WhiteBalanceAdjust in.png out.png", "bad --device '-2'"},
   };
   const std::vector<std::string> before = Listing();
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.args);
-    const Outcome r = Run(c.args);
-    EXPECT_EQ(r.exitCode, 1);
-    EXPECT_NE(r.err.find(c.cause), npos) << r.err;
-    EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
-    EXPECT_EQ(Listing(), before);
-  }
+  for (const auto& c : cases) ExpectRefused(c.args, c.cause, before);
   const Outcome none = Run("apply --opencl WhiteBalanceAdjust in.png out.png",
                            "OCL_ICD_VENDORS=" + Path("no-such-dir"));
   EXPECT_EQ(none.exitCode, 1);
