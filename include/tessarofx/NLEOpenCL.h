@@ -24,6 +24,8 @@ typedef struct _cl_command_queue* cl_command_queue;
 
 namespace OPENCL {
 
+// Pure interfaces, like the INLE ones: nothing of them is exported, so that every library that
+// includes this header keeps their type information to itself.
 class openclKernel;
 class openclMemory;
 
@@ -64,7 +66,7 @@ struct openclMemoryInfo {
   MemoryKind kind;
 };
 
-class TFX_HOST_API openclMemory {
+class openclMemory {
  public:
   virtual openclMemoryInfo getOpenCLMemoryInfo() const = 0;
   // Device-side copy of `source` into this memory when `copy` is set and a source of the same
@@ -89,7 +91,7 @@ class TFX_HOST_API openclMemory {
   ~openclMemory() = default;
 };
 
-class TFX_HOST_API openclMemManager {
+class openclMemManager {
  public:
   // Allocates `size` bytes of `type`, copying `size` bytes from `init` when given. False (and
   // *out null) for an unknown type, a size below 1, or a parameter block without `init`.
@@ -105,7 +107,7 @@ class TFX_HOST_API openclMemManager {
   ~openclMemManager() = default;
 };
 
-class TFX_HOST_API openclKernel {
+class openclKernel {
  public:
   // Sets argument `index`; see DataType for what `value` and `size` are. False when the runtime
   // refuses it (wrong size for the kernel's declaration, index out of range, ...).
@@ -118,7 +120,7 @@ class TFX_HOST_API openclKernel {
   ~openclKernel() = default;
 };
 
-class TFX_HOST_API openclProgram {
+class openclProgram {
  public:
   // Builds the program from `source` (`sourceLength` bytes, 0: up to its terminating zero) or,
   // when `source` is null, from the file <path>/<name>.cl. `options` go to the compiler (null:
@@ -141,7 +143,7 @@ class TFX_HOST_API openclProgram {
   ~openclProgram() = default;
 };
 
-class TFX_HOST_API openclProgramManager {
+class openclProgramManager {
  public:
   // The program registered under `name`, or null.
   virtual openclProgram* getOpenCLProgram(const char* name) = 0;
