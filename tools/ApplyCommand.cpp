@@ -1,12 +1,9 @@
-#include <sys/stat.h>
-
 #include <cstdio>
 #include <limits>
 
 #include "Commands.h"
 #include "FilterHost.h"
 #include "ImageFiles.h"
-#include "OpenCLDevices.h"
 #include "Text.h"
 
 namespace tfxtool {
@@ -21,15 +18,8 @@ Status RunOpenCL(const PluginLibrary& plugin, const ResolvedFilter& filter,
   }
   NLEComPtr<INLECGDevice> device;
   OpenCLTarget target;
-  if (Status s = OpenDevice(deviceIndex, device, &target.deviceName); !s.ok()) return s;
-  target.device = device.get();
-  target.kernelDir = kernelDir.empty() ? plugin.KernelDir() : kernelDir;
-  // The plug-in reports a missing directory like a failed build; this says it plainly.
-  struct stat info = {};
-  if (stat(target.kernelDir.c_str(), &info) != 0 || !S_ISDIR(info.st_mode)) {
-    return Status::Error(
-        "no kernel directory at " + target.kernelDir +
-        (kernelDir.empty() ? " (beside the plug-in; --kernels DIR names another)" : ""));
+  if (Status s = OpenOpenCLTarget(plugin, deviceIndex, kernelDir, device, &target); !s.ok()) {
+    return s;
   }
   return RunFilterOpenCL(plugin, filter, settings, target, input, result);
 }

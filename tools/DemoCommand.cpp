@@ -160,12 +160,10 @@ int RunOpenCLTwins(const PluginLibrary& plugin, const std::vector<OpenCLTwin>& t
   }
   NLEComPtr<INLECGDevice> device;
   OpenCLTarget target;
-  if (Status s = OpenDevice(-1, device, &target.deviceName); !s.ok()) {
+  if (Status s = OpenOpenCLTarget(plugin, -1, "", device, &target); !s.ok()) {
     std::fprintf(stderr, "tessarofx: error: %s\n", s.message().c_str());
     return 1;
   }
-  target.device = device.get();
-  target.kernelDir = plugin.KernelDir();
   int failures = 0;
   for (const OpenCLTwin& twin : twins) {
     cv::Mat result;

@@ -1,8 +1,11 @@
 #include "FilterHost.h"
 
+#include <sys/stat.h>
+
 #include <algorithm>
 #include <cctype>
 
+#include "OpenCLDevices.h"
 #include "Text.h"
 #include "tessarofx/NLECGFilter.h"
 #include "tessarofx/NLEHost.h"
@@ -378,6 +381,20 @@ Status RunFilter(const PluginLibrary& plugin, const ResolvedFilter& filter,
     return Status::Error(filter.name + " failed: " + DescribeResult(hr), hr);
   }
   *out = dst;
+  return Status::Ok();
+}
+
+Status OpenOpenCLTarget(const PluginLibrary& plugin, int index, const std::string& kernelDir,
+                        NLEComPtr<INLECGDevice>& device, OpenCLTarget* target) {
+  if (Status s = OpenDevice(index, device, &target->deviceName); !s.ok()) return s;
+  target->device = device.get();
+  target->kernelDir = kernelDir.empty() ? plugin.KernelDir() : kernelDir;
+  struct stat info = {};
+  if (stat(target->kernelDir.c_str(), &info) != 0 || !S_ISDIR(info.st_mode)) {
+    return Status::Error(
+        "no kernel directory at " + target->kernelDir +
+        (kernelDir.empty() ? " (beside the plug-in; --kernels DIR names another)" : ""));
+  }
   return Status::Ok();
 }
 

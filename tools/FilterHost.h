@@ -73,6 +73,13 @@ struct OpenCLTarget {
   std::string kernelDir;
 };
 
+// Opens device `index` (-1: the default choice) and names the kernel directory: `kernelDir`, or
+// the one beside the loaded plug-in. A directory that does not exist is refused here, as the
+// plug-in would only report a failed build. `device` holds the device for as long as `target`
+// is used.
+Status OpenOpenCLTarget(const PluginLibrary& plugin, int index, const std::string& kernelDir,
+                        NLEComPtr<INLECGDevice>& device, OpenCLTarget* target);
+
 // RunFilter for the filter's OpenCL class: the same settings, with `input` uploaded into a frame
 // in the device's memory and the result downloaded into `out`. The OpenCL classes adjust one
 // frame, so there is no background.
