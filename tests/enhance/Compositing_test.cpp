@@ -6,6 +6,7 @@
 #include <climits>
 #include <cstdint>
 #include <cstring>
+#include <utility>
 #include <vector>
 
 #include "support/ImageBuilders.h"
@@ -19,40 +20,31 @@ struct Output {
   int height = 0;
   ~Output() { delete[] bits; }
   const unsigned char* Pixel(int x, int y) const { return bits + (size_t(y) * width + x) * 4; }
-  bool AllZero() const {
-    return std::all_of(bits, bits + size_t(width) * height * 4, [](int v) { return v == 0; });
-  }
+  std::pair<int, int> Size() const { return {width, height}; }
 };
 
-std::vector<uint8_t> Pixel(const unsigned char* p) { return {p[0], p[1], p[2], p[3]}; }
+using Px = std::vector<uint8_t>;
 
-TEST(MakeImageFrame, BorderZeroCopiesTheSourceIntoAReusedOutput) {
-  const int stride = 5 * 4 + 8;
-  const std::vector<uint8_t> src = tfx_test::NoiseBytes(3 * stride, 1);
-  Output out;
-  ASSERT_EQ(makeImageFrame(&out.bits, &out.width, &out.height, src.data(), 5, 3, stride, 32,
-                           {1, 2, 3, 4}, 0),
-            1);
-  unsigned char* const first = out.bits;
-  ASSERT_EQ(makeImageFrame(&out.bits, &out.width, &out.height, src.data(), 5, 3, stride, 32,
-                           {1, 2, 3, 4}, 0),
-            1);
-  EXPECT_EQ(out.bits, first);
-  ASSERT_EQ(out.width, 5);
-  ASSERT_EQ(out.height, 3);
-  for (int y = 0; y < 3; ++y) EXPECT_EQ(std::memcmp(out.Pixel(0, y), &src[y * stride], 20), 0);
+Px Pixel(const unsigned char* p) { return {p[0], p[1], p[2], p[3]}; }
+
+int Frame(Output& out, const uint8_t* src, int w, int h, int stride, PIPNLERGB colour, int border) {
+  return makeImageFrame(&out.bits, &out.width, &out.height, src, w, h, stride, 32, colour, border);
 }
 
-TEST(MakeImageFrame, TransparentSourceGivesAnEmptyFrame) {
-  std::vector<uint8_t> src = tfx_test::NoiseBytes(6 * 4 * 4, 2);
-  for (size_t i = 3; i < src.size(); i += 4) src[i] = src[i] % 51;  // alpha at most 50
-  Output out;
-  ASSERT_EQ(makeImageFrame(&out.bits, &out.width, &out.height, src.data(), 6, 4, 24, 32,
-                           {200, 100, 50, 255}, 3),
-            1);
-  EXPECT_EQ(out.width, 12);
-  EXPECT_EQ(out.height, 10);
-  EXPECT_TRUE(out.AllZero());
+TEST(MakeImageFrame, BorderZeroCopiesAndATransparentSourceGivesAnEmptyFrame) {
+  const int stride = 5 * 4 + 8;
+  const std::vector<uint8_t> src = tfx_test::NoiseBytes(3 * stride, 1);
+  Output copy;
+  ASSERT_EQ(Frame(copy, src.data(), 5, 3, stride, {1, 2, 3, 4}, 0), 1);
+  ASSERT_EQ(copy.Size(), std::pair(5, 3));
+  for (int y = 0; y < 3; ++y) EXPECT_EQ(std::memcmp(copy.Pixel(0, y), &src[y * stride], 20), 0);
+
+  std::vector<uint8_t> faint = tfx_test::NoiseBytes(6 * 4 * 4, 2);
+  for (size_t i = 3; i < faint.size(); i += 4) faint[i] = faint[i] % 51;  // alpha at most 50
+  Output empty;
+  ASSERT_EQ(Frame(empty, faint.data(), 6, 4, 24, {200, 100, 50, 255}, 3), 1);
+  ASSERT_EQ(empty.Size(), std::pair(12, 10));
+  EXPECT_TRUE(std::all_of(empty.bits, empty.bits + 12 * 10 * 4, [](int v) { return v == 0; }));
 }
 
 // An opaque 4x4 block in an 8x8 source, border 2: the output is 12x12 with the block at 4..7.
@@ -67,31 +59,26 @@ TEST(MakeImageFrame, OutlinesTheOpaqueBlockInReversedColourOrderWithASoftEdge) {
   Output out;
   out.bits = new unsigned char[4]{9, 9, 9, 9};
   out.width = out.height = 1;
-  ASSERT_EQ(makeImageFrame(&out.bits, &out.width, &out.height, src.data(), 8, 8, 32, 32, colour, 2),
-            1);
-  ASSERT_EQ(out.width, 12);
-  ASSERT_EQ(out.height, 12);
+  ASSERT_EQ(Frame(out, src.data(), 8, 8, 32, colour, 2), 1);
+  ASSERT_EQ(out.Size(), std::pair(12, 12));
   // Across the middle row: untouched, the outermost ring (colour, alpha 0), the soft edge
   // (6 of 9 covered: 200 * 170 / 255), full cover, and the same mirrored.
-  const std::vector<std::vector<uint8_t>> row = {
-      {0, 0, 0, 0},      {10, 20, 30, 0},   {10, 20, 30, 133}, {10, 20, 30, 200},
-      {10, 20, 30, 200}, {10, 20, 30, 200}, {10, 20, 30, 200}, {10, 20, 30, 200},
-      {10, 20, 30, 200}, {10, 20, 30, 133}, {10, 20, 30, 0},   {0, 0, 0, 0}};
+  const Px c0{0, 0, 0, 0}, ring{10, 20, 30, 0}, soft{10, 20, 30, 133}, full{10, 20, 30, 200};
+  const Px row[] = {c0, ring, soft, full, full, full, full, full, full, soft, ring, c0};
   for (int x = 0; x < 12; ++x) {
     EXPECT_EQ(Pixel(out.Pixel(x, 5)), row[x]) << "x " << x;
     EXPECT_EQ(Pixel(out.Pixel(5, x)), row[x]) << "y " << x;
   }
   // The dilated square loses its corners before the soft edge: 1 of 9 left, 200 * 28 / 255.
-  EXPECT_EQ(Pixel(out.Pixel(1, 1)), (std::vector<uint8_t>{0, 0, 0, 0}));
-  EXPECT_EQ(Pixel(out.Pixel(2, 2)), (std::vector<uint8_t>{10, 20, 30, 21}));
+  EXPECT_EQ(Pixel(out.Pixel(1, 1)), c0);
+  EXPECT_EQ(Pixel(out.Pixel(2, 2)), (Px{10, 20, 30, 21}));
 
   // Same size again: kept, and pixels the outline does not reach stay as they were.
   std::memset(out.bits, 7, size_t(12) * 12 * 4);
   unsigned char* const kept = out.bits;
-  ASSERT_EQ(makeImageFrame(&out.bits, &out.width, &out.height, src.data(), 8, 8, 32, 32, colour, 2),
-            1);
+  ASSERT_EQ(Frame(out, src.data(), 8, 8, 32, colour, 2), 1);
   EXPECT_EQ(out.bits, kept);
-  EXPECT_EQ(Pixel(out.Pixel(0, 5)), (std::vector<uint8_t>{7, 7, 7, 7}));
+  EXPECT_EQ(Pixel(out.Pixel(0, 5)), (Px{7, 7, 7, 7}));
   EXPECT_EQ(Pixel(out.Pixel(3, 5)), row[3]);
 }
 
@@ -102,16 +89,14 @@ TEST(ScaleImage, MapsTheWholeCanvasOntoTheSourceAlpha) {
   Output out;
   ASSERT_EQ(
       scaleImage(&out.bits, &out.width, &out.height, src.data(), 4, 2, 32, {10, 20, 30, 77}, 1), 1);
-  ASSERT_EQ(out.width, 6);
-  ASSERT_EQ(out.height, 4);
+  ASSERT_EQ(out.Size(), std::pair(6, 4));
   // Column x reads source column trunc(x * 4 / 6), row y source row trunc(y * 2 / 4); the
   // inclusive upper limits give column 5 and row 3 an alpha too.
   const int alpha[4][6] = {
       {0, 0, 0, 0, 0, 0}, {0, 1, 2, 3, 3, 4}, {0, 5, 6, 7, 7, 8}, {0, 5, 6, 7, 7, 8}};
   for (int y = 0; y < 4; ++y) {
     for (int x = 0; x < 6; ++x) {
-      EXPECT_EQ(Pixel(out.Pixel(x, y)), (std::vector<uint8_t>{30, 20, 10, uint8_t(alpha[y][x])}))
-          << x << "," << y;
+      EXPECT_EQ(Pixel(out.Pixel(x, y)), (Px{30, 20, 10, uint8_t(alpha[y][x])})) << x << "," << y;
     }
   }
 }
@@ -238,8 +223,7 @@ TEST(BlurImage, RadiusZeroCopiesAndAPaddedBlurFadesOutward) {
   const std::vector<uint8_t> src = tfx_test::NoiseBytes(3 * 2 * 4, 10);
   Output out;
   ASSERT_EQ(blurImage(&out.bits, &out.width, &out.height, src.data(), 3, 2, 32, 0), 1);
-  ASSERT_EQ(out.width, 3);
-  ASSERT_EQ(out.height, 2);
+  ASSERT_EQ(out.Size(), std::pair(3, 2));
   EXPECT_EQ(std::memcmp(out.bits, src.data(), src.size()), 0);
 
   // A uniform image replicated by 1 and blurred 3x3 against the black beyond: corners see 4 of
@@ -247,10 +231,8 @@ TEST(BlurImage, RadiusZeroCopiesAndAPaddedBlurFadesOutward) {
   std::vector<uint8_t> flat(3 * 2 * 4);
   for (size_t i = 0; i < flat.size(); i += 4) std::memcpy(&flat[i], "\x5a\xb4\x1b\xff", 4);
   ASSERT_EQ(blurImage(&out.bits, &out.width, &out.height, flat.data(), 3, 2, 32, 1), 1);
-  ASSERT_EQ(out.width, 5);
-  ASSERT_EQ(out.height, 4);
-  const std::vector<uint8_t> corner{40, 80, 12, 113}, edge{60, 120, 18, 170},
-      inside{90, 180, 27, 255};
+  ASSERT_EQ(out.Size(), std::pair(5, 4));
+  const Px corner{40, 80, 12, 113}, edge{60, 120, 18, 170}, inside{90, 180, 27, 255};
   for (int y = 0; y < 4; ++y) {
     for (int x = 0; x < 5; ++x) {
       const int outer = (x == 0 || x == 4) + (y == 0 || y == 3);
@@ -304,8 +286,7 @@ TEST(FrameFunctions, RefuseBadInputWithoutTouchingTheOutput) {
   };
   for (const auto& bad : cases) EXPECT_EQ(bad.result, 0) << bad.name;
   EXPECT_EQ(out.bits, nullptr);
-  EXPECT_EQ(out.width, 0);
-  EXPECT_EQ(out.height, 0);
+  EXPECT_EQ(out.Size(), std::pair(0, 0));
 
   EXPECT_FALSE(reMallocImage(nullptr, 4, 4, 4));
   EXPECT_FALSE(reMallocImage(o, 0, 4, 4));
