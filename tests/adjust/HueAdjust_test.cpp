@@ -124,8 +124,7 @@ TEST(HueAdjust, KeepsGreysAndComesBackAtAFullTurn) {
   }
   // Rows that sum to 1 in float would truncate most greys a level down; greys stay put.
   CxImage ramp(256, 1, 32, IPF_BGRA);
-  for (int v = 0; v < 256; ++v)
-    ramp.SetPixelColor(v, 0, tagRGBQUAD{uint8_t(v), uint8_t(v), uint8_t(v), 9});
+  for (int v = 0; v < 256; ++v) std::memset(ramp.GetBits() + 4 * v, v, 4);
   for (int angle = -180; angle <= 360; angle += 15) {
     const Image grey = Clone(ramp);
     hueAdjustment(grey.get(), static_cast<float>(angle));
@@ -136,8 +135,6 @@ TEST(HueAdjust, KeepsGreysAndComesBackAtAFullTurn) {
       ASSERT_EQ(std::memcmp(&out, &c, 4), 0) << angle << ' ' << v;
     }
   }
-  // The luma family is shared with vibrance.
-  EXPECT_EQ(calLuma(tagRGBQUAD{10, 200, 51, 0}), 105);
 }
 
 TEST(HueAdjust, ConcurrentRotationsWithDifferentAnglesStayApart) {
@@ -187,9 +184,9 @@ TEST(HueAdjust, ExactRotationTurnsTheSameWayAsTheMatrix) {
       const std::vector<uint8_t> c = NoiseBytes(3, static_cast<uint32_t>(i + 1));
       const tagRGBQUAD out = transformHue1(tagRGBQUAD{c[0], c[1], c[2], 0}, angle);
       const _rgb exact = transformHue2(_rgb{c[2] / 255.0f, c[1] / 255.0f, c[0] / 255.0f}, angle);
-      EXPECT_NEAR(out.rgbRed, level(exact.r), 1.5f) << i;
-      EXPECT_NEAR(out.rgbGreen, level(exact.g), 1.5f) << i;
-      EXPECT_NEAR(out.rgbBlue, level(exact.b), 1.5f) << i;
+      ASSERT_NEAR(out.rgbRed, level(exact.r), 1.5f) << i;
+      ASSERT_NEAR(out.rgbGreen, level(exact.g), 1.5f) << i;
+      ASSERT_NEAR(out.rgbBlue, level(exact.b), 1.5f) << i;
     }
   }
 }

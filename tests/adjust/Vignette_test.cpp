@@ -15,6 +15,7 @@
 
 namespace {
 
+using tfx_test::Clone;
 using tfx_test::Image;
 using tfx_test::NoiseImage;
 using tfx_test::SameBuffer;
@@ -115,30 +116,7 @@ TEST(VignetteGradient, FollowsTheEllipseAtItsLandmarks) {
   EXPECT_EQ(at(100, 60), 1.0f);
   // The feather band falls monotonically from 1 to 0 along a ray.
   for (int x = 111; x < 199; ++x) EXPECT_LE(at(x + 1, 50), at(x, 50)) << x;
-  // A null mask is ignored.
-  generateGradient(200, 100, 0.5f, 0.0f, 1.0f, nullptr);
-  EXPECT_FLOAT_EQ(distance(1, 2, 4, 6), 5.0f);
-}
-
-// Every 24-bit colour once, with an alpha that varies on its own. Sanitizer builds take every
-// seventh colour.
-const std::vector<uint8_t>& EveryColour() {
-#if defined(TFX_SANITIZE_BUILD)
-  constexpr uint32_t kStep = 7;
-#else
-  constexpr uint32_t kStep = 1;
-#endif
-  static const std::vector<uint8_t> pixels = [] {
-    std::vector<uint8_t> all(size_t((1u << 24) + kStep - 1) / kStep * 4);
-    for (uint32_t i = 0; i < all.size() / 4; ++i) {
-      const uint32_t c = i * kStep;
-      const uint8_t px[4] = {uint8_t(c), uint8_t(c >> 8), uint8_t(c >> 16),
-                             uint8_t((i * 2654435761u) >> 24)};
-      std::memcpy(&all[size_t(i) * 4], px, 4);
-    }
-    return all;
-  }();
-  return pixels;
+  generateGradient(200, 100, 0.5f, 0.0f, 1.0f, nullptr);  // a null mask is ignored
 }
 
 TEST(VignetteRow, MatchesThePixelFormOnEveryColour) {
@@ -151,7 +129,8 @@ TEST(VignetteRow, MatchesThePixelFormOnEveryColour) {
                {-0.6f, darken, 0.0f, 0.5f},  {-0.45f, under, 0.27f, 0.0f},
                {-0.45f, under, 0.27f, 1.0f}, {-0.45f, under, 0.27f, 0.99999994f},
                {0.8f, over, -0.8f, 0.0f},    {0.8f, over, -0.8f, 0.0173f}};
-  const std::vector<uint8_t>& all = EveryColour();
+  const CxImage& every = tfx_test::EveryColour();
+  const std::vector<uint8_t> all(every.GetBits(), every.GetBits() + every.GetSize());
   for (const auto& p : cases) {
     SCOPED_TRACE(testing::Message() << "a " << p.a << " b " << p.b << " g " << p.g);
     std::vector<uint8_t> expected = all;
@@ -214,8 +193,7 @@ TEST(Vignette, MatchesMaskAndPixelFormOnEveryLayout) {
       SCOPED_TRACE(testing::Message() << l.width << 'x' << l.height << '/' << l.bpp << " amount "
                                       << s.amount << " exposure " << s.exposure);
       const Image actual = NoiseImage(l.width, l.height, l.bpp, l.format, l.effWidth, l.width);
-      Image expected = std::make_unique<CxImage>();
-      expected->Copy(*actual);
+      const Image expected = Clone(*actual);
       ReferenceFilter(expected.get(), s);
       EXPECT_EQ(vignetteAdjustFilter(actual.get(), s.amount, s.feather, s.highlights, s.size,
                                      s.roundness, s.exposure),
@@ -227,8 +205,7 @@ TEST(Vignette, MatchesMaskAndPixelFormOnEveryLayout) {
 
 TEST(Vignette, LeavesImageUntouchedWithoutStrengthOrPixels) {
   const Image image = NoiseImage(31, 17, 32, IPF_BGRA, 124, 4);
-  Image original = std::make_unique<CxImage>();
-  original->Copy(*image);
+  const Image original = Clone(*image);
   vignetteAdjustFilter(image.get(), 0.0f, 80.0f, 90.0f, 10.0f, 50.0f, 0.0f);
   EXPECT_TRUE(SameBuffer(*original, *image));
   CxImage empty;
@@ -242,8 +219,7 @@ TEST(Vignette, LeavesImageUntouchedWithoutStrengthOrPixels) {
 TEST(Vignette, FullDarkeningBlackensTheOutsideAndKeepsAlpha) {
   // Size 0 and no feather: the corners lie far outside. Exposure 0 keeps the centre.
   const Image image = NoiseImage(80, 60, 32, IPF_BGRA, 320, 8);
-  Image original = std::make_unique<CxImage>();
-  original->Copy(*image);
+  const Image original = Clone(*image);
   vignetteAdjustFilter(image.get(), -100.0f, 0.0f, 50.0f, 0.0f, 0.0f, 0.0f);
   for (const auto& [x, y] : {std::pair{0, 0}, std::pair{79, 59}, std::pair{0, 59}}) {
     const tagRGBQUAD c = image->GetPixelColor(x, y, true);
