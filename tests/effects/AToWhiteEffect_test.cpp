@@ -9,7 +9,6 @@
 namespace {
 
 using tfx_test::CreateEffect;
-using tfx_test::ExpectRefusesMissingForeground;
 constexpr const wchar_t* kAToWhite = L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356";
 
 // Despite the name, fully transparent pixels become opaque black; any other alpha passes.
@@ -25,11 +24,6 @@ TEST(AToWhiteEffect, TurnsOnlyFullyTransparentPixelsOpaqueBlack) {
   const std::vector<uint8_t> expected = {0,  0,   0, 255, 10, 20,  30,   1,    10,   20,
                                          30, 255, 0, 0,   0,  255, 0xEE, 0xEE, 0xEE, 0xEE};
   EXPECT_EQ(dst->pixels, expected);
-}
-
-TEST(AToWhiteEffect, MissingForegroundIsABadArgument) {
-  NLEComPtr<INLECGFilter> filter = CreateEffect(kAToWhite, nullptr);
-  ExpectRefusesMissingForeground(filter.get());
 }
 
 }  // namespace

@@ -13,7 +13,6 @@ namespace {
 
 namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
-using tfx_test::ExpectRefusesMissingForeground;
 using tfx_test::SetParam;
 using tfx_test::Settings;
 constexpr const wchar_t* kChromeKey = L"DB4BBA18-48FC-4164-B572-E59757B02796";
@@ -133,11 +132,6 @@ TEST(ChromeKeyLut3dEffect, FiltersOnTwoThreadsGiveTheirSingleThreadedResults) {
     EXPECT_EQ(results[0][frame], mask);
     EXPECT_EQ(results[1][frame], beauty);
   }
-}
-
-TEST(ChromeKeyLut3dEffect, MissingForegroundIsABadArgument) {
-  NLEComPtr<INLECGFilter> filter = GreenKey(0);
-  ExpectRefusesMissingForeground(filter.get());
 }
 
 }  // namespace

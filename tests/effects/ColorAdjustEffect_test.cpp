@@ -11,7 +11,6 @@ namespace {
 
 namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
-using tfx_test::ExpectRefusesMissingForeground;
 using tfx_test::FillRandom;
 using tfx_test::Settings;
 constexpr const wchar_t* kColorAdjust = L"18C6E879-4138-42D0-B0B9-6B4401AA97E6";
@@ -66,11 +65,6 @@ TEST(ColorAdjustEffect, ParametersChangedAfterCreationTakeEffect) {
   EXPECT_EQ(dst->pixels[1], static_cast<int>(50 * gain));
   EXPECT_EQ(dst->pixels[2], 255);
   EXPECT_EQ(dst->pixels[3], 7);
-}
-
-TEST(ColorAdjustEffect, MissingForegroundIsABadArgument) {
-  NLEComPtr<INLECGFilter> filter = CreateEffect(kColorAdjust, nullptr);
-  ExpectRefusesMissingForeground(filter.get());
 }
 
 }  // namespace

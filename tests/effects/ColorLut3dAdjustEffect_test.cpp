@@ -14,7 +14,6 @@ namespace {
 
 namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
-using tfx_test::ExpectRefusesMissingForeground;
 using tfx_test::FillRandom;
 constexpr const wchar_t* kColorLut = L"74EB022D-1D73-4D1E-9F70-487C356D46CD";
 
@@ -149,11 +148,6 @@ TEST_F(ColorLut3dAdjustEffect, EmptyPathFailsWithoutWriting) {
     EXPECT_EQ(Run(filter.get(), &in, &out), NLE_E_RESOURCE);
     EXPECT_EQ(out, std::vector<uint8_t>(64, 0xEE));
   }
-}
-
-TEST_F(ColorLut3dAdjustEffect, MissingForegroundIsABadArgument) {
-  NLEComPtr<INLECGFilter> filter = CreateEffect(kColorLut, PathSettings(Wide(Path("halve.cube"))));
-  ExpectRefusesMissingForeground(filter.get());
 }
 
 }  // namespace

@@ -11,7 +11,6 @@ namespace {
 
 namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
-using tfx_test::ExpectRefusesMissingForeground;
 using tfx_test::FillRandom;
 using tfx_test::Settings;
 constexpr const wchar_t* kLightAdjust = L"D8651B53-F47A-4B98-B8E9-35B491D5EADC";
@@ -62,11 +61,6 @@ TEST(LightAdjustEffect, AppliesTheFourOperationsInOrder) {
       for (int c = 0; c < 4; ++c) ASSERT_EQ(dst->Pixel(x, y)[c], expected[y * 256 + x * 4 + c]);
     }
   }
-}
-
-TEST(LightAdjustEffect, MissingForegroundIsABadArgument) {
-  NLEComPtr<INLECGFilter> filter = CreateEffect(kLightAdjust, Settings({{L"u_highLight", 50}}));
-  ExpectRefusesMissingForeground(filter.get());
 }
 
 }  // namespace

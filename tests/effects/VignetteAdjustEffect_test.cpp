@@ -60,9 +60,4 @@ TEST(VignetteAdjustEffect, PassesEachParameterToItsArgumentWithItsDefault) {
   }
 }
 
-TEST(VignetteAdjustEffect, MissingForegroundIsABadArgument) {
-  NLEComPtr<INLECGFilter> filter = CreateVignette({{L"amount", -50}});
-  tfx_test::ExpectRefusesMissingForeground(filter.get());
-}
-
 }  // namespace

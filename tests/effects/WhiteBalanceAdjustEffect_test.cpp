@@ -119,14 +119,4 @@ TEST(WhiteBalanceAdjustEffect, ZeroCopiesAndTheRangeEndsDoubleAndRemoveChannels)
   EXPECT_EQ(dst->pixels, plain);
 }
 
-TEST(WhiteBalanceAdjustEffect, MissingForegroundIsABadArgument) {
-  NLEComPtr<INLECGFilter> filter = CreateEffect(kWhiteBalance, Settings({{L"u_temperature", 50}}));
-  TestFrame* bg = new TestFrame(2, 2, 0, false, 40);
-  TestFrame* dst = new TestFrame(2, 2, 0, false, 9);
-  NLEComPtr<INLEFrame> h1(bg), h2(dst);
-  filter->SetBackground(bg);
-  EXPECT_EQ(filter->Running(dst), NLE_E_INVALIDARG);
-  EXPECT_EQ(dst->pixels, std::vector<uint8_t>(16, 9));
-}
-
 }  // namespace

@@ -5,6 +5,7 @@
 
 #include "plugin/NLEBasicCrossFilter.h"
 #include "plugin/NLEDynamicEffect.h"
+#include "support/EffectHarness.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"
 
@@ -241,6 +242,18 @@ TEST(CreateFilterFromGUID, HostSettingsOverrideRegisteredDefaults) {
   registered.QueryInterface(IID_INLEProperties, &registeredTint);
   EXPECT_NE(mine.get(), registeredTint.get());
   EXPECT_EQ(StringOf(mine, Key::Property::kVariantName), L"u_tint");
+}
+
+// Every CPU class reads the foreground, so without one it refuses and leaves the output alone.
+TEST(CreateFilterFromGUID, EveryCpuClassRefusesAMissingForeground) {
+  ASSERT_EQ(GetFilterCount(), 10u);
+  for (int i = 0; i < 10; ++i) {
+    const std::wstring guid = StringOf(Descriptor(i), Key::kFilterID);
+    SCOPED_TRACE(std::string(guid.begin(), guid.end()));
+    NLEComPtr<INLECGFilter> filter = tfx_test::CreateEffect(guid.c_str(), nullptr);
+    ASSERT_TRUE(filter);
+    tfx_test::ExpectRefusesMissingForeground(filter.get());
+  }
 }
 
 }  // namespace
