@@ -18,9 +18,14 @@
 // A failed read leaves the lattice zeroed up to the rows read before the error.
 //
 // Threading: an object is used by one thread at a time. getInstance() hands out a process-wide
-// object that every construction (clone() included) replaces; objects may be built on several
-// threads at once, but code that may run on several threads owns its objects and never uses the
-// instance, which another thread can replace or release at any moment.
+// object that every public construction (clone() included) replaces; objects may be built on
+// several threads at once, but code that may run on several threads owns its objects and never
+// uses the instance, which another thread can replace or release at any moment.
+//
+// What a host may rely on: the instance is only ever an object built through the public
+// constructor or clone(), by the host or by getInstance(). The filters build their lattices
+// unlisted, so getInstance() never returns a filter's table and releaseInstance() can never
+// destroy one; a host may call both at any time without harming a filter.
 #pragma once
 
 #include <atomic>
@@ -42,7 +47,8 @@ class TFX_API CubeLut {
 
   static constexpr int kMaxSize = 64;  // points per axis the lattice holds
 
-  // Status 1, size 0: doLUT refuses to run (23) until something is loaded or generated.
+  // Status 1, size 0: doLUT refuses to run (23) until something is loaded or generated. The new
+  // object becomes the process-wide instance.
   CubeLut();
   virtual ~CubeLut();
   CubeLut(const CubeLut&) = delete;
@@ -77,8 +83,11 @@ class TFX_API CubeLut {
   bool writeLUT3D2File(const char* path);
 
   // Applies the table in place to `height` rows of `width` pixels, bytes 0, 1, 2 = blue, green,
-  // red; further bytes (alpha) are left as they are. bytesPerPixel must be at least 3. Returns 0,
-  // or 23 without touching the pixels when the size is outside 1..64.
+  // red; further bytes (alpha) are left as they are. Rows start `pitch` bytes apart (negative for
+  // bottom-up rows), each at least width * bytesPerPixel bytes long. Returns 23 without touching
+  // the pixels when the size is outside 1..64; otherwise 0, and the pixels are left untouched
+  // when `pixels` is null, width or height is below 1, bytesPerPixel is below 3, or |pitch| is
+  // shorter than a row.
   int doLUT(unsigned char* pixels, int width, int height, int pitch, int bytesPerPixel);
 
   // A deep copy without the row table. The copy becomes the process-wide instance.
@@ -105,6 +114,12 @@ class TFX_API CubeLut {
   // does nothing. Null detaches (and frees) it.
   void setRowTable(float (*rows)[3]);
   float (*getRowTable())[3] { return rowTable_; }
+
+ protected:
+  // An object that never becomes the process-wide instance, for owners that must not be reached
+  // or destroyed through getInstance() and releaseInstance().
+  struct Unlisted {};
+  explicit CubeLut(Unlisted);
 
  private:
   void buildTables();  // fraction and grid index tables from size_

@@ -1,12 +1,14 @@
 #include "effects/ChromeKeyTables.h"
 
+#include "lut/OwnedCubeLut.h"
+
 namespace {
 
 uint8_t KeyByte(int v) { return static_cast<uint8_t>(v < 0 ? 0 : (v > 255 ? 255 : v)); }
 
 }  // namespace
 
-ChromeKeyTables::ChromeKeyTables() : beauty_(new CubeLut()), alpha_(new CubeLut()) {
+ChromeKeyTables::ChromeKeyTables() : beauty_(new OwnedCubeLut()), alpha_(new OwnedCubeLut()) {
   // 64 points, so that the tables are applied over the whole lattice the generator fills.
   beauty_->generateLUT3DData(NLEChromeKeyLut3dGenerator::kPoints);
   alpha_->generateLUT3DData(NLEChromeKeyLut3dGenerator::kPoints);

@@ -2,6 +2,7 @@
 
 #include <cwchar>
 
+#include "lut/OwnedCubeLut.h"
 #include "tessarofx/NLEHost.h"
 
 namespace {
@@ -28,7 +29,7 @@ std::wstring TranslatePath(const std::wstring& path) {
 }  // namespace
 
 CubeLut& LutFileCache::Table() {
-  if (!table_) table_.reset(new CubeLut());
+  if (!table_) table_.reset(new OwnedCubeLut());
   return *table_;
 }
 

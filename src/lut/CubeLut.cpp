@@ -5,13 +5,16 @@
 
 #include <algorithm>
 #include <cmath>
+#include <cstdint>
 #include <cstring>
 
 #include "lut/CubeLutApply.h"
 
 std::atomic<CubeLut*> CubeLut::mLut3d{nullptr};
 
-CubeLut::CubeLut()
+CubeLut::CubeLut() : CubeLut(Unlisted{}) { mLut3d.store(this); }
+
+CubeLut::CubeLut(Unlisted)
     : status_(1),
       size_(0),
       rowTable_(nullptr),
@@ -22,7 +25,6 @@ CubeLut::CubeLut()
       domainMax_{1.0f, 1.0f, 1.0f},
       atlasBytes_(0) {
   // The tables and the lattice start out unwritten; size 0 keeps doLUT away from them.
-  mLut3d.store(this);
 }
 
 CubeLut::~CubeLut() {
@@ -68,6 +70,11 @@ int CubeLut::doLUT(unsigned char* pixels, int width, int height, int pitch, int 
   status_ = 0;
   if (static_cast<unsigned>(size_ - 1) > 63u) return 23;
   if (rowTable_ || height < 1) return 0;
+  if (!pixels || width < 1 || bytesPerPixel < 3) return 0;
+  // Rows closer together than a row's bytes would run past the end of the caller's buffer; one
+  // row needs no pitch at all.
+  const int64_t rowBytes = int64_t{width} * bytesPerPixel;
+  if (height > 1 && (pitch < 0 ? -int64_t{pitch} : int64_t{pitch}) < rowBytes) return 0;
   const tfx::TetraTable table{&lattice_[0][0][0][0], ft_, gt_, size_};
   for (int y = 0; y < height; ++y) {
     tfx::TetraRow(table, pixels + static_cast<ptrdiff_t>(y) * pitch, width, bytesPerPixel);
