@@ -4,6 +4,7 @@
 #include "Commands.h"
 #include "FilterHost.h"
 #include "ImageFiles.h"
+#include "OpenCLDevices.h"
 #include "Text.h"
 
 namespace tfxtool {
@@ -69,6 +70,9 @@ Status ApplyCommand(const GlobalOptions& options, const Args& args) {
     return Status::Error(
         "--background does not go with --opencl: the OpenCL filters adjust one "
         "frame");
+  }
+  if (opencl) {
+    if (Status s = CheckOpenCLUsable(options.noOpenCL); !s.ok()) return s;
   }
   long long deviceIndex = -1;
   if (!deviceText.empty() && (!ParseInteger(deviceText, &deviceIndex) || deviceIndex < -1 ||

@@ -12,6 +12,7 @@ namespace tfxtool {
 
 struct GlobalOptions {
   std::string pluginPath;  // --plugin; empty: the usual search
+  bool noOpenCL = false;   // --no-opencl: nothing in this run touches the OpenCL runtime
 };
 
 using Args = std::vector<std::string>;

@@ -148,11 +148,16 @@ struct OpenCLTwin {
 };
 
 // The steps again through their OpenCL classes on the default device, each picture written as
-// opencl-LABEL.png with how far it lies from the CPU class's. A machine without OpenCL skips
-// them; a device that cannot run them is a failure. Returns the number of failures.
-int RunOpenCLTwins(const PluginLibrary& plugin, const std::vector<OpenCLTwin>& twins,
-                   const std::string& dir) {
+// opencl-LABEL.png with how far it lies from the CPU class's. A machine without OpenCL, or whose
+// runtime cannot start, skips them with the reason; a device that cannot run them is a failure.
+// Returns the number of failures.
+int RunOpenCLTwins(const GlobalOptions& options, const PluginLibrary& plugin,
+                   const std::vector<OpenCLTwin>& twins, const std::string& dir) {
   if (twins.empty()) return 0;
+  if (Status s = CheckOpenCLUsable(options.noOpenCL); !s.ok()) {
+    std::printf("skipped the OpenCL classes: %s\n", s.message().c_str());
+    return 0;
+  }
   std::vector<NLEOpenCLDeviceInfo> devices;
   if (!ListDevices(&devices).ok() || devices.empty()) {
     std::printf("skipped the OpenCL classes: no OpenCL device on this machine\n");
@@ -255,7 +260,6 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
       twins.push_back({step.Label(), filter, step.params, foreground, result});
     }
   }
-  failures += RunOpenCLTwins(plugin, twins, dir);
 
   for (const DemoFxStep& step : DemoFxSteps()) {
     cv::Mat input = scene;
@@ -297,6 +301,8 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
   const std::string sheetFile = dir + "/contact-sheet.png";
   if (Status s = WriteImage(sheetFile, sheet); !s.ok()) return s;
   std::printf("wrote %s\n", sheetFile.c_str());
+  // Last, so that an OpenCL runtime that fails in any way cannot cost a CPU picture.
+  failures += RunOpenCLTwins(options, plugin, twins, dir);
   if (failures) return Status::Error(std::to_string(failures) + " demo step(s) failed");
   return Status::Ok();
 }

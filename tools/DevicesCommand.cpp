@@ -7,8 +7,9 @@
 
 namespace tfxtool {
 
-Status DevicesCommand(const GlobalOptions&, const Args& args) {
+Status DevicesCommand(const GlobalOptions& options, const Args& args) {
   if (!args.empty()) return Status::Error("devices: unexpected argument '" + args[0] + "'");
+  if (Status s = CheckOpenCLUsable(options.noOpenCL); !s.ok()) return s;
   std::vector<NLEOpenCLDeviceInfo> devices;
   if (Status s = ListDevices(&devices); !s.ok()) return s;
   // Having no OpenCL is a state of the machine, not a mistake on the command line.

@@ -63,6 +63,8 @@ Options:
   --log-level N|off  plug-in log threshold: 0 trace, 16 debug, 32 info, 48 warning,
                      64 error (default: $TESSAROFX_LOG_LEVEL, else 48)
   -v, --verbose      log level 32: show each filter as it is created
+  --no-opencl        never touch the OpenCL runtime (also $TESSAROFX_NO_OPENCL=1): the
+                     demo skips its OpenCL pictures, apply --opencl and devices refuse
   -h, --help         this text
 
 Images: PNG, TIFF and WebP keep alpha; JPEG and BMP are written without it. Every image
@@ -105,6 +107,8 @@ int Run(int argc, char** argv) {
       help = true;
     } else if (all[i] == "-v" || all[i] == "--verbose") {
       verbose = true;
+    } else if (all[i] == "--no-opencl") {
+      options.noOpenCL = true;
     } else if (!TakeOptionValue(all, &i, "--plugin", nullptr, &options.pluginPath, &error) &&
                !TakeOptionValue(all, &i, "--log-level", nullptr, &logLevel, &error) && error.ok()) {
       rest.push_back(all[i]);

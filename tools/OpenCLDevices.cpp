@@ -1,7 +1,12 @@
 #include "OpenCLDevices.h"
 
+#include <fcntl.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
 #include <algorithm>
 #include <cstdlib>
+#include <cstring>
 
 #include "Text.h"
 
@@ -16,7 +21,49 @@ std::string Range(size_t count) {
                           std::to_string(count - 1);
 }
 
+// Lists the devices in a child process. What the runtime prints there as it fails is left out:
+// the reason reaches the user once, as the tool's own message.
+Status ProbeRuntime() {
+  std::fflush(stdout);
+  std::fflush(stderr);
+  const pid_t child = fork();
+  if (child < 0) return Status::Error(std::string("cannot start a process: ") + strerror(errno));
+  if (child == 0) {
+    const int null = open("/dev/null", O_WRONLY);
+    if (null >= 0) {
+      dup2(null, STDOUT_FILENO);
+      dup2(null, STDERR_FILENO);
+    }
+    uint32_t count = 0;
+    NLECommon::ListOpenCLDevices(nullptr, 0, &count);
+    _exit(0);
+  }
+  int status = 0;
+  while (waitpid(child, &status, 0) < 0) {
+    if (errno != EINTR) return Status::Error(std::string("cannot wait: ") + strerror(errno));
+  }
+  if (WIFSIGNALED(status)) {
+    return Status::Error(std::string("the OpenCL runtime crashed while starting (") +
+                         strsignal(WTERMSIG(status)) +
+                         "); --no-opencl or TESSAROFX_NO_OPENCL=1 keeps the tool away from it");
+  }
+  if (!WIFEXITED(status) || WEXITSTATUS(status) != 0) {
+    return Status::Error("the OpenCL runtime failed while starting (exit status " +
+                         std::to_string(WEXITSTATUS(status)) + ")");
+  }
+  return Status::Ok();
+}
+
 }  // namespace
+
+Status CheckOpenCLUsable(bool turnedOff) {
+  if (turnedOff) return Status::Error("OpenCL is turned off (--no-opencl)");
+  if (const char* off = std::getenv("TESSAROFX_NO_OPENCL"); off && *off && std::strcmp(off, "0")) {
+    return Status::Error(std::string("OpenCL is turned off (TESSAROFX_NO_OPENCL=") + off + ")");
+  }
+  static const Status probed = ProbeRuntime();
+  return probed;
+}
 
 Status ListDevices(std::vector<NLEOpenCLDeviceInfo>* devices) {
   uint32_t count = 0;

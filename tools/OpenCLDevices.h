@@ -10,6 +10,13 @@
 
 namespace tfxtool {
 
+// Whether this run may touch the OpenCL runtime at all. Not when `turnedOff` (--no-opencl) or
+// TESSAROFX_NO_OPENCL (any value but empty and "0") says so, nor when the runtime crashes while
+// starting: a runtime that aborts inside its own start-up (PoCL without /sys, a broken driver)
+// would take the tool with it, so a child process starts it first. Asked once per run; the
+// error says why OpenCL is unavailable and how to turn it off.
+Status CheckOpenCLUsable(bool turnedOff);
+
 // Every device of every platform, in the kit's order (its indices are the kit's indices).
 Status ListDevices(std::vector<NLEOpenCLDeviceInfo>* devices);
 

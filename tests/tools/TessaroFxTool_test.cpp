@@ -862,4 +862,39 @@ TEST_F(ToolTest, UsageGoesToStdoutOnRequestAndStderrOnMistakes) {
   EXPECT_NE(none.err.find("usage: tessarofx"), npos);
 }
 
+TEST_F(ToolTest, AFailingOpenCLRuntimeCostsNoCpuPicture) {
+  // The loader reads the runtimes to start from *.icd files in OCL_ICD_VENDORS.
+  fs::create_directory(Path("vendors"));
+  std::ofstream(Path("vendors/aborting.icd")) << TFX_ABORTING_OPENCL << "\n";
+  const std::string aborting = "OCL_ICD_VENDORS=" + Path("vendors");
+  const Outcome crashed = Run("demo", aborting);
+  ASSERT_EQ(crashed.exitCode, 0) << crashed.err;
+  EXPECT_NE(crashed.out.find("skipped the OpenCL classes: the OpenCL runtime crashed while "
+                             "starting (Aborted); --no-opencl or TESSAROFX_NO_OPENCL=1"),
+            npos)
+      << crashed.out;
+  const Outcome off = Run("--no-opencl demo off", aborting);
+  ASSERT_EQ(off.exitCode, 0) << off.err;
+  EXPECT_NE(off.out.find("skipped the OpenCL classes: OpenCL is turned off (--no-opencl)"), npos);
+  for (const char* name :
+       {"sample", "ColorAdjust", "ChromeKeyCombine", "denoise", "cutout-frame", "contact-sheet"}) {
+    EXPECT_TRUE(fs::exists(Path(std::string("demo-out/") + name + ".png"))) << name;
+    EXPECT_TRUE(fs::exists(Path(std::string("off/") + name + ".png"))) << name;
+  }
+  for (const char* dir : {"demo-out", "off"}) {
+    for (const auto& entry : fs::directory_iterator(Path(dir))) {
+      EXPECT_NE(entry.path().filename().string().rfind("opencl-", 0), 0u) << entry.path();
+    }
+  }
+  // Commands that need OpenCL refuse with the reason instead of dying with the runtime.
+  WriteInput("in.png");
+  const Outcome apply = Run("apply --opencl Lut -p lut3dPath=x.cube in.png o.png", aborting);
+  EXPECT_EQ(apply.exitCode, 1);
+  EXPECT_NE(apply.err.find("the OpenCL runtime crashed while starting"), npos) << apply.err;
+  const Outcome devices = Run("devices", "TESSAROFX_NO_OPENCL=1 " + aborting);
+  EXPECT_EQ(devices.exitCode, 1);
+  EXPECT_NE(devices.err.find("OpenCL is turned off (TESSAROFX_NO_OPENCL=1)"), npos);
+  EXPECT_FALSE(fs::exists(Path("o.png")));
+}
+
 }  // namespace
