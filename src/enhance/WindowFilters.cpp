@@ -152,14 +152,15 @@ template <class Totals>
 void MoveDown(Totals& totals, const uint8_t* src, int64_t y, int64_t width, int64_t height,
               int64_t radius) {
   const bool enters = y + radius <= height - 1, leaves = y - radius - 1 >= 0;
-  const uint8_t* entering = src + (y + radius) * width;
-  const uint8_t* leaving = src + (y - radius - 1) * width;
+  // Row addresses are formed only for rows inside the plane: with a radius far beyond it they
+  // would point billions of bytes away, past the ends of the address space.
+  const auto row = [&](int64_t i) { return src + i * width; };
   if (enters && leaves) {
-    totals.Move(entering, leaving, width);
+    totals.Move(row(y + radius), row(y - radius - 1), width);
   } else if (enters) {
-    totals.Add(entering, width);
+    totals.Add(row(y + radius), width);
   } else if (leaves) {
-    totals.Remove(leaving, width);
+    totals.Remove(row(y - radius - 1), width);
   }
 }
 
