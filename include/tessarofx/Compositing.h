@@ -45,8 +45,8 @@ TFX_API int scaleImage(unsigned char** out, int* outWidth, int* outHeight, const
 // (dstX, dstY) (negative positions clip), both images stored bottom-up, each alpha first scaled
 // by its opacity in percent. -1 as a copy size means the source's. Integer arithmetic with
 // truncating divisions. False for a null image, else true; sizes below 1, a source stride
-// below its row, opacities outside 0..100 or a block starting left of or above the source leave
-// `dst` as it was.
+// below its row, opacities outside 0..100, a block starting left of or above the source, or
+// either image above INT_MAX bytes leave `dst` as it was.
 TFX_API bool mergeImage(unsigned char* dst, const unsigned char* src, int dstWidth, int dstHeight,
                         int srcWidth, int srcHeight, int srcStride, int dstX, int dstY,
                         int copyWidth, int copyHeight, int srcX, int srcY, int srcOpacity,

@@ -193,6 +193,9 @@ bool mergeImage(unsigned char* dst, const unsigned char* src, int dstWidth, int 
     return true;
   }
   if (srcOpacity < 0 || srcOpacity > 100 || dstOpacity < 0 || dstOpacity > 100) return true;
+  // Images above INT_MAX bytes are refused, as everywhere in this file; a destination far beyond
+  // that would also take its row offsets past 64 bits.
+  if (!FitsInt(dstWidth, dstHeight, 4) || int64_t{srcStride} * srcHeight > INT_MAX) return true;
 
   // A negative destination position clips the block and moves its source origin along.
   const int64_t clipX = std::min(dstX, 0);

@@ -10,6 +10,7 @@
 
 #include "support/ImageBuilders.h"
 #include "tessarofx/Blur.h"
+#include "tessarofx/Compositing.h"
 #include "tessarofx/Denoise.h"
 
 namespace {
@@ -44,6 +45,29 @@ TEST(WindowFilters, TreatRadiiFarBeyondThePlaneAsTheWholePlane) {
       filter.run(far, radius);
       EXPECT_EQ(far, whole);
     }
+  }
+}
+
+// Destinations and sources above INT_MAX bytes are refused before a row is touched; the largest
+// ones would put row offsets past 64 bits. The buffers are small: only the sizes are huge.
+TEST(MergeImage, LeavesImagesAboveIntMaxBytesAlone) {
+  const std::vector<uint8_t> src = NoiseBytes(64 * 64 * 4, 5);
+  const struct {
+    const char* name;
+    int dstWidth, dstHeight, srcWidth, srcHeight, srcStride;
+  } cases[] = {
+      {"destination past 64-bit offsets", INT_MAX, INT_MAX, 8, 8, 32},
+      {"destination of 4 GiB", 1 << 16, 1 << 14, 8, 8, 32},
+      {"destination of 2 GiB", 1 << 15, 1 << 14, 8, 8, 32},
+      {"source of 4 GiB", 8, 8, 8, 1 << 16, 1 << 16},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    std::vector<uint8_t> dst = NoiseBytes(64 * 64 * 4, 6);
+    const std::vector<uint8_t> before = dst;
+    EXPECT_TRUE(mergeImage(dst.data(), src.data(), c.dstWidth, c.dstHeight, c.srcWidth, c.srcHeight,
+                           c.srcStride, 0, 0, -1, -1, 0, 0, 100, 100));
+    EXPECT_EQ(dst, before);
   }
 }
 
