@@ -334,7 +334,8 @@ bool DctDenoisePlaneOfTarget(const uint8_t* src, uint8_t* dst, int width, int he
   uint8_t* below = above + savedBytes;
 
   for (int first = 0, out = 0; out < blocks;) {
-    const int end = std::min(first + kBandBlocks, blocks);
+    // Compared as a distance: first + kBandBlocks overflows on planes near INT_MAX rows.
+    const int end = blocks - first > kBandBlocks ? first + kBandBlocks : blocks;
     const Band band{src + first * stride,
                     dst + first * stride,
                     stride,
