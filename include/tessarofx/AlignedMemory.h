@@ -14,7 +14,8 @@ TFX_API void* AllocMemory(uint32_t size, bool zero);
 TFX_API void FreeMemory(void* block);
 
 // A block of `size` bytes aligned to `alignment` (a power of two; smaller values are raised to
-// the pointer size); null when the allocation fails or the alignment is not a power of two.
+// the pointer size); null when the allocation fails, the alignment is not a power of two or the
+// size exceeds PTRDIFF_MAX.
 // Release it with aligned_free.
 TFX_API void* aligned_malloc(size_t size, size_t alignment);
 // Releases an aligned_malloc block; null is ignored.

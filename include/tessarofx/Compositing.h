@@ -29,15 +29,18 @@ TFX_API bool reMallocImage(unsigned char** buffer, int width, int height, int by
 // A coloured outline `border` pixels wide around the pixels of `src` whose alpha is above 50,
 // with a soft edge: the output, (w + 2 border) x (h + 2 border), is left as it was where the
 // outline does not reach, and elsewhere gets the colour with alpha scaled by the outline's
-// coverage (0 in the outermost `border` pixels). Border 0 copies the source. Only 32 bits per
-// pixel are accepted. Returns 1, or 0 on failure.
+// coverage (0 in the outermost `border` pixels). Border 0 copies the source. Returns 1, or 0 for a
+// null pointer, bits per pixel other than 32, a negative border, a size below 1, a stride below
+// width * 4, an output or mask above INT_MAX bytes, or no memory.
 TFX_API int makeImageFrame(unsigned char** out, int* outWidth, int* outHeight,
                            const unsigned char* src, int width, int height, int stride, int bpp,
                            PIPNLERGB color, int border);
 
 // A (w + 2 border) x (h + 2 border) canvas of the colour whose alpha is the source's alpha
 // scaled over the whole canvas, and 0 outside the inner area. Bytes 0, 1, 2 are blue, green,
-// red here (the reverse of makeImageFrame's order). Returns 1, or 0 on failure.
+// red here (the reverse of makeImageFrame's order). Source rows are width * 4 bytes. Returns 1,
+// or 0 for a null pointer, bits per pixel other than 32, a negative border, a size below 1, an
+// output above INT_MAX bytes, or no memory.
 TFX_API int scaleImage(unsigned char** out, int* outWidth, int* outHeight, const unsigned char* src,
                        int width, int height, int bpp, PIPNLERGB color, int border);
 
@@ -53,14 +56,17 @@ TFX_API bool mergeImage(unsigned char* dst, const unsigned char* src, int dstWid
                         int dstOpacity);
 
 // Copies the centred dstWidth x dstHeight block of `src` into `dst`. False for a null image, a
-// destination larger than the source, or a stride below the row it must hold.
+// destination larger than the source, or a stride below the row it must hold (strides count in
+// whole pixels); true, copying nothing, for a destination size below 1.
 TFX_API bool clipOutBorder(const unsigned char* src, unsigned char* dst, int srcWidth,
                            int srcHeight, int srcStride, int dstWidth, int dstHeight,
                            int dstStride);
 
 // Pads the source by `radius` pixels on every side with its edge pixels and box-blurs the
 // result with a (2 radius + 1)^2 window that fades towards transparent black at the outer edge.
-// The output is (w + 2 radius) x (h + 2 radius); radius 0 gives a copy. Returns 1, or 0 on
-// failure.
+// The output is (w + 2 radius) x (h + 2 radius); radius 0 gives a copy. Source rows are
+// width * 4 bytes. Returns 1, or 0 for a null pointer, bits per pixel other than 32, a size below
+// 1, a negative radius, a source, output or temporary (another radius on every side) above
+// INT_MAX bytes, or no memory.
 TFX_API int blurImage(unsigned char** out, int* outWidth, int* outHeight, const unsigned char* src,
                       int width, int height, int bpp, int radius);

@@ -8,7 +8,8 @@
 #include "tessarofx/Export.h"
 
 // The orthonormal 8-point DCT-II of `in` into `out` (8 floats each; they may be the same
-// array), or with `inverse` its transpose, the DCT-III.
+// array), or with `inverse` its transpose, the DCT-III. Null pointers do nothing, here and in
+// the two block transforms below.
 TFX_API void DCT8X81D(const float* in, float* out, bool inverse);
 // The separable 2-D transform of an 8 x 8 row-major block (rows, then columns); `out` may be
 // `in`.
@@ -26,7 +27,10 @@ TFX_API void dct_Denosing(const unsigned char* src, unsigned char* dst, int widt
                           int stride, float sigma);
 
 // dct_Denosing with sigma = strength * 0.15 on the red, green and blue planes of an image of 24
-// or 32 bits; alpha is kept. Strength 0, a null image or one without pixels: returned as is.
+// or 32 bits; alpha is kept. Returned as is for strength 0, a null image, one without pixels or
+// of other depths or wider than 2^27 - 2 pixels, and a header that does not describe its buffer:
+// a stride shorter than a row, or GetSize() other than stride * height (a size that wrapped
+// around 32 bits).
 TFX_API CxImage* deNoiseRGB(CxImage* image, float strength);
 // The same on the hue, saturation and lightness planes (all three, not only lightness).
 TFX_API CxImage* deNoiseLumiance(CxImage* image, float strength);
