@@ -1,0 +1,229 @@
+// Frame-parallel work as a host and a batch tool do it: every filter and a spread of the
+// enhancement functions, each job with its own filter object, settings and frame size, run on
+// several threads at once in different orders. Every result must equal the same job run alone.
+// The library's process-wide caches (lens maps, the hue matrix, the lattice instance, dispatch
+// tables) are shared by all of them; ThreadSanitizer runs this test in CI.
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <fstream>
+#include <functional>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "support/EffectHarness.h"
+#include "tessarofx/Blur.h"
+#include "tessarofx/Compositing.h"
+#include "tessarofx/CxImage.h"
+#include "tessarofx/Denoise.h"
+#include "tessarofx/DetailFilters.h"
+#include "tessarofx/HueAdjust.h"
+#include "tessarofx/LensAdjust.h"
+#include "tessarofx/WhiteBalance.h"
+
+namespace {
+
+using tfx_test::EffectParams;
+using Bytes = std::vector<uint8_t>;
+
+struct Job {
+  std::string name;
+  std::function<Bytes()> run;
+};
+
+void Fill(uint8_t* p, size_t n, unsigned seed) {
+  uint32_t x = seed * 2654435761u + 1;
+  for (size_t i = 0; i < n; ++i) {
+    x = x * 1664525u + 1013904223u;
+    p[i] = static_cast<uint8_t>(x >> 24);
+  }
+}
+
+// Frames through one filter object; between frames one parameter changes, as a host's keyframes
+// change it.
+Bytes RunFilter(const wchar_t* guid, EffectParams params, int width, int height, int padding,
+                const wchar_t* animated, std::vector<double> values, bool mask) {
+  if (values.empty()) values.push_back(0);
+  if (animated) params.push_back({animated, values[0]});
+  NLEComPtr<INLECGFilter> filter = tfx_test::CreateEffect(guid, tfx_test::Settings(params).get());
+  Bytes out;
+  if (!filter) return out;
+  for (size_t frame = 0; frame < values.size(); ++frame) {
+    if (animated) tfx_test::SetParam(filter.get(), animated, values[frame]);
+    TestFrame* fg = new TestFrame(width, height, width * 4 + padding);
+    TestFrame* bg = new TestFrame(width, height);
+    TestFrame* dst = new TestFrame(width, height, width * 4 + padding, false, 7);
+    NLEComPtr<INLEFrame> h1(fg), h2(bg), h3(dst);
+    Fill(fg->pixels.data(), fg->pixels.size(), static_cast<unsigned>(frame * 31 + width));
+    Fill(bg->pixels.data(), bg->pixels.size(), static_cast<unsigned>(frame + height));
+    filter->SetForeground(fg);
+    if (mask) filter->SetBackground(bg);
+    EXPECT_EQ(filter->Running(dst), NLE_S_OK);
+    out.insert(out.end(), dst->pixels.begin(), dst->pixels.end());
+  }
+  return out;
+}
+
+// A function on a 32-bit BGRA image of its own.
+Bytes RunOnImage(int width, int height, unsigned seed, const std::function<void(CxImage*)>& fn) {
+  CxImage image(static_cast<unsigned>(width), static_cast<unsigned>(height), 32, IPF_BGRA);
+  Fill(image.GetBits(), image.GetSize(), seed);
+  fn(&image);
+  return Bytes(image.GetBits(), image.GetBits() + image.GetSize());
+}
+
+Bytes RunOnBuffer(size_t bytes, unsigned seed, const std::function<void(uint8_t*)>& fn) {
+  Bytes buffer(bytes);
+  Fill(buffer.data(), buffer.size(), seed);
+  fn(buffer.data());
+  return buffer;
+}
+
+std::string WriteCube() {
+  const std::string path =
+      "/tmp/tfx-parallel-" + std::to_string(getpid()) + ".cube";  // removed by the test
+  std::ofstream out(path);
+  out << "LUT_3D_SIZE 3\n";
+  for (int b = 0; b < 3; ++b) {
+    for (int g = 0; g < 3; ++g) {
+      for (int r = 0; r < 3; ++r) out << g * 0.4 << ' ' << b * 0.5 << ' ' << r * 0.3 << '\n';
+    }
+  }
+  return path;
+}
+
+std::vector<Job> Jobs(const std::wstring& cube) {
+  std::vector<Job> jobs;
+  const auto filter = [&](const char* name, const wchar_t* guid, EffectParams params, int w, int h,
+                          int padding, const wchar_t* animated = nullptr,
+                          std::vector<double> values = {}, bool mask = false) {
+    jobs.push_back(
+        {name, [=] { return RunFilter(guid, params, w, h, padding, animated, values, mask); }});
+  };
+  const wchar_t* kColor = L"18C6E879-4138-42D0-B0B9-6B4401AA97E6";
+  const wchar_t* kLight = L"D8651B53-F47A-4B98-B8E9-35B491D5EADC";
+  const wchar_t* kBalance = L"39509FB9-39FB-4516-9464-3D891DD61D62";
+  const wchar_t* kVignette = L"8622FC58-4DF1-44BD-9B37-2F633D4D3368";
+  const wchar_t* kHsl = L"AF91FF05-6577-4A4B-C81E-652EE7D6596E";
+  const wchar_t* kLens = L"CFAAD60B-AC2B-4B39-A8E1-D25E35A6F735";
+  const wchar_t* kKey = L"DB4BBA18-48FC-4164-B572-E59757B02796";
+  const wchar_t* kCombine = L"41AA934B-757A-4EAD-8F7B-85E2E2952B6A";
+  const wchar_t* kToWhite = L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356";
+  filter("ColorAdjust a", kColor,
+         {{L"u_exposure", 20}, {L"u_brightness", -30}, {L"u_contrast", 40}, {L"u_vib", 50}}, 33, 17,
+         0, L"u_sat", {-20, 35});
+  filter("ColorAdjust b", kColor, {{L"u_contrast", -60}, {L"u_vib", -40}}, 48, 9, 12);
+  filter("LightAdjust", kLight, {{L"u_highLight", -40}, {L"u_shadow", 50}, {L"u_blackLevel", -20}},
+         29, 13, 4, L"u_whiteLevel", {20, -30});
+  filter("WhiteBalanceAdjust", kBalance, {{L"u_tint", 10}}, 40, 11, 0, L"u_temperature", {40, -60});
+  filter("VignetteAdjust", kVignette,
+         {{L"size", 80}, {L"roundness", 20}, {L"feather", 40}, {L"highlights", 30}}, 37, 21, 8,
+         L"amount", {-50, 70});
+  filter("HSLAdjust", kHsl, {{L"u_red_hue", 30}, {L"u_green_sat", -40}, {L"u_blue_light", 25}}, 31,
+         15, 0, L"u_orange_width", {10, 60});
+  // Lens strengths change every frame and differ between jobs, so the shared map cache is built,
+  // evicted and read from several threads at once.
+  filter("DistortionFringingAdjust a", kLens, {{L"fringing", 40}}, 45, 19, 0, L"distortion",
+         {30, -20, 30.5});
+  filter("DistortionFringingAdjust b", kLens, {{L"distortion", -10}}, 38, 22, 4, L"fringing",
+         {-50, 10.5, 75});
+  filter("ChromeKeyLut3d mask", kKey,
+         {{L"red", 40}, {L"green", 200}, {L"blue", 60}, {L"contrast", 50}}, 26, 14, 0, L"offset",
+         {0, 20});
+  filter("ChromeKeyLut3d colours", kKey,
+         {{L"red", 200}, {L"green", 30}, {L"blue", 90}, {L"mode", 1}}, 30, 10, 4, L"contrast",
+         {50, 80});
+  filter("ChromeKeyCombine", kCombine, {}, 27, 12, 0, nullptr, {}, true);
+  filter("lutAToWhiteEffect", kToWhite, {}, 24, 16, 8);
+  jobs.push_back({"Lut", [cube] {
+                    NLEComPtr<INLECGFilter> f =
+                        tfx_test::CreateEffect(L"74EB022D-1D73-4D1E-9F70-487C356D46CD",
+                                               tfx_test::TextSettings(L"lut3dPath", cube).get());
+                    TestFrame* fg = new TestFrame(35, 18);
+                    TestFrame* dst = new TestFrame(35, 18);
+                    NLEComPtr<INLEFrame> h1(fg), h2(dst);
+                    Fill(fg->pixels.data(), fg->pixels.size(), 5);
+                    f->SetForeground(fg);
+                    EXPECT_EQ(f->Running(dst), NLE_S_OK);
+                    return dst->pixels;
+                  }});
+
+  const auto image = [&](const char* name, int w, int h, std::function<void(CxImage*)> fn) {
+    jobs.push_back({name, [=] { return RunOnImage(w, h, static_cast<unsigned>(w * h), fn); }});
+  };
+  image("hueAdjustment a", 41, 9, [](CxImage* i) { hueAdjustment(i, 40.0f); });
+  image("hueAdjustment b", 23, 17, [](CxImage* i) { hueAdjustment(i, -70.0f); });
+  image("temperatureAdjustment", 25, 19, [](CxImage* i) { temperatureAdjustment(i, 3500); });
+  image("distortFilter", 34, 20, [](CxImage* i) { distortFilter(i, 45.0f); });
+  image("fringingFilter", 34, 20, [](CxImage* i) { fringingFilter(i, -35.0f); });
+  image("deNoiseRGB", 40, 24, [](CxImage* i) { deNoiseRGB(i, 30.0f); });
+  image("deNoiseLumiance", 24, 40, [](CxImage* i) { deNoiseLumiance(i, 50.0f); });
+  image("dehaze", 36, 20, [](CxImage* i) { dehaze(i, 40.0f); });
+  image("sharpen", 30, 12, [](CxImage* i) { sharpen(i, 60.0f); });
+  image("clarity", 28, 28, [](CxImage* i) { clarity(i, -30.0f); });
+  image("diffuse", 33, 21, [](CxImage* i) { diffuse(i, 120.0f); });
+  image("addNoiseFilter", 27, 13, [](CxImage* i) { addNoiseFilter(i, 30.0f, 0.5f); });
+
+  const auto buffer = [&](const char* name, size_t bytes, std::function<void(uint8_t*)> fn) {
+    jobs.push_back({name, [=] { return RunOnBuffer(bytes, static_cast<unsigned>(bytes), fn); }});
+  };
+  buffer("gaussianBlur", 36 * 20 * 4, [](uint8_t* p) { gaussianBlur(p, 36, 20, 4, 5); });
+  buffer("fastAverageBlur", 30 * 25 * 3, [](uint8_t* p) { fastAverageBlur(p, 30, 25, 3, 4); });
+  buffer("window filters", 2 * 40 * 30, [](uint8_t* p) {
+    fastWindowVarianceFilter(p, p + 1200, 40, 30, 3);
+    fastFilter(p + 1200, p, 40, 30, 2, 0.5f);
+  });
+  buffer("dct_Denosing", 2 * 32 * 24, [](uint8_t* p) { dct_Denosing(p, p + 768, 32, 24, 32, 20); });
+  buffer("blurImage and makeImageFrame", 20 * 14 * 4, [](uint8_t* p) {
+    unsigned char* out = nullptr;
+    int w = 0, h = 0;
+    blurImage(&out, &w, &h, p, 20, 14, 32, 3);
+    makeImageFrame(&out, &w, &h, p, 20, 14, 80, 32, PIPNLERGB{200, 150, 40, 255}, 4);
+    std::copy(out, out + 20 * 14 * 4, p);
+    delete[] out;
+  });
+  return jobs;
+}
+
+TEST(ParallelFrames, EveryJobOnFourThreadsGivesItsSerialBytes) {
+  const std::string cube = WriteCube();
+  const std::vector<Job> jobs = Jobs(std::wstring(cube.begin(), cube.end()));
+  std::vector<Bytes> serial;
+  for (const Job& job : jobs) {
+    serial.push_back(job.run());
+    ASSERT_FALSE(serial.back().empty()) << job.name;
+  }
+
+  constexpr int kThreads = 4, kRounds = 2;
+  std::vector<std::vector<Bytes>> results(kThreads, std::vector<Bytes>(jobs.size()));
+  std::vector<int> mismatches(kThreads, 0);
+  std::vector<std::thread> threads;
+  for (int t = 0; t < kThreads; ++t) {
+    threads.emplace_back([&, t] {
+      // Each thread starts at another job and walks the list in its own direction, so different
+      // jobs meet in every round.
+      const size_t n = jobs.size();
+      for (int round = 0; round < kRounds; ++round) {
+        for (size_t k = 0; k < n; ++k) {
+          const size_t i = t % 2 ? (t * 7 + k) % n : (n - 1 - (t * 5 + k) % n);
+          Bytes out = jobs[i].run();
+          if (out != serial[i]) ++mismatches[t];
+          results[t][i] = std::move(out);
+        }
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  std::remove(cube.c_str());
+  for (int t = 0; t < kThreads; ++t) {
+    EXPECT_EQ(mismatches[t], 0) << "thread " << t;
+    for (size_t i = 0; i < jobs.size(); ++i) {
+      EXPECT_EQ(results[t][i], serial[i]) << jobs[i].name << " on thread " << t;
+    }
+  }
+  releaseLensVariables();
+}
+
+}  // namespace
