@@ -78,7 +78,8 @@ class TFX_API CxImage {
   // Re-shapes the image. An owning image frees its buffer and allocates an uninitialised one of
   // GetSize() bytes; a wrapping image keeps its buffer and only changes the header. Rows are
   // padded to a multiple of 4 bytes. Returns this, or null (leaving the image empty) when an
-  // argument is 0 or the allocation fails.
+  // argument is 0, a row or the whole buffer needs more bytes than the 32-bit fields hold, or the
+  // allocation fails.
   CxImage* Create(unsigned int width, unsigned int height, unsigned int bpp,
                   _ImagePixelFormat format);
   // Frees an owned buffer and empties the header; a wrapped buffer is left untouched.

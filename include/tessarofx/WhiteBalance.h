@@ -63,7 +63,8 @@ TFX_API CxImage* temperatureAdjustment(CxImage* image, long t);
 
 // A width x height 24-bit image tagged IPF_RGB whose column x holds the black-body colour of
 // 30000 - 100 x kelvin, stored as the bytes blue, green, red (opposite to the tag). The caller
-// owns the result and deletes it; a zero or negative size gives an empty image.
+// owns the result and deletes it; a zero or negative size, or one whose bytes do not fit 32 bits
+// (see CxImage::Create), gives an empty image.
 TFX_API CxImage* createTemperateColor(int width, int height);
 
 // Tint: k = trunc(t * 100) >> 8; red and blue gain (Y * k) >> 8, green (Y * -k) >> 8, with

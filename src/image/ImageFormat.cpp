@@ -103,11 +103,16 @@ CxImage* CxImage::Create(unsigned int w, unsigned int h, unsigned int nBpp, _Ima
   Destroy();
   if (w == 0 || h == 0 || nBpp == 0) return nullptr;
 
+  // In 64 bits: the row and the whole buffer must each fit their 32-bit field, or the buffer
+  // allocated would be a wrapped-around fraction of what the header describes.
+  const uint64_t rowBytes = ((uint64_t{nBpp} * w + 31) >> 3) & ~uint64_t{3};
+  if (rowBytes > UINT32_MAX || rowBytes * h > UINT32_MAX) return nullptr;
+
   bytesPerPixel = BytesPerPixelFor(nBpp);
   width = w;
   height = h;
   bpp = nBpp;
-  effWidth = ((nBpp * w + 31) >> 3) & ~3u;
+  effWidth = static_cast<uint32_t>(rowBytes);
   size = effWidth * h;
   if (ownsBits) {
     // Left uninitialised on purpose: every caller overwrites the pixels.
