@@ -93,16 +93,18 @@ class TFX_API CxImage {
   uint32_t GetBpp() const { return bpp; }
   _ImagePixelFormat getFormat() const { return format; }
 
-  // Reads one pixel in this image's byte order. Out-of-range coordinates, a missing buffer and
-  // unsupported format/size combinations read as the all-zero quad. A grey pixel is returned in
-  // all four bytes, alpha included, whatever `bGetAlpha` says.
+  // Reads one pixel in this image's byte order. Out-of-range coordinates, a pixel whose bytes would
+  // end past GetSize() (a header whose stride or size does not cover its rows), a missing buffer
+  // and unsupported format/size combinations read as the all-zero quad. A grey pixel is returned
+  // in all four bytes, alpha included, whatever `bGetAlpha` says.
   tagRGBQUAD GetPixelColor(unsigned long x, unsigned long y, bool bGetAlpha = true) const;
   // Writes one pixel; ignored where GetPixelColor would read zero. A grey image stores the red
   // byte; 4-byte formats always store alpha.
   void SetPixelColor(unsigned long x, unsigned long y, tagRGBQUAD c);
 
-  // Takes the source's header and pixels. When this image holds a buffer of other dimensions,
-  // that buffer is deleted first, even a wrapped one (the caller's pointer is then cleared).
+  // Takes the source's header and pixels. When this image holds a buffer of other dimensions, or
+  // one smaller than the source's GetSize(), that buffer is deleted first, even a wrapped one (the
+  // caller's pointer is then cleared).
   // The ownership flag is copied from the source as well.
   void Copy(const CxImage* src);
   // As above, but only when the source has pixels, and keeping this image's ownership flag.

@@ -43,6 +43,15 @@ void Unpack16(const uint8_t* p, uint8_t* low, uint8_t* green, uint8_t* high) {
   *high = static_cast<uint8_t>((w >> 11) & 255);
 }
 
+// Where pixel (x, y) starts, or -1 when its bytes would end past `size`. Coordinates inside the
+// image always fit a buffer whose header is sound; the check keeps a header with a short stride
+// or a wrapped size from reaching further than the bytes it claims.
+int64_t PixelOffset(unsigned long x, unsigned long y, uint32_t effWidth, uint32_t bytesPerPixel,
+                    uint32_t size) {
+  const uint64_t offset = uint64_t{y} * effWidth + uint64_t{x} * bytesPerPixel;
+  return offset + bytesPerPixel <= size ? static_cast<int64_t>(offset) : -1;
+}
+
 void Pack16(uint8_t* p, tagRGBQUAD c, uint32_t low, uint32_t high) {
   // The green term is added, not or-ed: its carries run into the neighbouring fields.
   const uint32_t word = (low | (high << 11)) + ((QuadWord(c) >> 3) & 0x1fe0);
@@ -129,7 +138,9 @@ CxImage* CxImage::Create(unsigned int w, unsigned int h, unsigned int nBpp, _Ima
 tagRGBQUAD CxImage::GetPixelColor(unsigned long x, unsigned long y, bool bGetAlpha) const {
   const tagRGBQUAD zero = Quad(0, 0, 0, 0);
   if (!bits || x >= width || y >= height || format == IPF_None) return zero;
-  const uint8_t* p = bits + y * effWidth + x * bytesPerPixel;
+  const int64_t offset = PixelOffset(x, y, effWidth, bytesPerPixel, size);
+  if (offset < 0) return zero;
+  const uint8_t* p = bits + offset;
   uint8_t c0, c1, c2;
   switch (format) {
     case IPF_Gray8:
@@ -157,7 +168,9 @@ tagRGBQUAD CxImage::GetPixelColor(unsigned long x, unsigned long y, bool bGetAlp
 
 void CxImage::SetPixelColor(unsigned long x, unsigned long y, tagRGBQUAD c) {
   if (!bits || x >= width || y >= height || format == IPF_None) return;
-  uint8_t* p = bits + y * effWidth + x * bytesPerPixel;
+  const int64_t offset = PixelOffset(x, y, effWidth, bytesPerPixel, size);
+  if (offset < 0) return;
+  uint8_t* p = bits + offset;
   switch (format) {
     case IPF_Gray8:
       if (bytesPerPixel == 1) p[0] = c.rgbRed;
@@ -203,7 +216,9 @@ void CxImage::SetPixelColor(unsigned long x, unsigned long y, tagRGBQUAD c) {
 
 void CxImage::Copy(const CxImage* src) {
   if (!src) return;
-  if (bits && (width != src->width || height != src->height || bpp != src->bpp)) {
+  // A buffer of the same dimensions may still be smaller than the source's (another stride).
+  if (bits &&
+      (width != src->width || height != src->height || bpp != src->bpp || size < src->size)) {
     // A wrapped buffer goes too; the caller learns of it through its cleared pointer.
     delete[] bits;
     bits = nullptr;
@@ -231,7 +246,7 @@ void CxImage::Copy(const CxImage* src) {
 
 void CxImage::Copy(const CxImage& src) {
   if (!src.bits) return;
-  if (bits && (width != src.width || height != src.height || bpp != src.bpp)) {
+  if (bits && (width != src.width || height != src.height || bpp != src.bpp || size < src.size)) {
     delete[] bits;
     bits = nullptr;
     if (!ownsBits && externalBits) *externalBits = nullptr;
