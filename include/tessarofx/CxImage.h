@@ -78,8 +78,8 @@ class TFX_API CxImage {
   // Re-shapes the image. An owning image frees its buffer and allocates an uninitialised one of
   // GetSize() bytes; a wrapping image keeps its buffer and only changes the header. Rows are
   // padded to a multiple of 4 bytes. Returns this, or null (leaving the image empty) when an
-  // argument is 0, a row or the whole buffer needs more bytes than the 32-bit fields hold, or the
-  // allocation fails.
+  // argument is 0, a row or the whole buffer needs more bytes than the 32-bit fields hold, the
+  // allocation fails, or a wrapping image would need more than the GetSize() it had.
   CxImage* Create(unsigned int width, unsigned int height, unsigned int bpp,
                   _ImagePixelFormat format);
   // Frees an owned buffer and empties the header; a wrapped buffer is left untouched.
@@ -112,12 +112,15 @@ class TFX_API CxImage {
 
   // Re-creates the given planes as 8-bit grey images of this size and fills them with the red,
   // green, blue and alpha bytes (SplitHSLA: hue, saturation, lightness and alpha). `a` may be
-  // null. False when this image has no buffer, no plane is given, or the image is grey or empty.
+  // null. False when this image has no buffer, no plane is given, the image is grey or empty, or
+  // its header is inconsistent (bpp other than 8, 16, 24, 32, a stride shorter than a row, or a
+  // size other than stride * height).
   bool SplitRGBA(CxImage* r, CxImage* g, CxImage* b, CxImage* a);
   bool SplitHSLA(CxImage* r, CxImage* g, CxImage* b, CxImage* a);
   // Rebuilds this image, keeping its bpp and format, from three or four equally sized 8-bit
   // planes; colorspace 1 reads them as H, S, L. Without `a`, alpha is whatever the re-created
-  // buffer held. Mismatched planes abort the process.
+  // buffer held. Mismatched planes abort the process. False when a plane is missing or this
+  // image cannot be re-created at the planes' non-zero size (see Create).
   bool Combine(CxImage* r, CxImage* g, CxImage* b, CxImage* a, int colorspace);
 
   // Integer HSL on a 0..255 scale. A grey has hue 170; a negative hue wraps modulo 256.

@@ -4,6 +4,7 @@
 #include <new>
 
 #include "base/Assert.h"
+#include "image/ImageLayout.h"
 #include "tessarofx/CxImage.h"
 
 namespace {
@@ -109,6 +110,9 @@ void CxImage::Destroy() {
 }
 
 CxImage* CxImage::Create(unsigned int w, unsigned int h, unsigned int nBpp, _ImagePixelFormat fmt) {
+  // A wrapped buffer holds what its header claimed and no more: the header may shrink, not grow.
+  const bool wrapped = !ownsBits && bits;
+  const uint32_t capacity = size;
   Destroy();
   if (w == 0 || h == 0 || nBpp == 0) return nullptr;
 
@@ -116,6 +120,7 @@ CxImage* CxImage::Create(unsigned int w, unsigned int h, unsigned int nBpp, _Ima
   // allocated would be a wrapped-around fraction of what the header describes.
   const uint64_t rowBytes = ((uint64_t{nBpp} * w + 31) >> 3) & ~uint64_t{3};
   if (rowBytes > UINT32_MAX || rowBytes * h > UINT32_MAX) return nullptr;
+  if (wrapped && rowBytes * h > capacity) return nullptr;
 
   bytesPerPixel = BytesPerPixelFor(nBpp);
   width = w;
@@ -271,6 +276,7 @@ void CxImage::Copy(const CxImage& src) {
 
 bool CxImage::SplitRGBA(CxImage* r, CxImage* g, CxImage* b, CxImage* a) {
   if (!bits || (!r && !g && !b) || format == IPF_Gray8 || format == IPF_None) return false;
+  if (!tfx::HasConsistentLayout(*this)) return false;
   CxImage* planes[4] = {r, g, b, a};
   for (CxImage* plane : planes) {
     if (plane) plane->Create(width, height, 8, IPF_Gray8);
@@ -289,6 +295,7 @@ bool CxImage::SplitRGBA(CxImage* r, CxImage* g, CxImage* b, CxImage* a) {
 
 bool CxImage::SplitHSLA(CxImage* r, CxImage* g, CxImage* b, CxImage* a) {
   if (!bits || (!r && !g && !b) || format == IPF_Gray8 || format == IPF_None) return false;
+  if (!tfx::HasConsistentLayout(*this)) return false;
   CxImage* planes[4] = {r, g, b, a};
   for (CxImage* plane : planes) {
     if (plane) plane->Create(width, height, 8, IPF_Gray8);
@@ -320,7 +327,9 @@ bool CxImage::Combine(CxImage* r, CxImage* g, CxImage* b, CxImage* a, int colors
                (r->GetBpp() == g->GetBpp() && g->GetBpp() == b->GetBpp() && b->GetBpp() == 8));
   }
 
-  Create(rw, rh, bpp, format);
+  // Planes without pixels leave this image empty, as ever; a size it cannot take (no bpp, too
+  // many bytes, more than a wrapped buffer holds) is a failure.
+  if (!Create(rw, rh, bpp, format) && rw != 0 && rh != 0) return false;
   for (unsigned long y = 0; y < rh; ++y) {
     for (unsigned long x = 0; x < rw; ++x) {
       tagRGBQUAD c =

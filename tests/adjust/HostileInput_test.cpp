@@ -80,4 +80,28 @@ TEST(CxImageCopy, ReplacesASameSizedBufferThatIsTooSmall) {
   }
 }
 
+TEST(CxImageWrapping, NeverGrowsPastTheCallersBuffer) {
+  // The header claims 16 bytes of a larger buffer; what lies beyond is not the image's.
+  std::vector<uint8_t> buffer = Patterned(64);
+  const std::vector<uint8_t> original = buffer;
+  uint8_t* bits = buffer.data();
+  CxImage image(&bits, 2, 2, 32, 8, IPF_BGRA);
+  EXPECT_EQ(image.Create(4, 4, 32, IPF_BGRA), nullptr);
+  EXPECT_EQ(image.GetWidth(), 0u);
+
+  CxImage again(&bits, 2, 2, 32, 8, IPF_BGRA);
+  CxImage r(4, 4, 8, IPF_Gray8), g(4, 4, 8, IPF_Gray8), b(4, 4, 8, IPF_Gray8);
+  EXPECT_FALSE(again.Combine(&r, &g, &b, nullptr, 0));
+  EXPECT_EQ(buffer, original);
+  // Shrinking stays within the buffer.
+  CxImage shrink(&bits, 2, 2, 32, 8, IPF_BGRA);
+  EXPECT_EQ(shrink.Create(1, 2, 32, IPF_BGRA), &shrink);
+
+  // A stride shorter than a row is no image to split.
+  CxImage shortRows(&bits, 8, 2, 32, 16, IPF_BGRA);
+  EXPECT_FALSE(shortRows.SplitRGBA(&r, &g, &b, nullptr));
+  EXPECT_FALSE(shortRows.SplitHSLA(&r, &g, &b, nullptr));
+  EXPECT_EQ(r.GetWidth(), 4u);
+}
+
 }  // namespace
