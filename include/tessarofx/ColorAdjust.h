@@ -2,7 +2,10 @@
 // saturation, each with its per-pixel form.
 //
 // The image functions change blue, green and red in place, keep alpha, and return the image
-// they were given. A null image, or a strength of exactly 0, leaves everything untouched.
+// they were given. A strength of exactly 0 leaves everything untouched, and so does an image that
+// is null, has no pixels, or whose header does not describe its buffer: a bpp other than 8, 16,
+// 24 or 32, a stride shorter than a row, or a size other than stride * height (as when that
+// product wrapped 32 bits).
 // Out-of-range strengths are not rejected; the formulas are applied as they stand. Every image
 // format is accepted; 32-bit BGRA and RGBA take a vectorised path that gives the same bytes as
 // the per-pixel accessors.

@@ -78,6 +78,8 @@ struct HSLBands {
 
 // Applies the bands to the image in place and returns it. 32-bit BGRA and RGBA frames go
 // through a direct row loop, other layouts through the per-pixel accessors (8-bit grey images
-// are unchanged). Row padding is left alone. A null image, one without pixels, or bands whose
-// hue, sat and light are all 0 leave everything untouched.
+// are unchanged). Row padding is left alone. Bands whose hue, sat and light are all 0 leave
+// everything untouched, and so does an image that is null, has no pixels, or whose header does
+// not describe its buffer (a bpp other than 8, 16, 24 or 32, a stride shorter than a row, or a
+// size other than stride * height).
 TFX_API CxImage* hslAdjustment(CxImage* image, const HSLBands& bands);

@@ -36,8 +36,10 @@ TFX_API void calculateHueMartrix(float angle);
 // Each row uses the bytes already rotated, so the result is not the matrix product (at 120
 // degrees every pixel turns grey); that order is the defined behaviour. Windows whose three bytes
 // are equal are greys and stay as they are (the float rows would otherwise truncate most of them
-// one level down at almost every angle). Angle 0 or a non-finite
-// angle, a null image or one without pixels: nothing changes and `matrix` is not written.
+// one level down at almost every angle). Angle 0 or a non-finite angle, or an image that is null,
+// has no pixels, or whose header does not describe its buffer (a bpp other than 8, 16, 24 or 32,
+// a stride shorter than a row, or a size other than stride * height): nothing changes and
+// `matrix` is not written.
 TFX_API CxImage* hueAdjustment(CxImage* image, float angle);
 
 // One pixel of hueAdjustment at `angle` (the matrix calculateHueMartrix would write), alpha

@@ -4,7 +4,9 @@
 // The maps are expensive to build, so the library keeps the most recent ones process-wide, keyed
 // by strength and frame size, and reuses them while those stay the same. The cache is
 // thread-safe: filter objects with different settings may run on different threads at once.
-// A null image, an image without pixels, or a strength of exactly 0 leave everything untouched.
+// A strength of exactly 0 leaves everything untouched, and so does an image that is null, has no
+// pixels, whose header does not describe its buffer (a bpp other than 8, 16, 24 or 32, a stride
+// shorter than a row, or a size other than stride * height), or whose pixel count exceeds INT_MAX.
 #pragma once
 
 #include "tessarofx/CxImage.h"

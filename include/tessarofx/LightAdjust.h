@@ -10,9 +10,11 @@
 // and white-level operations weight by M, the shadow and black-level operations by 1 - M.
 //
 // The image functions change blue, green and red in place, keep alpha, and return the image they
-// were given. A null image, or a strength of exactly 0, leaves everything untouched. Strengths
-// are not range-checked. Every image format is accepted; 32-bit BGRA and RGBA are rewritten row
-// by row, giving the same bytes as the per-pixel forms.
+// were given. A strength of exactly 0 leaves everything untouched, and so does an image that is
+// null, has no pixels, or whose header does not describe its buffer: a bpp other than 8, 16, 24
+// or 32, a stride shorter than a row, or a size other than stride * height (as when that product
+// wrapped 32 bits). Strengths are not range-checked. Every image format is accepted; 32-bit BGRA
+// and RGBA are rewritten row by row, giving the same bytes as the per-pixel forms.
 #pragma once
 
 #include "tessarofx/CxImage.h"

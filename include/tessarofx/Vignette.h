@@ -3,9 +3,11 @@
 //
 // A mask of one float per pixel (1 inside the ellipse, 0 beyond its feathered edge) drives a
 // per-pixel blend between the two gains. The image function keeps alpha and returns the image it
-// was given; a null image, an image without pixels, or amount and exposure both 0 leave
-// everything untouched. Every format is accepted; 32-bit BGRA takes a row path that gives the
-// same bytes as vignettePixel through the accessors.
+// was given; amount and exposure both 0 leave everything untouched, and so does an image that is
+// null, has no pixels, or whose header does not describe its buffer (a bpp other than 8, 16, 24
+// or 32, a stride shorter than a row, or a size other than stride * height). Every format is
+// accepted; 32-bit BGRA takes a row path that gives the same bytes as vignettePixel through the
+// accessors.
 #pragma once
 
 #include "tessarofx/CxImage.h"

@@ -3,9 +3,11 @@
 // image and derives channel gains from it.
 //
 // The image functions change blue, green and red in place, keep alpha, and return the image they
-// were given. A null image, an image without pixels, or a neutral strength leaves everything
-// untouched. 32-bit BGRA and RGBA images take a direct row loop that gives the same bytes as the
-// per-pixel accessors, which every other format goes through.
+// were given. A neutral strength leaves everything untouched, and so does an image that is null,
+// has no pixels, or whose header does not describe its buffer: a bpp other than 8, 16, 24 or 32,
+// a stride shorter than a row, or a size other than stride * height (as when that product
+// wrapped 32 bits). 32-bit BGRA and RGBA images take a direct row loop that gives the same bytes as
+// the per-pixel accessors, which every other format goes through.
 #pragma once
 
 #include <cstdint>

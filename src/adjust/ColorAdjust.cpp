@@ -93,7 +93,7 @@ void ContrastTable(float c, uint8_t table[256]) {
 }  // namespace
 
 CxImage* ExposureAdjust(CxImage* image, float e, const ColorAdjustRows& rows) {
-  if (!image || e == 0.0f) return image;
+  if (!IsSoundImage(image) || e == 0.0f) return image;
   uint8_t table[256];
   ExposureTable(e, table);
   ApplyTable(image, table, rows);
@@ -101,7 +101,7 @@ CxImage* ExposureAdjust(CxImage* image, float e, const ColorAdjustRows& rows) {
 }
 
 CxImage* BrightnessAdjust(CxImage* image, float b, const ColorAdjustRows& rows) {
-  if (!image || b == 0.0f || !image->GetBits()) return image;
+  if (!IsSoundImage(image) || b == 0.0f) return image;
   uint8_t table[256];
   BrightnessTable(b, table);
 
@@ -124,7 +124,7 @@ CxImage* BrightnessAdjust(CxImage* image, float b, const ColorAdjustRows& rows) 
 }
 
 CxImage* ContrastAdjust(CxImage* image, float c, const ColorAdjustRows& rows) {
-  if (!image || c == 0.0f) return image;
+  if (!IsSoundImage(image) || c == 0.0f) return image;
   uint8_t table[256];
   ContrastTable(c, table);
   ApplyTable(image, table, rows);
@@ -132,7 +132,7 @@ CxImage* ContrastAdjust(CxImage* image, float c, const ColorAdjustRows& rows) {
 }
 
 CxImage* ToneAdjust(CxImage* image, float e, float b, float c, const ColorAdjustRows& rows) {
-  if (!image) return image;
+  if (!IsSoundImage(image)) return image;
   // Brightness walks width * height pixels whatever the stride, so only unpadded rows let the
   // three curves act as one; elsewhere they run one after the other.
   if (!HasPackedColour(*image) || image->GetEffWidth() != image->GetWidth() * 4) {
@@ -154,7 +154,7 @@ CxImage* ToneAdjust(CxImage* image, float e, float b, float c, const ColorAdjust
 }
 
 CxImage* VibranceAdjust(CxImage* image, float v, const ColorAdjustRows& rows) {
-  if (!image || v == 0.0f) return image;
+  if (!IsSoundImage(image) || v == 0.0f) return image;
   const float strength = VibranceStrength(v);
   if (HasPackedColour(*image)) {
     ForEachRow(image,
@@ -166,7 +166,7 @@ CxImage* VibranceAdjust(CxImage* image, float v, const ColorAdjustRows& rows) {
 }
 
 CxImage* SaturationAdjust(CxImage* image, float s, const ColorAdjustRows& rows) {
-  if (!image || s == 0.0f) return image;
+  if (!IsSoundImage(image) || s == 0.0f) return image;
   // sigma in float.
   const float sigma = s / 100.0f;
   if (HasPackedColour(*image)) {

@@ -19,6 +19,8 @@
 #include <cstring>
 #include <memory>
 
+#include "image/ImageLayout.h"
+
 namespace tfx {
 namespace {
 
@@ -374,7 +376,7 @@ bool AdjustPixel(uint8_t& red, uint8_t& green, uint8_t& blue, const Tables& t) {
 }  // namespace tfx
 
 CxImage* hslAdjustment(CxImage* image, const HSLBands& bands) {
-  if (!image || !image->GetBits()) return image;
+  if (!tfx::IsSoundImage(image)) return image;
   const tfx::Tables& t = tfx::TablesFor(bands);
   if (!t.active) return image;
 

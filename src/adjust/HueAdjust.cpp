@@ -16,6 +16,8 @@
 #include <cstring>
 #include <mutex>
 
+#include "image/ImageLayout.h"
+
 #endif  // TFX_ADJUST_HUEADJUST_SHARED
 
 #undef HWY_TARGET_INCLUDE
@@ -160,7 +162,7 @@ void calculateHueMartrix(float angle) {
 }
 
 CxImage* hueAdjustment(CxImage* image, float angle) {
-  if (!image || angle == 0.0f || !std::isfinite(angle) || !image->GetBits()) return image;
+  if (!tfx::IsSoundImage(image) || angle == 0.0f || !std::isfinite(angle)) return image;
   float m[9];
   tfx::HueMatrix(angle, m);
   tfx::Publish(m);

@@ -5,6 +5,7 @@
 #include <cstddef>
 #include <cstdint>
 
+#include "image/ImageLayout.h"
 #include "tessarofx/CxImage.h"
 
 namespace tfx {
@@ -17,7 +18,7 @@ inline bool HasPackedColour(const CxImage& image) {
 }
 
 // Calls row(pixels, count) over the image's 4-byte pixels: once for an unpadded image, else
-// once per row, so padding is never touched.
+// once per row, so padding is never touched. The image must be sound (IsSoundImage).
 template <class RowFn>
 void ForEachRow(CxImage* image, RowFn row) {
   uint8_t* bits = image->GetBits();

@@ -22,6 +22,7 @@
 #include <utility>
 
 #include "adjust/LensMaps.h"
+#include "image/ImageLayout.h"
 
 namespace tfx {
 namespace {
@@ -225,9 +226,9 @@ LensMapsRef Lookup(MapCache& cache, float ratio, int width, int height, Builder 
   return built;  // `evicted` is freed here, outside the lock, unless someone still reads it
 }
 
+// Sound, and small enough for a map of int-indexed points.
 bool HasPixels(const CxImage* img) {
-  return img && img->GetBits() && img->GetWidth() > 0 && img->GetHeight() > 0 &&
-         img->GetWidth() <= INT_MAX / img->GetHeight();
+  return IsSoundImage(img) && img->GetWidth() <= INT_MAX / img->GetHeight();
 }
 
 // The byte-offset walk; see distortFilter in the header. A source outside the buffer leaves the
@@ -299,8 +300,7 @@ bool FringeFrom(const CxImage& source, CxImage* target, float f) {
   const LensPoint* blue = maps->plane[0].get();
   const LensPoint* green = maps->plane[1].get();
   const LensPoint* red = maps->plane[2].get();
-  if (target->GetBpp() != 32 || target->getFormat() != IPF_BGRA ||
-      target->GetEffWidth() / 4 < target->GetWidth()) {
+  if (target->GetBpp() != 32 || target->getFormat() != IPF_BGRA) {
     for (int y = 0, i = 0; y < height; ++y) {
       for (int x = 0; x < width; ++x, ++i) {
         // Coordinates that wrapped negative (frames over 32767 pixels) are out of range, so

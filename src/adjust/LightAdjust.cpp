@@ -159,7 +159,7 @@ bool FoldLightAdjust(float h, float s, float w, float k0, uint8_t* table) {
 }
 
 CxImage* LightAdjust(CxImage* image, float h, float s, float w, float k0) {
-  if (!image || !image->GetBits()) return image;
+  if (!IsSoundImage(image)) return image;
   const std::vector<Step> steps = Steps(h, s, w, k0);
   if (steps.empty()) return image;
   // Formats read through the accessors may lose bits on every write (16-bit pixels), so only
@@ -178,22 +178,22 @@ CxImage* LightAdjust(CxImage* image, float h, float s, float w, float k0) {
 }  // namespace tfx
 
 CxImage* hdrHighlight(CxImage* image, float h) {
-  if (!image || h == 0.0f || !image->GetBits()) return image;
+  if (!tfx::IsSoundImage(image) || h == 0.0f) return image;
   return tfx::ApplyStep(image, {tfx::BuildTable<tfx::Op::kHighlight>, tfx::HighlightFactor(h)});
 }
 
 CxImage* hdrShadow(CxImage* image, float s) {
-  if (!image || s == 0.0f || !image->GetBits()) return image;
+  if (!tfx::IsSoundImage(image) || s == 0.0f) return image;
   return tfx::ApplyStep(image, {tfx::BuildTable<tfx::Op::kShadow>, tfx::ShadowFactor(s)});
 }
 
 CxImage* hdrWhiteLevel(CxImage* image, float w) {
-  if (!image || w == 0.0f || !image->GetBits()) return image;
+  if (!tfx::IsSoundImage(image) || w == 0.0f) return image;
   return tfx::ApplyStep(image, {tfx::BuildTable<tfx::Op::kWhiteLevel>, tfx::WhiteLevelFactor(w)});
 }
 
 CxImage* hdrBlackLevel(CxImage* image, float k0) {
-  if (!image || k0 == 0.0f || !image->GetBits()) return image;
+  if (!tfx::IsSoundImage(image) || k0 == 0.0f) return image;
   return tfx::ApplyStep(image, {tfx::BuildTable<tfx::Op::kBlackLevel>, tfx::BlackLevelFactor(k0)});
 }
 

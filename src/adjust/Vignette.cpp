@@ -16,6 +16,7 @@
 #include <vector>
 
 #include "adjust/VignetteRows.h"
+#include "image/ImageLayout.h"
 
 namespace tfx {
 namespace {
@@ -254,8 +255,7 @@ void VignetteRow(uint8_t* bgra, const float* mask, size_t count, const VignetteB
 
 CxImage* vignetteAdjustFilter(CxImage* img, float amount, float feather, float highlights,
                               float size, float roundness, float exposure) {
-  if (!img || !img->GetBits() || img->GetWidth() == 0 || img->GetHeight() == 0 ||
-      img->GetWidth() > INT_MAX || img->GetHeight() > INT_MAX) {
+  if (!tfx::IsSoundImage(img) || img->GetWidth() > INT_MAX || img->GetHeight() > INT_MAX) {
     return img;
   }
   if (amount == 0.0f && exposure == 0.0f) return img;
@@ -274,8 +274,7 @@ CxImage* vignetteAdjustFilter(CxImage* img, float amount, float feather, float h
 
   const int cy = height >> 1;
   const size_t qw = size_t(width >> 1) + 1;
-  const bool packed = img->GetBpp() == 32 && img->getFormat() == IPF_BGRA &&
-                      img->GetEffWidth() / 4 >= img->GetWidth();
+  const bool packed = img->GetBpp() == 32 && img->getFormat() == IPF_BGRA;
   for (int y = 0; y < height; ++y) {
     tfx::MirrorRow(quadrant.get() + size_t(y < cy ? cy - y : y - cy) * qw, width, row.get());
     if (packed) {

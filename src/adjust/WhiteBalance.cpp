@@ -258,7 +258,7 @@ int calThreshold(int* histogram, int width, int height, float ratio) {
 }
 
 CxImage* whiteBalanceAdjustment(CxImage* image, float v) {
-  if (!image || v == 0.0f || !image->GetBits()) return image;
+  if (!tfx::IsSoundImage(image) || v == 0.0f) return image;
   const float ratio = v / 500.0f;
 
   SumHistogram hist;
@@ -333,7 +333,7 @@ tagRGBQUAD mixColorAndTmpColor(tagRGBQUAD c, tagRGBQUAD t, float w) {
 }
 
 CxImage* temperatureAdjustment(CxImage* image, long t) {
-  if (!image || t == 11500 || !image->GetBits()) return image;
+  if (!tfx::IsSoundImage(image) || t == 11500) return image;
   const tfx::TemperatureBlend blend = tfx::DeriveTemperature(t);
   const float tR = blend.red, tG = blend.green, tB = blend.blue, w = blend.w;
 
@@ -399,7 +399,7 @@ tagRGBQUAD calNewTintPixel(tagRGBQUAD c, int kr, int kg, int kb) {
 }
 
 CxImage* tintAdjustment(CxImage* image, float t) {
-  if (!image || t == 0.0f || !image->GetBits()) return image;
+  if (!tfx::IsSoundImage(image) || t == 0.0f) return image;
   // t * 100 in float; |k| <= 2^23, so Y * k stays within 32 bits.
   const int k = tfx::TintFactor(t);
   Packing pk;

@@ -7,7 +7,13 @@
 #include <memory>
 #include <vector>
 
+#include "tessarofx/ColorAdjust.h"
 #include "tessarofx/CxImage.h"
+#include "tessarofx/HSLAdjust.h"
+#include "tessarofx/HueAdjust.h"
+#include "tessarofx/LensAdjust.h"
+#include "tessarofx/LightAdjust.h"
+#include "tessarofx/Vignette.h"
 #include "tessarofx/WhiteBalance.h"
 
 namespace {
@@ -102,6 +108,56 @@ TEST(CxImageWrapping, NeverGrowsPastTheCallersBuffer) {
   EXPECT_FALSE(shortRows.SplitRGBA(&r, &g, &b, nullptr));
   EXPECT_FALSE(shortRows.SplitHSLA(&r, &g, &b, nullptr));
   EXPECT_EQ(r.GetWidth(), 4u);
+}
+
+TEST(AdjustFunctions, LeaveInconsistentHeadersUntouched) {
+  const struct {
+    const char* name;
+    unsigned width, height, bpp, effWidth;
+    _ImagePixelFormat format;
+  } headers[] = {
+      {"32-bit rows longer than the stride", 8, 4, 32, 16, IPF_BGRA},
+      {"24-bit rows longer than the stride", 8, 4, 24, 16, IPF_BGR},
+      {"size wrapped to 128 bytes", 16, (1u << 26) + 2, 32, 64, IPF_BGRA},
+      {"5-byte pixels", 4, 4, 40, 20, IPF_BGRA},
+  };
+  HSLBands bands{};
+  bands.band[kHSLRed].hue = 50.0f;
+  const struct {
+    const char* name;
+    CxImage* (*run)(CxImage*);
+  } functions[] = {
+      {"exposure", [](CxImage* i) { return exposureAdjustment(i, 50.0f); }},
+      {"brightness", [](CxImage* i) { return brightnessAdjustment(i, 50.0f); }},
+      {"contrast", [](CxImage* i) { return contrastAdjustment(i, 50.0f); }},
+      {"vibrance", [](CxImage* i) { return vibranceAdjustment(i, 50.0f); }},
+      {"saturation", [](CxImage* i) { return saturationAdjustment(i, 50.0f); }},
+      {"highlight", [](CxImage* i) { return hdrHighlight(i, 50.0f); }},
+      {"shadow", [](CxImage* i) { return hdrShadow(i, 50.0f); }},
+      {"white level", [](CxImage* i) { return hdrWhiteLevel(i, 50.0f); }},
+      {"black level", [](CxImage* i) { return hdrBlackLevel(i, 50.0f); }},
+      {"balance", [](CxImage* i) { return whiteBalanceAdjustment(i, 50.0f); }},
+      {"temperature", [](CxImage* i) { return temperatureAdjustment(i, 5000); }},
+      {"tint", [](CxImage* i) { return tintAdjustment(i, 50.0f); }},
+      {"vignette", [](CxImage* i) { return vignetteAdjustFilter(i, -50, 50, 50, 20, 0, 30); }},
+      {"hue", [](CxImage* i) { return hueAdjustment(i, 90.0f); }},
+      {"distortion", [](CxImage* i) { return distortFilter(i, 30.0f); }},
+      {"fringing", [](CxImage* i) { return fringingFilter(i, 30.0f); }},
+  };
+  for (const auto& h : headers) {
+    std::vector<uint8_t> buffer = Patterned(512);
+    const std::vector<uint8_t> original = buffer;
+    uint8_t* bits = buffer.data();
+    CxImage image(&bits, h.width, h.height, h.bpp, h.effWidth, h.format);
+    for (const auto& f : functions) {
+      SCOPED_TRACE(testing::Message() << f.name << ", " << h.name);
+      EXPECT_EQ(f.run(&image), &image);
+      ASSERT_EQ(buffer, original);
+    }
+    SCOPED_TRACE(testing::Message() << "hsl, " << h.name);
+    EXPECT_EQ(hslAdjustment(&image, bands), &image);
+    ASSERT_EQ(buffer, original);
+  }
 }
 
 }  // namespace
