@@ -41,7 +41,8 @@ TFX_API tagRGBQUAD calPowColor(tagRGBQUAD c, float gain);
 
 // Contrast on one pixel with the limits contrastAdjustment derives. lo < 1 compresses: each
 // channel becomes channel * d / 255 - lo. Otherwise it stretches: channels up to lo become 0,
-// above hi 255, between them (channel - lo) * 255 / d. Integer division; d must be positive.
+// above hi 255, between them (channel - lo) * 255 / d. Exact integer division, limited to 0..255,
+// for any int arguments; d = 0 stretches everything above lo to 255.
 TFX_API tagRGBQUAD calContrastColor(tagRGBQUAD c, int lo, int hi, int d);
 
 // (min + max) / 2 of the three colour channels, rounded down.

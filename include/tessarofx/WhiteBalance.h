@@ -161,12 +161,15 @@ class TFX_API AutoWhiteBalance {
   // width * 4.
   bool BGR2YCbCr(const uint8_t* bgra, int width, int height, int stride);
 
-  // Mean Y, Cb and Cr of the block (its x, y, width and height) in the converted planes.
+  // Mean Y, Cb and Cr of the block (its x, y, width and height) in the converted planes. A null
+  // block, or one without pixels or reaching outside the converted image, is left unchanged.
   void CalcMean(WhitePointinfo* block) const;
-  // Average absolute deviation of Cb and Cr from the block's mean Cb and Cr.
+  // Average absolute deviation of Cb and Cr from the block's mean Cb and Cr; refuses the blocks
+  // CalcMean refuses.
   void CalcAVD(WhitePointinfo* block) const;
   // Measures the block at (x, y), kBlockSize square and clipped to the image, and decides
-  // whether it is a candidate. `bgra` is the image last passed to BGR2YCbCr.
+  // whether it is a candidate. `bgra` is the image last passed to BGR2YCbCr. A null image, a
+  // position outside the image or a stride below width * 4 give an all-zero block.
   WhitePointinfo FindWhitePointBlock(const uint8_t* bgra, int stride, int x, int y) const;
   // Measures every block of the image last passed to BGR2YCbCr (`bgra`, `stride` as given
   // there), then sets the white point to the pixel-weighted mean colour of the brightest
@@ -182,7 +185,8 @@ class TFX_API AutoWhiteBalance {
   // Takes `white` as the white point and derives the gains from it.
   void SetWhitePoint(const BGRAColor& white);
   // Takes the mean colour of the (2 radius + 1)-pixel square around (x, y), clipped to the
-  // image, as the white point. False when the image is null or (x, y) lies outside it.
+  // image, as the white point; any radius works, a negative one as 0. False when the image is
+  // null, (x, y) lies outside it or the stride is below width * 4.
   bool SetWhitePointPos(const uint8_t* bgra, int width, int height, int stride, int x, int y,
                         int radius = 2);
 

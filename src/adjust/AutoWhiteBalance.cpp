@@ -28,6 +28,13 @@ uint8_t RoundToByte(float v) {
   return static_cast<uint8_t>(v >= 255.0f ? 255 : v <= 0.0f ? 0 : static_cast<int>(v + 0.5f));
 }
 
+// A caller's block lies inside the converted image (width x height) and holds pixels; in 64 bits,
+// as x + width may pass INT_MAX.
+bool InsideImage(const WhitePointinfo* block, int width, int height) {
+  return block && block->x >= 0 && block->y >= 0 && block->width > 0 && block->height > 0 &&
+         int64_t{block->x} + block->width <= width && int64_t{block->y} + block->height <= height;
+}
+
 // Vectors of the library's own types only: std:: containers of built-in types would be
 // instantiated with default visibility and leak out of the plug-in.
 struct Weighted {
@@ -115,6 +122,7 @@ bool AutoWhiteBalance::BGR2YCbCr(const uint8_t* bgra, int width, int height, int
 }
 
 void AutoWhiteBalance::CalcMean(WhitePointinfo* block) const {
+  if (!InsideImage(block, width_, height_)) return;
   int64_t y = 0, cb = 0, cr = 0;
   for (int row = block->y; row < block->y + block->height; ++row) {
     const size_t start = static_cast<size_t>(row) * static_cast<size_t>(width_) + block->x;
@@ -131,6 +139,7 @@ void AutoWhiteBalance::CalcMean(WhitePointinfo* block) const {
 }
 
 void AutoWhiteBalance::CalcAVD(WhitePointinfo* block) const {
+  if (!InsideImage(block, width_, height_)) return;
   double cb = 0, cr = 0;
   for (int row = block->y; row < block->y + block->height; ++row) {
     const size_t start = static_cast<size_t>(row) * static_cast<size_t>(width_) + block->x;
@@ -147,7 +156,7 @@ void AutoWhiteBalance::CalcAVD(WhitePointinfo* block) const {
 WhitePointinfo AutoWhiteBalance::FindWhitePointBlock(const uint8_t* bgra, int stride, int x,
                                                      int y) const {
   WhitePointinfo block{};
-  if (!bgra || x < 0 || y < 0 || x >= width_ || y >= height_) return block;
+  if (!bgra || x < 0 || y < 0 || x >= width_ || y >= height_ || stride / 4 < width_) return block;
   block.x = x;
   block.y = y;
   block.width = std::min(kBlockSize, width_ - x);
@@ -257,13 +266,14 @@ void AutoWhiteBalance::SetWhitePoint(const BGRAColor& white) {
 bool AutoWhiteBalance::SetWhitePointPos(const uint8_t* bgra, int width, int height, int stride,
                                         int x, int y, int radius) {
   if (!bgra || x < 0 || y < 0 || x >= width || y >= height || stride / 4 < width) return false;
-  radius = std::max(radius, 0);
-  const int x0 = std::max(x - radius, 0), x1 = std::min(x + radius, width - 1);
-  const int y0 = std::max(y - radius, 0), y1 = std::min(y + radius, height - 1);
+  // In 64 bits: x + radius and the pixel count of a large square pass INT_MAX.
+  const int64_t reach = std::max(radius, 0);
+  const int64_t x0 = std::max<int64_t>(x - reach, 0), x1 = std::min<int64_t>(x + reach, width - 1);
+  const int64_t y0 = std::max<int64_t>(y - reach, 0), y1 = std::min<int64_t>(y + reach, height - 1);
   int64_t b = 0, g = 0, r = 0;
-  for (int row = y0; row <= y1; ++row) {
+  for (int64_t row = y0; row <= y1; ++row) {
     const uint8_t* p = bgra + static_cast<size_t>(row) * static_cast<size_t>(stride) + 4 * x0;
-    for (int col = x0; col <= x1; ++col, p += 4) {
+    for (int64_t col = x0; col <= x1; ++col, p += 4) {
       b += p[0];
       g += p[1];
       r += p[2];

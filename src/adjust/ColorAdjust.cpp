@@ -26,11 +26,15 @@ uint8_t ScaleChannel(int channel, float gain) {
   return FloatToByte(static_cast<float>(channel) * gain);
 }
 
+uint8_t ClampWide(int64_t v) { return static_cast<uint8_t>(v < 0 ? 0 : v > 255 ? 255 : v); }
+
+// In 64 bits, so that limits from any caller give the exact quotient rather than overflowing; a
+// d of 0 is the steepest ramp there is, which leaves nothing between lo and 255.
 uint8_t ContrastChannel(int channel, int lo, int hi, int d) {
-  if (lo < 1) return ClampToByte(channel * d / 255 - lo);
+  if (lo < 1) return ClampWide(int64_t{channel} * d / 255 - lo);
   if (channel <= lo) return 0;
-  if (channel > hi) return 255;
-  return ClampToByte((channel - lo) * 255 / d);
+  if (channel > hi || d == 0) return 255;
+  return ClampWide((int64_t{channel} - lo) * 255 / d);
 }
 
 // (channel * (k + 256) - luma * k) >> 8 in wrapping 32-bit arithmetic, so that absurd strengths

@@ -77,9 +77,10 @@ void ApplyTables(CxImage* image, const Packing& pk, const uint8_t red[256],
 // ---- automatic balance ---------------------------------------------------------------------
 
 // Per sum of blue + green + red: how many pixels have it and their channel totals, so that the
-// totals above any threshold are suffix sums and the image is read once.
+// totals above any threshold are suffix sums and the image is read once. 64-bit counts: a frame of
+// 8-bit pixels may hold more than INT_MAX of one sum.
 struct SumHistogram {
-  int count[768] = {};
+  int64_t count[768] = {};
   int64_t red[768] = {};
   int64_t green[768] = {};
   int64_t blue[768] = {};
@@ -92,6 +93,18 @@ struct SumHistogram {
     blue[s] += b;
   }
 };
+
+// calThreshold over counts of either width.
+template <class Count>
+int Threshold(const Count* histogram, float width, float height, float ratio) {
+  const float limit = ratio * width * height;
+  int64_t running = 0;
+  for (int i = 767; i >= 0; --i) {
+    running += histogram[i];
+    if (static_cast<float>(running) > limit) return i;
+  }
+  return 0;
+}
 
 void BrightestAverageTable(int64_t sum, int64_t count, uint8_t table[256]) {
   // 64-bit totals: a frame of 2^23 white pixels already overflows 32 bits.
@@ -248,13 +261,7 @@ bool AdjustWhiteBalance::Process(cv::Mat& src, cv::Mat& dst, ColorGain gain, flo
 
 int calThreshold(int* histogram, int width, int height, float ratio) {
   if (!histogram) return 0;
-  const float limit = ratio * static_cast<float>(width) * static_cast<float>(height);
-  int64_t running = 0;
-  for (int i = 767; i >= 0; --i) {
-    running += histogram[i];
-    if (static_cast<float>(running) > limit) return i;
-  }
-  return 0;
+  return Threshold(histogram, static_cast<float>(width), static_cast<float>(height), ratio);
 }
 
 CxImage* whiteBalanceAdjustment(CxImage* image, float v) {
@@ -272,8 +279,8 @@ CxImage* whiteBalanceAdjustment(CxImage* image, float v) {
     ForEachColour(*image, [&](tagRGBQUAD c) { hist.Add(c.rgbRed, c.rgbGreen, c.rgbBlue); });
   }
 
-  const int threshold = calThreshold(hist.count, static_cast<int>(image->GetWidth()),
-                                     static_cast<int>(image->GetHeight()), ratio);
+  const int threshold = Threshold(hist.count, static_cast<float>(image->GetWidth()),
+                                  static_cast<float>(image->GetHeight()), ratio);
   int64_t count = 0, red = 0, green = 0, blue = 0;
   for (int s = threshold + 1; s < 768; ++s) {
     count += hist.count[s];

@@ -160,4 +160,64 @@ TEST(AdjustFunctions, LeaveInconsistentHeadersUntouched) {
   }
 }
 
+TEST(CalContrastColor, GivesTheExactLimitedResultForAnyLimits) {
+  const struct {
+    int lo, hi, d, channel, expected;
+  } cases[] = {
+      {120, 127, 15, 127, 119},           // the steepest ramp contrastAdjustment derives
+      {INT_MIN, INT_MAX, 0, 100, 255},    // 0 - INT_MIN
+      {-1, 0, INT_MAX, 255, 255},         // 255 * INT_MAX / 255 + 1
+      {0, 0, INT_MIN, 200, 0},            // 200 * INT_MIN / 255
+      {1, INT_MAX, 0, 100, 255},          // no ramp at all
+      {INT_MIN + 1, 0, INT_MAX, 0, 255},  // 0 - (INT_MIN + 1)
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(testing::Message() << "lo " << c.lo << ", hi " << c.hi << ", d " << c.d);
+    const uint8_t v = static_cast<uint8_t>(c.channel);
+    const tagRGBQUAD out = calContrastColor(tagRGBQUAD{v, v, v, 9}, c.lo, c.hi, c.d);
+    EXPECT_EQ(out.rgbBlue, c.expected);
+    EXPECT_EQ(out.rgbRed, c.expected);
+    EXPECT_EQ(out.rgbReserved, 9);
+  }
+}
+
+TEST(AutoWhiteBalance, TakesExtremePositionsAndBlocksWithoutStraying) {
+  std::vector<uint8_t> image(4 * 4 * 4);
+  for (size_t i = 0; i < image.size(); i += 4) {
+    image[i] = 10;
+    image[i + 1] = 20;
+    image[i + 2] = 30;
+  }
+  AutoWhiteBalance awb;
+  for (const int at : {0, 3}) {
+    SCOPED_TRACE(at);
+    ASSERT_TRUE(awb.SetWhitePointPos(image.data(), 4, 4, 16, at, at, INT_MAX));
+    EXPECT_EQ(awb.WhitePoint().b, 10);
+    EXPECT_EQ(awb.WhitePoint().g, 20);
+    EXPECT_EQ(awb.WhitePoint().r, 30);
+  }
+  EXPECT_FALSE(awb.SetWhitePointPos(image.data(), 4, 4, 12, 0, 0, 1));
+
+  // Blocks reaching outside the converted image are left as they are.
+  ASSERT_TRUE(awb.BGR2YCbCr(image.data(), 4, 4, 16));
+  const struct {
+    int x, y, width, height;
+  } outside[] = {{-4, 0, 4, 4}, {2, 0, 4, 4}, {0, 1, 4, INT_MAX}, {0, 0, 0, 0}};
+  for (const auto& o : outside) {
+    SCOPED_TRACE(testing::Message() << o.x << "," << o.y << " " << o.width << "x" << o.height);
+    WhitePointinfo block{};
+    block.x = o.x;
+    block.y = o.y;
+    block.width = o.width;
+    block.height = o.height;
+    block.meanY = block.avdCb = -1.0f;
+    awb.CalcMean(&block);
+    awb.CalcAVD(&block);
+    EXPECT_EQ(block.meanY, -1.0f);
+    EXPECT_EQ(block.avdCb, -1.0f);
+  }
+  awb.CalcMean(nullptr);
+  EXPECT_EQ(awb.FindWhitePointBlock(image.data(), 12, 0, 0).width, 0);
+}
+
 }  // namespace
