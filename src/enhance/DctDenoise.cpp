@@ -50,8 +50,14 @@ bool Denoisable(const CxImage* image) {
   const uint32_t bpp = image->GetBpp();
   if (width == 0 || height == 0 || (bpp != 24 && bpp != 32)) return false;
   if (width > (UINT32_MAX - 31) / 32) return false;
-  return image->GetEffWidth() >= width * (bpp / 8) &&
-         uint64_t{image->GetEffWidth()} * height == image->GetSize();
+  if (image->GetEffWidth() < width * (bpp / 8) ||
+      uint64_t{image->GetEffWidth()} * height != image->GetSize()) {
+    return false;
+  }
+  // Recombining re-creates the image with rows padded to 4 bytes; a wrapped buffer too small for
+  // those (24-bit rows of width * 3 bytes) is refused here, before anything changes.
+  const uint64_t padded = ((uint64_t{bpp} * width + 31) >> 3) & ~uint64_t{3};
+  return padded * height <= image->GetSize();
 }
 
 // Splits `image` into three planes (and alpha), denoises the three, and recombines them.

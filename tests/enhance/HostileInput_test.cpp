@@ -11,6 +11,7 @@
 #include "support/ImageBuilders.h"
 #include "tessarofx/Blur.h"
 #include "tessarofx/Compositing.h"
+#include "tessarofx/CxImage.h"
 #include "tessarofx/Denoise.h"
 
 namespace {
@@ -68,6 +69,21 @@ TEST(MergeImage, LeavesImagesAboveIntMaxBytesAlone) {
     EXPECT_TRUE(mergeImage(dst.data(), src.data(), c.dstWidth, c.dstHeight, c.srcWidth, c.srcHeight,
                            c.srcStride, 0, 0, -1, -1, 0, 0, 100, 100));
     EXPECT_EQ(dst, before);
+  }
+}
+
+// 24-bit rows of width * 3 bytes, not padded to 4: recombining the planes would re-create the
+// image with padded rows that the wrapped buffer cannot hold.
+TEST(DeNoise, LeavesAWrappedImageItsRowsCannotBePaddedIn) {
+  std::vector<uint8_t> pixels = NoiseBytes(15 * 12, 3);
+  const std::vector<uint8_t> before = pixels;
+  uint8_t* bits = pixels.data();
+  CxImage image(&bits, 5, 12, 24, 15, IPF_BGR);
+  for (auto* denoise : {deNoiseRGB, deNoiseLumiance}) {
+    EXPECT_EQ(denoise(&image, 80.0f), &image);
+    EXPECT_EQ(image.GetWidth(), 5u);
+    EXPECT_EQ(image.GetEffWidth(), 15u);
+    EXPECT_EQ(pixels, before);
   }
 }
 
