@@ -2,11 +2,11 @@
 #include <stdlib.h>
 
 #include <cstdio>
-#include <fstream>
 #include <string>
 #include <vector>
 
 #include "support/EffectHarness.h"
+#include "support/TempDir.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"
 
@@ -14,10 +14,10 @@ namespace {
 
 namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
+using tfx_test::CubeText;
 using tfx_test::FillRandom;
+using tfx_test::Wide;
 constexpr const wchar_t* kColorLut = L"74EB022D-1D73-4D1E-9F70-487C356D46CD";
-
-std::wstring Wide(const std::string& s) { return std::wstring(s.begin(), s.end()); }
 
 NLEComPtr<INLEProperties> PathSettings(const std::wstring& path) {
   return tfx_test::TextSettings(L"lut3dPath", path);
@@ -30,36 +30,14 @@ void SetPath(INLECGFilter* filter, const std::wstring& path) {
   filter->ParamValueChanged();
 }
 
-// A ".cube" file of `size` points per axis whose output is `scale` * input + `shift` (0..1).
-void WriteCube(const std::string& file, int size, double scale, double shift) {
-  std::ofstream out(file);
-  out << "LUT_3D_SIZE " << size << "\n";
-  char line[64];
-  for (int b = 0; b < size; ++b) {
-    for (int g = 0; g < size; ++g) {
-      for (int r = 0; r < size; ++r) {
-        const double v[3] = {double(r) / (size - 1), double(g) / (size - 1),
-                             double(b) / (size - 1)};
-        std::snprintf(line, sizeof line, "%.6f %.6f %.6f\n", v[0] * scale + shift,
-                      v[1] * scale + shift, v[2] * scale + shift);
-        out << line;
-      }
-    }
-  }
-}
-
 class ColorLut3dAdjustEffect : public ::testing::Test {
  protected:
   void SetUp() override {
-    char pattern[] = "/tmp/tfx-colorlut-XXXXXX";
-    ASSERT_NE(mkdtemp(pattern), nullptr);
-    dir_ = pattern;
-    WriteCube(Path("invert.cube"), 2, -1.0, 1.0);
-    WriteCube(Path("halve.cube"), 2, 0.5, 0.0);
+    dir_.Write("invert.cube", CubeText(2, "", -1, 1));
+    dir_.Write("halve.cube", CubeText(2, "", 0.5));
   }
-  void TearDown() override { std::system(("rm -rf '" + dir_ + "'").c_str()); }
 
-  std::string Path(const std::string& name) const { return dir_ + "/" + name; }
+  std::string Path(const std::string& name) const { return dir_.Path(name); }
 
   // One 8x2 frame of noise through the filter into a destination filled with 0xEE. Returns the
   // result code; the source goes to *in and the output to *out.
@@ -93,7 +71,7 @@ class ColorLut3dAdjustEffect : public ::testing::Test {
     return invert ? "invert" : halve ? "halve" : "other";
   }
 
-  std::string dir_;
+  tfx_test::TempDir dir_;
   unsigned salt_ = 0;
 };
 
@@ -104,7 +82,7 @@ TEST_F(ColorLut3dAdjustEffect, AppliesTheFileAndReloadsOnlyWhenThePathTextChange
   EXPECT_EQ(Applied(filter.get()), "halve");
 
   // The same text again keeps the table read before, even though the file has changed since.
-  WriteCube(Path("halve.cube"), 2, -1.0, 1.0);
+  dir_.Write("halve.cube", CubeText(2, "", -1, 1));
   SetPath(filter.get(), Wide(Path("halve.cube")));
   EXPECT_EQ(Applied(filter.get()), "halve");
   // Extensions count in any letter case.
@@ -116,18 +94,18 @@ TEST_F(ColorLut3dAdjustEffect, AppliesTheFileAndReloadsOnlyWhenThePathTextChange
 // The cache compares the parameter with the translated path, so a path that the host rewrites
 // is read again on every frame.
 TEST_F(ColorLut3dAdjustEffect, RereadsAPathThatTranslationRewritesOnEveryFrame) {
-  ASSERT_EQ(setenv("TFX_TEST_LUT_DIR", dir_.c_str(), 1), 0);
+  ASSERT_EQ(setenv("TFX_TEST_LUT_DIR", dir_.path.c_str(), 1), 0);
   NLEComPtr<INLECGFilter> filter =
       CreateEffect(kColorLut, PathSettings(L"$TFX_TEST_LUT_DIR/halve.cube"));
   EXPECT_EQ(Applied(filter.get()), "halve");
-  WriteCube(Path("halve.cube"), 2, -1.0, 1.0);
+  dir_.Write("halve.cube", CubeText(2, "", -1, 1));
   EXPECT_EQ(Applied(filter.get()), "invert");
   unsetenv("TFX_TEST_LUT_DIR");
 }
 
 TEST_F(ColorLut3dAdjustEffect, PassesFramesThroughWhenNoTableApplies) {
   std::rename(Path("halve.cube").c_str(), Path("halve.txt").c_str());
-  WriteCube(Path("big.cube"), 65, 1.0, 0.0);  // one point more than the lattice holds
+  dir_.Write("big.cube", CubeText(65));  // one point more than the lattice holds
   for (const std::string name : {"halve.txt", "missing.cube", "big.cube"}) {
     SCOPED_TRACE(name);
     NLEComPtr<INLECGFilter> filter = CreateEffect(kColorLut, PathSettings(Wide(Path(name))));

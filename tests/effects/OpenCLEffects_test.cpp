@@ -1,10 +1,8 @@
 // The OpenCL classes against their CPU twins on the same frames, and the "LUT" kernel against
 // the plain tetrahedral formula over every 8-bit colour.
 #include <gtest/gtest.h>
-#include <stdlib.h>
 
 #include <cmath>
-#include <fstream>
 #include <limits>
 #include <random>
 #include <string>
@@ -14,6 +12,7 @@
 #include "lut/CubeLutApply.h"
 #include "support/EffectHarness.h"
 #include "support/OpenCLHarness.h"
+#include "support/TempDir.h"
 #include "tessarofx/CubeLut.h"
 
 namespace {
@@ -188,21 +187,11 @@ TEST_F(OpenCLEffects, LutKernelIsTheTetrahedralFormulaToTheByte) {
 
 class OpenCLLutFiles : public OpenCLEffects {
  protected:
-  void SetUp() override {
-    OpenCLEffects::SetUp();
-    char pattern[] = "/tmp/tfx-opencl-lut-XXXXXX";
-    ASSERT_NE(mkdtemp(pattern), nullptr);
-    dir_ = pattern;
-  }
-  void TearDown() override { std::system(("rm -rf '" + dir_ + "'").c_str()); }
-
   std::wstring Write(const std::string& name, const std::string& text) {
-    std::ofstream(dir_ + "/" + name) << text;
-    const std::string path = dir_ + "/" + name;
-    return std::wstring(path.begin(), path.end());
+    return tfx_test::Wide(dir_.Write(name, text));
   }
 
-  std::string dir_;
+  tfx_test::TempDir dir_;
 };
 
 TEST_F(OpenCLLutFiles, LutMatchesTheCpuClassOnTheDemoGradeAndPassesUnreadableFilesThrough) {

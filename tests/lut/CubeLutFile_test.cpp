@@ -3,44 +3,23 @@
 #include "lut/CubeLutFile.h"
 
 #include <gtest/gtest.h>
-#include <stdlib.h>
 
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
-#include <filesystem>
 #include <fstream>
 #include <memory>
 #include <random>
 #include <string>
 #include <vector>
 
+#include "support/TempDir.h"
 #include "tessarofx/CubeLut.h"
 
 namespace {
 
-namespace fs = std::filesystem;
-
-// A fresh directory for one test's files, removed with everything in it.
-struct TempDir {
-  std::string path;
-  TempDir() {
-    std::string pattern = (fs::temp_directory_path() / "tfx-lut-XXXXXX").string();
-    if (mkdtemp(pattern.data())) path = pattern;
-  }
-  ~TempDir() {
-    std::error_code ignored;
-    if (!path.empty()) fs::remove_all(path, ignored);
-  }
-  std::string Write(const std::string& name, const std::string& bytes) const {
-    const std::string full = path + "/" + name;
-    std::ofstream(full, std::ios::binary) << bytes;
-    return full;
-  }
-};
-
-// Test paths are ASCII apart from the cases that build their wide path themselves.
-std::wstring Wide(const std::string& ascii) { return std::wstring(ascii.begin(), ascii.end()); }
+using tfx_test::TempDir;
+using tfx_test::Wide;
 
 std::string WithoutLastLine(const std::string& text) {
   return text.substr(0, text.rfind('\n', text.size() - 2) + 1);

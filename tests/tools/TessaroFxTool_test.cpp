@@ -21,11 +21,13 @@
 #include <string_view>
 #include <vector>
 
+#include "support/TempDir.h"
 #include "tessarofx/NLEOpenCL.h"
 
 namespace {
 
 namespace fs = std::filesystem;
+using tfx_test::CubeText;
 constexpr auto npos = std::string::npos;
 
 struct Outcome {
@@ -50,29 +52,22 @@ bool IsGuid(const std::string& s) {
 
 class ToolTest : public ::testing::Test {
  protected:
-  void SetUp() override {
-    char pattern[] = "/tmp/tessarofx-tool-XXXXXX";
-    ASSERT_NE(mkdtemp(pattern), nullptr);
-    dir_ = pattern;
-  }
-  void TearDown() override { fs::remove_all(dir_); }
-
   // Runs the tool in the temporary directory, so relative names land there. `args` goes through
   // the shell, and only `env` is added to an environment without the tool's own variables.
   Outcome Run(const std::string& args, const std::string& env = "") {
-    const std::string command = "cd " + dir_.string() +
+    const std::string command = "cd " + dir_.path +
                                 " && env -u TESSAROFX_PLUGIN -u TESSAROFX_LOG_LEVEL " + env +
                                 " " TFX_TOOL_PATH " " + args + " >.stdout 2>.stderr";
     const int status = std::system(command.c_str());
     // A crash is reported as 128 + signal, so it can never pass for a clean failure.
     Outcome r{WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status),
-              Slurp(dir_ / ".stdout"), Slurp(dir_ / ".stderr")};
-    fs::remove(dir_ / ".stdout");
-    fs::remove(dir_ / ".stderr");
+              Slurp(Path(".stdout")), Slurp(Path(".stderr"))};
+    fs::remove(Path(".stdout"));
+    fs::remove(Path(".stderr"));
     return r;
   }
 
-  std::string Path(const std::string& name) const { return (dir_ / name).string(); }
+  std::string Path(const std::string& name) const { return dir_.Path(name); }
 
   // Writes a small BGRA image with distinct channels and a varying alpha.
   void WriteInput(const std::string& name, int width = 6, int height = 4) {
@@ -101,18 +96,16 @@ class ToolTest : public ::testing::Test {
     EXPECT_EQ(Listing(), before) << "output or temporary file left behind";
   }
 
-  void WriteText(const std::string& name, const std::string& text) {
-    std::ofstream(Path(name), std::ios::binary) << text;
-  }
+  void WriteText(const std::string& name, const std::string& text) { dir_.Write(name, text); }
 
   std::vector<std::string> Listing() const {
     std::vector<std::string> names;
-    for (const auto& e : fs::directory_iterator(dir_)) names.push_back(e.path().filename());
+    for (const auto& e : fs::directory_iterator(dir_.path)) names.push_back(e.path().filename());
     std::sort(names.begin(), names.end());
     return names;
   }
 
-  fs::path dir_;
+  tfx_test::TempDir dir_;
 };
 
 TEST_F(ToolTest, ListShowsTheTenPublishedFiltersInIndexOrder) {
@@ -461,24 +454,6 @@ TEST_F(ToolTest, DemoWritesTheSceneEachFilterAndAContactSheet) {
   EXPECT_EQ(Slurp(Path("again/sample.png")), Slurp(Path("demo-out/sample.png")));
 }
 
-// A ".cube" table of n points per axis, red fastest, after `header` (lines ending in '\n') and
-// its own LUT_3D_SIZE line. Each point holds `rotate` ? (green, blue, red) : (red, green, blue)
-// of its input, 0..1.
-std::string CubeText(int n, const std::string& header = "", bool rotate = false) {
-  std::ostringstream out;
-  out << header << "LUT_3D_SIZE " << n << "\n";
-  for (int b = 0; b < n; ++b) {
-    for (int g = 0; g < n; ++g) {
-      for (int r = 0; r < n; ++r) {
-        const double v[3] = {r / double(n - 1), g / double(n - 1), b / double(n - 1)};
-        const int first = rotate ? 1 : 0;
-        out << v[first] << " " << v[(first + 1) % 3] << " " << v[(first + 2) % 3] << "\n";
-      }
-    }
-  }
-  return out.str();
-}
-
 // The table rows of a ".cube" file, in file order.
 std::vector<std::array<double, 3>> CubeRows(const std::string& text) {
   std::vector<std::array<double, 3>> rows;
@@ -538,7 +513,7 @@ TEST_F(ToolTest, LutInfoSaysWhereAndWhyTheReaderStopped) {
 TEST_F(ToolTest, LutConvertResamplesATableTooBigForThePlugin) {
   // A channel rotation: linear, so tetrahedral resampling must reproduce it exactly at any size,
   // and any mix-up of axes or corners shows.
-  WriteText("big.cube", CubeText(65, "# rotation\n", true));
+  WriteText("big.cube", CubeText(65, "# rotation\n", 1, 0, true));
   for (const int n : {33, 20}) {
     SCOPED_TRACE(n);
     const std::string out = "small" + std::to_string(n) + ".cube";
