@@ -13,6 +13,7 @@
 #include <string>
 #include <vector>
 
+#include "../tools/LutFiles.h"
 #include "support/TempDir.h"
 #include "tessarofx/CubeLut.h"
 
@@ -109,17 +110,35 @@ struct Mutation {
   const char* name;
   std::string bytes;
   int status;
+  int line;  // the physical line where the reader stopped, as a caller holding the stream finds it
 };
 
 void ExpectStatuses(const std::vector<Mutation>& cases, const char* file, bool dl) {
   TempDir dir;
   for (const Mutation& m : cases) {
     SCOPED_TRACE(m.name);
-    bool loaded = false;
-    const auto lut = Load(dir, file, m.bytes, &loaded);
+    const std::string path = dir.Write(file, m.bytes);
+    const auto lut = std::make_unique<CubeLut>();
+    std::ifstream in(path, std::ios::binary);
+    EXPECT_EQ(dl ? lut->load3DlFile(in) : lut->loadCubeFile(in), m.status);
     EXPECT_EQ(lut->getStatus(), m.status);
-    EXPECT_EQ(loaded, m.status == 0);
+    in.clear();
+    const auto format = dl ? tfxtool::LutFormat::k3dl : tfxtool::LutFormat::kCube;
+    EXPECT_EQ(tfxtool::LocateStop(path, format, in.tellg(), m.status).number, m.line);
     ExpectBounded(*lut);
+    // The tool's reader, which takes tables up to 256 points, follows the same rules to the same
+    // line, and names none in a file without line ends.
+    if (!dl && m.bytes.find("LUT_3D_SIZE 65") == std::string::npos) {
+      tfxtool::LutTable table;
+      const tfxtool::Status tool = tfxtool::ReadCubeTable(path, &table);
+      EXPECT_EQ(tool.ok(), m.status == 0) << tool.message();
+      if (m.status != 0) {
+        const std::string where =
+            m.line && m.status != 13 ? ", line " + std::to_string(m.line) + " (" : "cube: ";
+        EXPECT_NE(tool.message().find(where), std::string::npos) << tool.message();
+        EXPECT_NE(tool.message().find("status " + std::to_string(m.status)), std::string::npos);
+      }
+    }
     if (m.status != 0) continue;
     ExpectSample(*lut, dl ? 3 : 2, dl);
     if (!dl) {
@@ -133,42 +152,46 @@ TEST(CubeLutFile, CubeStatuses) {
   const std::string unterminated = kCube.substr(0, kCube.size() - 1);
   ExpectStatuses(
       {
-          {"valid", kCube, 0},
-          {"CR-LF", ReplaceAll(kCube, "\n", "\r\n"), 0},
-          {"CR-LF, bare CR lines", ReplaceAll(kCube, "\n", "\r\n\r\n"), 0},
-          {"CR only", ReplaceAll(kCube, "\n", "\r"), 0},
-          {"last line unterminated", unterminated, 0},
-          {"junk after the table", kCube + "junk\n\x01\xff\n", 0},
+          {"valid", kCube, 0, 14},
+          {"CR-LF", ReplaceAll(kCube, "\n", "\r\n"), 0, 14},
+          {"CR-LF, bare CR lines", ReplaceAll(kCube, "\n", "\r\n\r\n"), 0, 27},
+          {"CR only", ReplaceAll(kCube, "\n", "\r"), 0, 14},
+          {"last line unterminated", unterminated, 0, 14},
+          {"junk after the table", kCube + "junk\n\x01\xff\n", 0, 14},
           {"two titles", Replace(kCube, "TITLE \"Sample\"\n", "TITLE \"Sample\"\nTITLE \"B\"\n"),
-           20},
-          {"1-D size", Replace(kCube, "LUT_3D_SIZE 2\n", "LUT_1D_SIZE 2\nLUT_3D_SIZE 2\n"), 20},
-          {"input range", Replace(kCube, "\n\n", "\nLUT_3D_INPUT_RANGE 0 1\n\n"), 20},
-          {"repeated size", Replace(kCube, "LUT_3D_SIZE 2\n", "LUT_3D_SIZE 2\nLUT_3D_SIZE 2\n"),
-           20},
-          {"blank line of spaces", Replace(kCube, "\n\n", "\n   \n"), 20},
-          {"size 1", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE 1"), 23},
-          {"size 65", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE 65"), 23},
-          {"no size", Replace(kCube, "LUT_3D_SIZE 2\n", ""), 23},
-          {"size not a number", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE two"), 10},
-          {"size past int", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE 4294967298"), 10},
-          {"max 1 1 0", Replace(kCube, "DOMAIN_MAX 1.0 1.0 1.0", "DOMAIN_MAX 1 1 0"), 22},
-          {"max equal to min", Replace(kCube, "DOMAIN_MIN 0.0 0.0 0.0", "DOMAIN_MIN 0 1 0"), 22},
-          {"two domain values", Replace(kCube, "DOMAIN_MIN 0.0 0.0 0.0", "DOMAIN_MIN 0 0"), 10},
-          {"domain past float", Replace(kCube, "DOMAIN_MAX 1.0", "DOMAIN_MAX 1e39"), 10},
-          {"title without quote", Replace(kCube, "TITLE \"Sample\"", "TITLE Sample"), 21},
-          {"title alone", Replace(kCube, "TITLE \"Sample\"", "TITLE"), 10},
-          {"title quote alone", Replace(kCube, "TITLE \"Sample\"", "TITLE \""), 10},
-          {"truncated, terminated", truncated, 10},
-          {"truncated, unterminated", truncated.substr(0, truncated.size() - 1), 12},
-          {"number past float", truncated + "1e39 0 0\n", 24},
-          {"past float once scaled", truncated + "0 3e37 0\n", 24},
-          {"nan", truncated + "0 0 nan\n", 24},
-          {"empty", "", 10},
-          {"line of 251 then LF", std::string(251, '#') + "\n" + kCube, 0},
+           20, 3},
+          {"1-D size", Replace(kCube, "LUT_3D_SIZE 2\n", "LUT_1D_SIZE 2\nLUT_3D_SIZE 2\n"), 20, 5},
+          {"input range", Replace(kCube, "\n\n", "\nLUT_3D_INPUT_RANGE 0 1\n\n"), 20, 6},
+          {"repeated size", Replace(kCube, "LUT_3D_SIZE 2\n", "LUT_3D_SIZE 2\nLUT_3D_SIZE 2\n"), 20,
+           6},
+          {"blank line of spaces", Replace(kCube, "\n\n", "\n   \n"), 20, 6},
+          {"size 1", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE 1"), 23, 5},
+          {"size 65", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE 65"), 23, 5},
+          {"size 257", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE 257"), 23, 5},
+          {"no size", Replace(kCube, "LUT_3D_SIZE 2\n", ""), 23, 6},
+          {"size not a number", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE two"), 10, 5},
+          {"size past int", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE 4294967298"), 10, 5},
+          {"max 1 1 0", Replace(kCube, "DOMAIN_MAX 1.0 1.0 1.0", "DOMAIN_MAX 1 1 0"), 22, 7},
+          {"max 1 1 0, CR-LF",
+           ReplaceAll(Replace(kCube, "DOMAIN_MAX 1.0 1.0 1.0", "DOMAIN_MAX 1 1 0"), "\n", "\r\n"),
+           22, 7},
+          {"max equal to min", Replace(kCube, "DOMAIN_MIN 0.0 0.0 0.0", "DOMAIN_MIN 0 1 0"), 22, 7},
+          {"two domain values", Replace(kCube, "DOMAIN_MIN 0.0 0.0 0.0", "DOMAIN_MIN 0 0"), 10, 3},
+          {"domain past float", Replace(kCube, "DOMAIN_MAX 1.0", "DOMAIN_MAX 1e39"), 10, 4},
+          {"title without quote", Replace(kCube, "TITLE \"Sample\"", "TITLE Sample"), 21, 2},
+          {"title alone", Replace(kCube, "TITLE \"Sample\"", "TITLE"), 10, 2},
+          {"title quote alone", Replace(kCube, "TITLE \"Sample\"", "TITLE \""), 10, 2},
+          {"truncated, terminated", truncated, 10, 13},
+          {"truncated, unterminated", truncated.substr(0, truncated.size() - 1), 12, 13},
+          {"number past float", truncated + "1e39 0 0\n", 24, 14},
+          {"past float once scaled", truncated + "0 3e37 0\n", 24, 14},
+          {"nan", truncated + "0 0 nan\n", 24, 14},
+          {"empty", "", 10, 0},
+          {"line of 251 then LF", std::string(251, '#') + "\n" + kCube, 0, 15},
           {"line of 251 then CR-LF",
-           std::string(251, '#') + "\r\n" + ReplaceAll(kCube, "\n", "\r\n"), 0},
-          {"line of 252", std::string(252, '#') + "\n" + kCube, 13},
-          {"no terminator at all", std::string(300, ' '), 13},
+           std::string(251, '#') + "\r\n" + ReplaceAll(kCube, "\n", "\r\n"), 0, 15},
+          {"line of 252", std::string(252, '#') + "\n" + kCube, 13, 1},
+          {"no terminator at all", std::string(300, ' '), 13, 1},
       },
       "case.cube", false);
 }
@@ -179,22 +202,22 @@ TEST(CubeLutFile, DlStatuses) {
   for (int i = 1; i < 65; ++i) range65 += " " + std::to_string(i);
   ExpectStatuses(
       {
-          {"valid", kDl, 0},
-          {"CR-LF", ReplaceAll(kDl, "\n", "\r\n"), 0},
-          {"CR only", ReplaceAll(kDl, "\n", "\r"), 0},
-          {"text and keywords skipped", "# note\nsome words\n+ alone\nMesh 4 12\n" + kDl, 0},
-          {"last line unterminated", kDl.substr(0, kDl.size() - 1), 0},
-          {"range with trailing space", Replace(kDl, "0 2047 4095", "0 2047 4095 "), 10},
-          {"range with double space", Replace(kDl, "0 2047 4095", "0  2047 4095"), 10},
-          {"range of two", Replace(kDl, "0 2047 4095", "0 4095"), 24},
-          {"range of 65", Replace(kDl, "0 2047 4095", range65), 23},
-          {"blank header line", Replace(kDl, "3DMESH\n", "3DMESH\n  \n"), 10},
-          {"truncated, terminated", truncated, 10},
-          {"truncated, unterminated", truncated.substr(0, truncated.size() - 1), 12},
-          {"no range line", "3DMESH\nMesh 0 12\n", 10},
-          {"number past float", truncated + "1e39 0 0\n", 24},
-          {"empty", "", 10},
-          {"line of 252", std::string(252, 'x') + "\n" + kDl, 13},
+          {"valid", kDl, 0, 30},
+          {"CR-LF", ReplaceAll(kDl, "\n", "\r\n"), 0, 30},
+          {"CR only", ReplaceAll(kDl, "\n", "\r"), 0, 30},
+          {"text and keywords skipped", "# note\nsome words\n+ alone\nMesh 4 12\n" + kDl, 0, 34},
+          {"last line unterminated", kDl.substr(0, kDl.size() - 1), 0, 30},
+          {"range with trailing space", Replace(kDl, "0 2047 4095", "0 2047 4095 "), 10, 30},
+          {"range with double space", Replace(kDl, "0 2047 4095", "0  2047 4095"), 10, 30},
+          {"range of two", Replace(kDl, "0 2047 4095", "0 4095"), 24, 3},
+          {"range of 65", Replace(kDl, "0 2047 4095", range65), 23, 3},
+          {"blank header line", Replace(kDl, "3DMESH\n", "3DMESH\n  \n"), 10, 2},
+          {"truncated, terminated", truncated, 10, 29},
+          {"truncated, unterminated", truncated.substr(0, truncated.size() - 1), 12, 29},
+          {"no range line", "3DMESH\nMesh 0 12\n", 10, 2},
+          {"number past float", truncated + "1e39 0 0\n", 24, 30},
+          {"empty", "", 10, 0},
+          {"line of 252", std::string(252, 'x') + "\n" + kDl, 13, 1},
       },
       "case.3dl", true);
 }

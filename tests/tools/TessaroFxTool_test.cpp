@@ -478,35 +478,17 @@ TEST_F(ToolTest, LutInfoShowsSizeTitleAndDomain) {
 }
 
 // A refused file names the status, its meaning and the physical line where the plug-in's reader
-// stopped, counting the comments and blank lines it skipped.
+// stopped, counting the comments and blank lines it skipped; the variety of failures is the LUT
+// file tests' business.
 TEST_F(ToolTest, LutInfoSaysWhereAndWhyTheReaderStopped) {
-  const struct {
-    const char* name;
-    std::string text;
-    std::vector<std::string> causes;
-  } cases[] = {
-      {"big.cube",
-       CubeText(65, "# 65 points\n\n"),
+  WriteText("big.cube", CubeText(65, "# 65 points\n\n"));
+  const Outcome r = Run("lut info big.cube");
+  EXPECT_EQ(r.exitCode, 1);
+  EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
+  for (const char* cause :
        {"big.cube, line 3 (\"LUT_3D_SIZE 65\"): status 23, the size is missing or outside 2..64",
-        "tessarofx lut convert big.cube OUT.cube --size 64"}},
-      {"keyword.cube",
-       "# comment\n\n#another\nTITLE \"t\"\n\nLUT_1D_SIZE 3\n0 0 0\n",
-       {"line 6 (\"LUT_1D_SIZE 3\"): status 20, unknown or repeated keyword"}},
-      // CR-LF ends are one line end each; the header is judged at the first table row.
-      {"domain.cube",
-       "LUT_3D_SIZE 2\r\nDOMAIN_MAX 1 1 0\r\n# c\r\n\r\n0 0 0\r\n",
-       {"line 5 (\"0 0 0\"): status 22, a DOMAIN_MAX value is not above its DOMAIN_MIN"}},
-      {"short.cube", "LUT_3D_SIZE 2\n0 0 0\n\n1 0 0", {"line 4 (\"1 0 0\"): status 12"}},
-      {"range.3dl", "3DMESH\n\n0 512\n", {"line 3 (\"0 512\"): status 24"}},
-      {"grade.lut", "LUT_3D_SIZE 2\n", {"grade.lut: not a .cube or .3dl file"}},
-  };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.name);
-    WriteText(c.name, c.text);
-    const Outcome r = Run(std::string("lut info ") + c.name);
-    EXPECT_EQ(r.exitCode, 1);
-    EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
-    for (const std::string& cause : c.causes) EXPECT_NE(r.err.find(cause), npos) << r.err;
+        "tessarofx lut convert big.cube OUT.cube --size 64"}) {
+    EXPECT_NE(r.err.find(cause), npos) << r.err;
   }
 }
 
@@ -592,9 +574,8 @@ TEST_F(ToolTest, LutConvertKeepsThePluginsDomainScaling) {
 // Refusals name the cause (with the physical line for parse errors) and leave no output behind.
 TEST_F(ToolTest, LutCommandsRefuseWithoutWritingAnything) {
   WriteText("big.cube", CubeText(65));
-  WriteText("huge.cube", "LUT_3D_SIZE 257\n");
   WriteText("bad.cube", "# c\n\nLUT_3D_SIZE 70\nTITLE \"a\"\n\nTITLE \"b\"\n");
-  WriteText("cut.cube", "#c\nLUT_3D_SIZE 80\n0 0 0\n\n1 0 0\n");
+  WriteText("grade.lut", "LUT_3D_SIZE 2\n");
   WriteText("out.cube", "previous");
   const struct {
     std::string args;
@@ -605,12 +586,9 @@ TEST_F(ToolTest, LutCommandsRefuseWithoutWritingAnything) {
        "pass --size 64 (or smaller)"},
       {"lut convert big.cube out.cube --size 65", "bad --size '65': a whole number from 2 to 64"},
       {"lut convert big.cube out.png --size 8", "lut convert writes .cube files"},
-      {"lut convert huge.cube out.cube --size 8",
-       "huge.cube, line 1 (\"LUT_3D_SIZE 257\"): status 23, LUT_3D_SIZE outside 2..256"},
       {"lut convert bad.cube out.cube --size 8",
        "bad.cube, line 6 (\"TITLE \\\"b\\\"\"): status 20, unknown or repeated keyword"},
-      {"lut convert cut.cube out.cube --size 8",
-       "cut.cube, line 5 (\"1 0 0\"): status 10, the file ends before the table is complete"},
+      {"lut info grade.lut", "grade.lut: not a .cube or .3dl file"},
       {"lut convert none.cube out.cube", "none.cube: cannot be opened"},
       {"lut convert big.cube", "lut convert takes IN and OUT"},
       {"lut bake -f VignetteAdjust out.cube",
