@@ -11,7 +11,6 @@
 
 namespace {
 
-namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
 using tfx_test::SetParam;
 using tfx_test::Settings;
@@ -49,7 +48,7 @@ NLEComPtr<INLECGFilter> GreenKey(double mode) {
                                             {L"mode", mode}}));
 }
 
-TEST(ChromeKeyLut3dEffect, ModeSelectsMaskBeautyOrPlainCopy) {
+TEST(ChromeKeyLut3dEffect, ModeSelectsMaskOrBeauty) {
   const std::vector<uint8_t> mask = RunFrame(GreenKey(0).get());
   const int expectedMask[5] = {0, 255, 255, 128, 255};
   for (int p = 0; p < 5; ++p) {
@@ -68,9 +67,6 @@ TEST(ChromeKeyLut3dEffect, ModeSelectsMaskBeautyOrPlainCopy) {
   }
   const uint8_t* spill = &beauty[12];
   EXPECT_LE(spill[1], std::max(spill[0], spill[2]) + 1);
-
-  EXPECT_EQ(RunFrame(GreenKey(2).get()), kPixels);
-  EXPECT_EQ(RunFrame(GreenKey(-1).get()), kPixels);
 }
 
 // The beauty LUT depends on the key colour alone: contrast and offset rebuild only the alpha LUT,

@@ -9,27 +9,10 @@
 
 namespace {
 
-namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
 using tfx_test::FillRandom;
 using tfx_test::Settings;
 constexpr const wchar_t* kLightAdjust = L"D8651B53-F47A-4B98-B8E9-35B491D5EADC";
-
-TEST(LightAdjustEffect, ZeroParametersGiveTheForegroundBack) {
-  const NLEComPtr<INLEProperties> zeros =
-      Settings({{L"u_highLight", 0}, {L"u_shadow", 0}, {L"u_whiteLevel", 0}});
-  // Zeros, and no parameters at all.
-  for (INLEProperties* settings : {zeros.get(), static_cast<INLEProperties*>(nullptr)}) {
-    NLEComPtr<INLECGFilter> filter = CreateEffect(kLightAdjust, settings);
-    TestFrame* fg = new TestFrame(17, 9);
-    TestFrame* dst = new TestFrame(17, 9);
-    NLEComPtr<INLEFrame> h1(fg), h2(dst);
-    FillRandom(fg, 1);
-    filter->SetForeground(fg);
-    ASSERT_EQ(filter->Running(dst), NLE_S_OK);
-    EXPECT_EQ(dst->pixels, fg->pixels);
-  }
-}
 
 TEST(LightAdjustEffect, AppliesTheFourOperationsInOrder) {
   // Highlight, shadow, white level, black level, each seeing the previous one's output; the
@@ -38,10 +21,7 @@ TEST(LightAdjustEffect, AppliesTheFourOperationsInOrder) {
       kLightAdjust,
       Settings(
           {{L"u_blackLevel", -35}, {L"u_highLight", 60}, {L"u_shadow", 80}, {L"u_whiteLevel", 0}}));
-  NLEComPtr<INLEProperties> white;
-  ASSERT_EQ(filter->GetParamPropertyFromName(L"u_whiteLevel", &white), NLE_S_OK);
-  white->SetValue(Key::Property::kValue_Current, CNLEValue(-45.0));
-  filter->ParamValueChanged();
+  tfx_test::SetParam(filter.get(), L"u_whiteLevel", -45);
 
   TestFrame* fg = new TestFrame(64, 4);
   TestFrame* bg = new TestFrame(64, 4, 0, false, 0x55);

@@ -1,5 +1,7 @@
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <cwchar>
 #include <string>
 #include <vector>
 
@@ -253,6 +255,57 @@ TEST(CreateFilterFromGUID, EveryCpuClassRefusesAMissingForeground) {
     NLEComPtr<INLECGFilter> filter = tfx_test::CreateEffect(guid.c_str(), nullptr);
     ASSERT_TRUE(filter);
     tfx_test::ExpectRefusesMissingForeground(filter.get());
+  }
+}
+
+// Each effect at the settings that ask it to do nothing gives its foreground back byte for byte,
+// into a packed destination and into a padded one. The combiner needs an opaque colour and a
+// full mask for that; everything else sees random alpha, none of it 0, which the alpha filler
+// would change.
+TEST(CreateFilterFromGUID, EveryEffectLeavesTheFrameAloneAtNeutralSettings) {
+  using tfx_test::Settings;
+  const struct {
+    const wchar_t* guid;
+    NLEComPtr<INLEProperties> settings;
+    bool mask = false;
+  } cases[] = {
+      {L"18C6E879-4138-42D0-B0B9-6B4401AA97E6",
+       Settings({{L"u_exposure", 0}, {L"u_brightness", 0}, {L"u_contrast", 0}})},
+      {L"39509FB9-39FB-4516-9464-3D891DD61D62", nullptr},
+      {L"41AA934B-757A-4EAD-8F7B-85E2E2952B6A", nullptr, true},
+      // No file there: the frame passes as it is.
+      {L"74EB022D-1D73-4D1E-9F70-487C356D46CD",
+       tfx_test::TextSettings(L"lut3dPath", L"/nonexistent/none.cube")},
+      // Without an amount the shape settings change nothing.
+      {L"8622FC58-4DF1-44BD-9B37-2F633D4D3368", Settings({{L"feather", 10}, {L"size", 5}})},
+      {L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356", nullptr},
+      {L"AF91FF05-6577-4A4B-C81E-652EE7D6596E", Settings({{L"u_green_sat", 0}})},
+      {L"CFAAD60B-AC2B-4B39-A8E1-D25E35A6F735", Settings({{L"distortion", 0}, {L"fringing", 0}})},
+      {L"D8651B53-F47A-4B98-B8E9-35B491D5EADC", nullptr},
+      // Modes past mask (0) and beauty (1), on either side, are a plain copy.
+      {L"DB4BBA18-48FC-4164-B572-E59757B02796", Settings({{L"green", 200}, {L"mode", 2}})},
+      {L"DB4BBA18-48FC-4164-B572-E59757B02796", Settings({{L"green", 200}, {L"mode", -1}})},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(std::string(c.guid, c.guid + std::wcslen(c.guid)));
+    NLEComPtr<INLECGFilter> filter = tfx_test::CreateEffect(c.guid, c.settings.get());
+    ASSERT_TRUE(filter);
+    for (const int stride : {0, 17 * 4 + 12}) {
+      TestFrame* fg = new TestFrame(17, 9);
+      TestFrame* bg = new TestFrame(17, 9, 0, false, 255);
+      TestFrame* dst = new TestFrame(17, 9, stride, false, 0xEE);
+      NLEComPtr<INLEFrame> h1(fg), h2(bg), h3(dst);
+      tfx_test::FillRandom(fg, 17);
+      for (size_t i = 3; i < fg->pixels.size(); i += 4) {
+        fg->pixels[i] = c.mask ? 255 : std::max<uint8_t>(fg->pixels[i], 1);
+      }
+      filter->SetForeground(fg);
+      if (c.mask) filter->SetBackground(bg);
+      ASSERT_EQ(filter->Running(dst), NLE_S_OK);
+      for (int y = 0; y < 9; ++y) {
+        ASSERT_TRUE(std::equal(fg->Row(y), fg->Row(y) + 17 * 4, dst->Row(y))) << "row " << y;
+      }
+    }
   }
 }
 
