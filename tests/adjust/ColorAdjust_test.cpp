@@ -243,15 +243,7 @@ TEST(ColorAdjust, FollowsTheCurvesAtTheirLandmarks) {
     float strength;
     int in, out;
   } cases[] = {
-      // x 2^0.6 and x 2^-0.6
-      {&kExposure, 50, 100, 151},
-      {&kExposure, 50, 169, 255},
-      {&kExposure, -50, 100, 65},
-      // x 2; - 104.25; the smallest darkening is already 1.55 levels
-      {&kBrightness, 100, 127, 254},
-      {&kBrightness, 100, 128, 255},
-      {&kBrightness, -100, 200, 95},
-      {&kBrightness, -100, 106, 1},
+      // the smallest darkening is already 1.55 levels
       {&kBrightness, -0.01f, 100, 98},
       // 183: lo = 127, hi = 128, d = 1
       {&kContrast, 183, 127, 0},
@@ -306,27 +298,6 @@ TEST(ColorAdjust, BrightnessWalksPixelsIgnoringRowPadding) {
   CxImage narrow(&bits, 4, 1, 8, 4, IPF_Gray8);
   brightnessAdjustment(&narrow, 100.0f);
   EXPECT_EQ(grey, (std::vector<uint8_t>{20, 40, 80, 80}));
-}
-
-TEST(ColorAdjust, VibranceAndSaturationKeepGreysAndFullDesaturationMakesThem) {
-  CxImage ramp(256, 1, 32, IPF_BGRA);
-  for (int v = 0; v < 256; ++v)
-    ramp.SetPixelColor(v, 0, tagRGBQUAD{uint8_t(v), uint8_t(v), uint8_t(v), 1});
-  for (const Operation* op : {&kVibrance, &kSaturation}) {
-    for (float strength : {-100.0f, -30.0f, 30.0f, 100.0f}) {
-      const Image image = Clone(ramp);
-      op->exported(image.get(), strength);
-      EXPECT_TRUE(SameBuffer(ramp, *image)) << op->name << ' ' << strength;
-    }
-  }
-  const Image image = NoiseImage(50, 20, 32, IPF_BGRA, 200, 5);
-  const Image original = Clone(*image);
-  saturationAdjustment(image.get(), -100.0f);
-  for (size_t i = 0; i < image->GetSize(); i += 4) {
-    const uint8_t *c = image->GetBits() + i, *o = original->GetBits() + i;
-    ASSERT_TRUE(c[0] == c[1] && c[1] == c[2]) << i;
-    ASSERT_NEAR(c[0], (std::max({o[0], o[1], o[2]}) + std::min({o[0], o[1], o[2]})) / 2, 1) << i;
-  }
 }
 
 TEST(ColorAdjust, PerPixelFormsKeepTheirOwnLimits) {

@@ -6,7 +6,6 @@
 #include <cmath>
 #include <cstdint>
 #include <cstdlib>
-#include <cstring>
 #include <string>
 #include <thread>
 #include <vector>
@@ -221,91 +220,6 @@ TEST(HSLAdjust, LeavesWhatNoBandTouchesExactlyAlone) {
   EXPECT_EQ(hslAdjustment(nullptr, kEveryBand), nullptr);
   EXPECT_EQ(hslAdjustment(&empty, kEveryBand), &empty);
   EXPECT_EQ(hslAdjustment(&headerOnly, kEveryBand), &headerOnly);
-}
-
-TEST(HSLAdjust, BandsMoveTheirOwnColours) {
-  const auto apply = [](tagRGBQUAD c, const HSLBands& bands) {
-    CxImage image(1, 1, 32, IPF_BGRA);
-    image.SetPixelColor(0, 0, c);
-    hslAdjustment(&image, bands);
-    return image.GetPixelColor(0, 0, true);
-  };
-  const auto expect = [](tagRGBQUAD got, int r, int g, int b) {
-    EXPECT_EQ(got.rgbRed, r);
-    EXPECT_EQ(got.rgbGreen, g);
-    EXPECT_EQ(got.rgbBlue, b);
-    EXPECT_EQ(got.rgbReserved, 77);
-  };
-  const tagRGBQUAD red{0, 0, 255, 77}, green{0, 255, 0, 77}, blue{255, 0, 0, 77};
-  // Hue +-100 lands on the neighbouring centres: orange at 30, magenta at 300 degrees.
-  expect(apply(red, Bands({{kHSLRed, {100, 0, 0, 0, 0}}})), 255, 128, 0);
-  expect(apply(red, Bands({{kHSLRed, {-100, 0, 0, 0, 0}}})), 255, 0, 255);
-  expect(apply(green, Bands({{kHSLRed, {-100, 0, 0, 0, 0}}})), 0, 255, 0);
-  expect(apply(green, Bands({{kHSLGreen, {0, -100, 0, 0, 0}}})), 128, 128, 128);
-  expect(apply(blue, Bands({{kHSLBlue, {0, 0, 100, 0, 0}}})), 255, 255, 255);
-  expect(apply(red, Bands({{kHSLRed, {0, 0, -100, 0, 0}}})), 0, 0, 0);
-  // Lightness fades out towards grey: chroma 16 gets a quarter.
-  expect(apply(tagRGBQUAD{100, 100, 116, 77}, Bands({{kHSLRed, {0, 0, -100, 0, 0}}})), 87, 75, 75);
-
-  // Neighbouring weights add up to 1 whatever the common softness, so desaturating every band
-  // greys every colour.
-  for (const float soft : {-100.0f, 0.0f, 100.0f}) {
-    HSLBands all{};
-    for (HSLBandValues& v : all.band) v = {0, -100, 0, 0, soft};
-    const Image image = NoiseImage(64, 16, 32, IPF_BGRA, 256, 3);
-    hslAdjustment(image.get(), all);
-    for (size_t i = 0; i < image->GetSize(); i += 4) {
-      const uint8_t* p = image->GetBits() + i;
-      ASSERT_TRUE(p[0] == p[1] && p[1] == p[2]) << soft << ' ' << i;
-    }
-  }
-}
-
-// The colours of the hexcone's hue circle at one chroma, in hue order.
-std::vector<tagRGBQUAD> HueCircle(int mx, int mn) {
-  std::vector<tagRGBQUAD> ring;
-  const int c = mx - mn;
-  for (int p = 0; p < 6 * c; ++p) {
-    const int sector = p / c, x = p % c;
-    const int rise = mn + x, fall = mx - x;
-    const int rgb[6][3] = {{mx, rise, mn}, {fall, mx, mn}, {mn, mx, rise},
-                           {mn, fall, mx}, {rise, mn, mx}, {mx, mn, fall}};
-    const int* v = rgb[sector];
-    ring.push_back(tagRGBQUAD{uint8_t(v[2]), uint8_t(v[1]), uint8_t(v[0]), 255});
-  }
-  return ring;
-}
-
-// Largest change of any channel between neighbouring colours of the ring, after the bands.
-int WorstStep(const std::vector<tagRGBQUAD>& ring, const HSLBands& bands) {
-  CxImage image(static_cast<unsigned>(ring.size()), 1, 32, IPF_BGRA);
-  std::memcpy(image.GetBits(), ring.data(), ring.size() * 4);
-  hslAdjustment(&image, bands);
-  int worst = 0;
-  for (size_t i = 0; i < ring.size(); ++i) {
-    const uint8_t* a = image.GetBits() + 4 * i;
-    const uint8_t* b = image.GetBits() + 4 * ((i + 1) % ring.size());
-    for (int ch = 0; ch < 3; ++ch) worst = std::max(worst, std::abs(a[ch] - b[ch]));
-  }
-  return worst;
-}
-
-TEST(HSLAdjust, HueSweepHasNoSeams) {
-  // Neighbouring colours of a ring differ by one level in one channel (0.24 to 1 degree of hue).
-  // Bands pulling opposite ways stretch that to several levels where their fades are steepest;
-  // a seam would jump by the whole difference between two bands: their lightness alone differs
-  // by 0.35 to 0.55 here, 40 levels and more.
-  const HSLBands moderate = Bands({{kHSLRed, {30, 40, -20, 0, 0}},
-                                   {kHSLOrange, {-25, -30, 20, 30, 40}},
-                                   {kHSLYellow, {40, 20, 25, -30, -50}},
-                                   {kHSLGreen, {-35, 50, -25, 0, 0}},
-                                   {kHSLAqua, {25, -40, 30, 50, 20}},
-                                   {kHSLBlue, {-40, 35, -30, 0, -30}},
-                                   {kHSLPurple, {30, -25, 20, -20, 60}},
-                                   {kHSLMagenta, {-20, 30, -15, 0, 0}}});
-  for (const auto& [mx, mn] : {std::pair{255, 0}, std::pair{200, 80}, std::pair{90, 30}}) {
-    EXPECT_LE(WorstStep(HueCircle(mx, mn), moderate), 16) << mx << ' ' << mn;
-  }
 }
 
 TEST(HSLAdjust, ThreadsWithDifferentSettingsKeepTheirOwnTables) {
