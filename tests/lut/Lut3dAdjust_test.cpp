@@ -1,5 +1,5 @@
-// The lut3d_ twins against their image forms: point by point on a lattice of whole levels, and
-// as a baked chain applied by doLUT against the effects themselves.
+// The lut3d_ twins against their image forms, point by point on a lattice of whole levels; the
+// tool's bake tests apply a baked chain against the effects themselves.
 #include "tessarofx/Lut3dAdjust.h"
 
 #include <gtest/gtest.h>
@@ -13,8 +13,6 @@
 #include <string>
 #include <vector>
 
-#include "support/EffectHarness.h"
-#include "support/ImageBuilders.h"
 #include "tessarofx/ColorAdjust.h"
 #include "tessarofx/LightAdjust.h"
 #include "tessarofx/WhiteBalance.h"
@@ -225,96 +223,6 @@ TEST(Lut3dAdjust, KeepsTheAtlasInStepWithTheLattice) {
         for (int c = 0; c < 3; ++c) EXPECT_EQ(a[c], static_cast<uint8_t>(p[c]));
       }
     }
-  }
-}
-
-// Runs one effect over a packed BGRA buffer in place, as a host would.
-void RunEffect(const wchar_t* guid, const tfx_test::EffectParams& params, int width, int height,
-               std::vector<uint8_t>* pixels) {
-  NLEComPtr<INLECGFilter> filter = tfx_test::CreateEffect(guid, tfx_test::Settings(params));
-  ASSERT_TRUE(filter);
-  TestFrame* fg = new TestFrame(width, height);
-  TestFrame* dst = new TestFrame(width, height);
-  NLEComPtr<INLEFrame> h1(fg), h2(dst);
-  fg->pixels = *pixels;
-  filter->SetForeground(fg);
-  ASSERT_EQ(filter->Running(dst), NLE_S_OK);
-  *pixels = dst->pixels;
-}
-
-// The demo's grade as twins, in the effects' order: ColorAdjust, LightAdjust, WhiteBalanceAdjust.
-void BakeDemoGrade(CubeLut* lut) {
-  lut3d_exposureAdjustment(lut, 20);
-  lut3d_contrastAdjustment(lut, 30);
-  lut3d_vibranceAdjustment(lut, 40);
-  lut3d_saturationAdjustment(lut, 20);
-  lut3d_hdrHighlight(lut, -40);
-  lut3d_hdrShadow(lut, 50);
-  lut3d_hdrWhiteLevel(lut, 20);
-  lut3d_hdrBlackLevel(lut, -20);
-  lut3d_adjustWhiteBalance(lut, 40.0f / 200.0f, 10.0f / 200.0f);
-}
-
-struct Gap {
-  int worst = 0;
-  double mean = 0;
-};
-
-// |a - b| over the colour bytes of two BGRA buffers.
-Gap Compare(const std::vector<uint8_t>& a, const std::vector<uint8_t>& b) {
-  Gap gap;
-  size_t channels = 0;
-  for (size_t i = 0; i < a.size(); ++i) {
-    if (i % 4 == 3) continue;
-    const int diff = std::abs(a[i] - b[i]);
-    gap.worst = std::max(gap.worst, diff);
-    gap.mean += diff;
-    ++channels;
-  }
-  gap.mean /= static_cast<double>(channels);
-  return gap;
-}
-
-TEST(Lut3dAdjust, BakedChainThroughDoLutIsCloseToTheEffects) {
-  const CxImage& all = tfx_test::EveryColour();
-  const int width = static_cast<int>(all.GetWidth()), height = static_cast<int>(all.GetHeight());
-  const std::vector<uint8_t> source(all.GetBits(), all.GetBits() + all.GetSize());
-  std::vector<uint8_t> direct = source;
-  RunEffect(L"18C6E879-4138-42D0-B0B9-6B4401AA97E6",
-            {{L"u_exposure", 20}, {L"u_contrast", 30}, {L"u_vib", 40}, {L"u_sat", 20}}, width,
-            height, &direct);
-  RunEffect(
-      L"D8651B53-F47A-4B98-B8E9-35B491D5EADC",
-      {{L"u_highLight", -40}, {L"u_shadow", 50}, {L"u_whiteLevel", 20}, {L"u_blackLevel", -20}},
-      width, height, &direct);
-  RunEffect(L"39509FB9-39FB-4516-9464-3D891DD61D62", {{L"u_temperature", 40}, {L"u_tint", 10}},
-            width, height, &direct);
-
-  // The effects floor after each of their nine operations, and the steep ones (the shadow lift
-  // doubles the darkest levels; vibrance and saturation stretch dark saturated colours) magnify
-  // earlier floors: up to 13 levels before any table. Interpolation adds most where the chain
-  // bends inside a cell (clipping at 0 and 255, the vibrance weight's step), less as cells shrink.
-  for (const auto& [n, worst] : {std::pair{33, 15}, std::pair{64, 13}}) {
-    SCOPED_TRACE("size " + std::to_string(n));
-    auto lut = std::make_unique<CubeLut>();
-    lut->generateLUT3DData(n);
-    for (int i = 0; i < n; ++i) {
-      for (int j = 0; j < n; ++j) {
-        for (int k = 0; k < n; ++k) {
-          float* p = Point(lut.get(), i, j, k);
-          p[0] = static_cast<float>(i) * 255.0f / static_cast<float>(n - 1);
-          p[1] = static_cast<float>(j) * 255.0f / static_cast<float>(n - 1);
-          p[2] = static_cast<float>(k) * 255.0f / static_cast<float>(n - 1);
-        }
-      }
-    }
-    BakeDemoGrade(lut.get());
-    std::vector<uint8_t> baked = source;
-    ASSERT_EQ(lut->doLUT(baked.data(), width, height, width * 4, 4), 0);
-    for (size_t i = 3; i < baked.size(); i += 4) ASSERT_EQ(baked[i], source[i]);
-    const Gap total = Compare(baked, direct);
-    EXPECT_LE(total.worst, worst);
-    EXPECT_LE(total.mean, 2.5);
   }
 }
 
