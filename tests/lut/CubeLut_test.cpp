@@ -65,16 +65,6 @@ TEST(CubeLut, GeneratedLatticeDividesBy31WhateverTheSize) {
   EXPECT_EQ(32.0f * 255.0f / 31.0f, Point(*Generated(33), 32, 1, 0)[0]);       // past 255
 }
 
-TEST(CubeLut, Identity32LeavesEveryColourAlone) {
-  const auto lut = Generated(32);
-  const CxImage& colours = tfx_test::EveryColour();
-  tfx_test::Image image = tfx_test::Clone(colours);
-  EXPECT_EQ(0, lut->doLUT(image->GetBits(), static_cast<int>(image->GetWidth()),
-                          static_cast<int>(image->GetHeight()),
-                          static_cast<int>(image->GetEffWidth()), 4));
-  EXPECT_TRUE(tfx_test::SameBuffer(colours, *image));
-}
-
 // With fr = fg = fb the last case reads C000, C010, C110 and C111. NaN in every other corner
 // would turn any other case's zero weights into a NaN result, which converts to 0.
 TEST(CubeLut, EqualFractionsTakeTheLastCase) {
