@@ -195,18 +195,6 @@ TEST_F(ToolTest, ListJsonIsWellFormedAndCarriesEveryFilter) {
   EXPECT_NE(r.out.find(R"({"name": "red", "type": "int")"), npos);
 }
 
-TEST_F(ToolTest, ApplyBrightnessDoublesChannelsAndKeepsAlpha) {
-  WriteInput("in.png");
-  const Outcome r = Run("apply ColorAdjust -p u_brightness=100 in.png " + Path("out.png"));
-  ASSERT_EQ(r.exitCode, 0) << r.err;
-  const cv::Mat after = Read("out.png");
-  ASSERT_EQ(after.type(), CV_8UC4);
-  cv::Mat expected;  // colour channels doubled and saturated, alpha as it was
-  cv::multiply(Read("in.png"), cv::Scalar(2, 2, 2, 1), expected);
-  ASSERT_EQ(after.size(), expected.size());
-  EXPECT_EQ(cv::norm(after, expected, cv::NORM_INF), 0);
-}
-
 TEST_F(ToolTest, ApplyFindsFiltersByGuidAndNameInAnyCase) {
   WriteInput("in.png");
   ASSERT_EQ(Run("apply coloradjust -p u_sat=-100 in.png a.png").exitCode, 0);
@@ -783,7 +771,6 @@ TEST_F(ToolTest, ApplyOpenCLRefusesOptionsThatDoNotFit) {
 TEST_F(ToolTest, ApplyOpenCLNamesTheDeviceOrProgramThatFailed) {
   SKIP_WITHOUT_OPENCL();
   WriteInput("in.png");
-  fs::create_directory(Path("empty"));
   fs::create_directory(Path("broken"));
   WriteText("broken/WhiteBalanceAdjust.cl",
             "__kernel void auto_white_balance(__global uchar4* p) { p[0] = undeclared_name; }\n");
@@ -791,11 +778,6 @@ TEST_F(ToolTest, ApplyOpenCLNamesTheDeviceOrProgramThatFailed) {
   const std::string count = std::to_string(OpenCLDevices().size());
   ExpectRefused("apply --opencl --device " + count + " WhiteBalanceAdjust in.png o.png",
                 "--device " + count + " is out of range", before);
-  // The library logs the file it could not read as well.
-  const Outcome missing = Run("apply --opencl --kernels empty WhiteBalanceAdjust in.png o.png");
-  EXPECT_EQ(missing.exitCode, 1);
-  EXPECT_NE(missing.err.find("empty/WhiteBalanceAdjust.cl"), npos) << missing.err;
-
   // The compiler's own complaint reaches the user, not just a result code.
   const Outcome broken = Run("apply --opencl --kernels broken WhiteBalanceAdjust in.png o.png");
   EXPECT_EQ(broken.exitCode, 1);
