@@ -38,10 +38,3 @@ class TestFrame final : public scombase::CUnknown, public INLEFrame {
   void* deviceMemory = nullptr;  // what the surface reports as its device memory
   NLESurfaceKind surfaceKind = kNLESurfaceCPU;
 };
-
-// Holds a new object with one reference for the test's scope.
-template <class T>
-NLEComPtr<T> Hold(T* object) {
-  NLEComPtr<T> p(object);
-  return p;
-}
