@@ -1,7 +1,5 @@
 #include <gtest/gtest.h>
 
-#include <vector>
-
 #include "support/EffectHarness.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"
@@ -9,18 +7,11 @@
 
 namespace {
 
-using Params = tfx_test::EffectParams;
-
-NLEComPtr<INLECGFilter> CreateVignette(const Params& values) {
-  return tfx_test::CreateEffect(L"8622FC58-4DF1-44BD-9B37-2F633D4D3368",
-                                tfx_test::Settings(values));
-}
-
 TEST(VignetteAdjustEffect, PassesEachParameterToItsArgumentWithItsDefault) {
   // Distinct values show the argument order; the short lists show the values of missing
   // parameters (size 100, feather 50, highlights 50, roundness and exposure 0).
   const struct {
-    Params params;
+    tfx_test::EffectParams params;
     float amount, feather, highlights, size, roundness, exposure;
   } cases[] = {
       {{{L"amount", -40},
@@ -40,22 +31,12 @@ TEST(VignetteAdjustEffect, PassesEachParameterToItsArgumentWithItsDefault) {
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(testing::Message() << "amount " << c.amount << " exposure " << c.exposure);
-    NLEComPtr<INLECGFilter> filter = CreateVignette(c.params);
-    TestFrame* fg = new TestFrame(61, 35);
-    TestFrame* dst = new TestFrame(61, 35, 260);  // padded rows go through a private copy
-    NLEComPtr<INLEFrame> h1(fg), h2(dst);
-    tfx_test::FillRandom(fg, 61);
-    filter->SetForeground(fg);
-    ASSERT_EQ(filter->Running(dst), NLE_S_OK);
-
-    std::vector<uint8_t> expected = fg->pixels;
-    uint8_t* bits = expected.data();
-    CxImage image(&bits, 61, 35, 32, 61 * 4, IPF_BGRA);
-    vignetteAdjustFilter(&image, c.amount, c.feather, c.highlights, c.size, c.roundness,
-                         c.exposure);
-    for (int y = 0; y < 35; ++y) {
-      ASSERT_TRUE(std::equal(dst->Row(y), dst->Row(y) + 61 * 4, bits + y * 61 * 4)) << y;
-    }
+    NLEComPtr<INLECGFilter> filter = tfx_test::CreateEffect(L"8622FC58-4DF1-44BD-9B37-2F633D4D3368",
+                                                            tfx_test::Settings(c.params));
+    tfx_test::ExpectMatchesImageForm(filter.get(), 61, 35, 260, [&](CxImage* image) {
+      vignetteAdjustFilter(image, c.amount, c.feather, c.highlights, c.size, c.roundness,
+                           c.exposure);
+    });
   }
 }
 

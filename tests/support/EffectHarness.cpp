@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <random>
 
 namespace tfx_test {
@@ -58,6 +59,28 @@ void SetParam(INLECGFilter* filter, const wchar_t* name, double value) {
   ASSERT_EQ(filter->GetParamPropertyFromName(name, &param), NLE_S_OK);
   param->SetValue(Key::Property::kValue_Current, CNLEValue(value));
   filter->ParamValueChanged();
+}
+
+void ExpectMatchesImageForm(INLECGFilter* filter, int width, int height, int dstStride,
+                            const std::function<void(CxImage*)>& imageForm, int fgHeight) {
+  TestFrame* fg = new TestFrame(width, fgHeight ? fgHeight : height);
+  TestFrame* bg = new TestFrame(width, height, 0, false, 0x55);
+  TestFrame* dst = new TestFrame(width, height, dstStride, false, 0xEE);
+  NLEComPtr<INLEFrame> h1(fg), h2(bg), h3(dst);
+  FillRandom(fg, static_cast<unsigned>(width * 131 + height));
+  filter->SetForeground(fg);
+  filter->SetBackground(bg);
+  ASSERT_EQ(filter->Running(dst), NLE_S_OK);
+  const size_t row = static_cast<size_t>(width) * 4;
+  std::vector<uint8_t> expected(fg->pixels.begin(), fg->pixels.begin() + row * height);
+  uint8_t* bits = expected.data();
+  CxImage image(&bits, width, height, 32, static_cast<unsigned>(row), IPF_BGRA);
+  imageForm(&image);
+  EXPECT_FALSE(std::equal(expected.begin(), expected.end(), fg->pixels.begin()))
+      << "the case proves nothing";
+  for (int y = 0; y < height; ++y) {
+    ASSERT_TRUE(std::equal(dst->Row(y), dst->Row(y) + row, bits + y * row)) << "row " << y;
+  }
 }
 
 void ExpectRefusesMissingForeground(INLECGFilter* filter) {

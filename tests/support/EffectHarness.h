@@ -2,11 +2,13 @@
 // by its GUID.
 #pragma once
 
+#include <functional>
 #include <string>
 #include <utility>
 #include <vector>
 
 #include "support/TestFrame.h"
+#include "tessarofx/CxImage.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"
 
@@ -28,6 +30,13 @@ void FillRandom(TestFrame* frame, unsigned salt);
 // Changes one parameter of a live filter as a host's UI does: its current value, then
 // ParamValueChanged.
 void SetParam(INLECGFilter* filter, const wchar_t* name, double value);
+
+// Runs `filter` on a `width` x `height` foreground of random pixels (`fgHeight` rows of it where
+// that is not 0, to feed a taller frame) and a background it must not read, into a destination
+// whose rows are `dstStride` bytes apart (0: packed), and expects the bytes `imageForm` makes of
+// a packed BGRA copy of the foreground, which must differ from it.
+void ExpectMatchesImageForm(INLECGFilter* filter, int width, int height, int dstStride,
+                            const std::function<void(CxImage*)>& imageForm, int fgHeight = 0);
 
 // Runs `filter` with a background and no foreground: an effect that reads the foreground must
 // refuse with 0x80000003 and leave the destination unwritten.
