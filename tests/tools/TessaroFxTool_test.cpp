@@ -500,9 +500,6 @@ TEST_F(ToolTest, LutConvertResamplesATableTooBigForThePlugin) {
     }
     EXPECT_LT(worst, 1e-6);
   }
-  const Outcome info = Run("lut info small33.cube");
-  ASSERT_EQ(info.exitCode, 0) << info.err;
-  EXPECT_NE(info.out.find("size:    33 points per axis"), npos);
 
   // Through the LUT effect: each colour rotated, within the rounding of doLUT.
   WriteInput("in.png", 17, 9);
@@ -545,7 +542,6 @@ TEST_F(ToolTest, LutConvertTurnsA3dlFileIntoACube) {
     EXPECT_NEAR(rows[at][1], std::lround(at / 289 * 4095 / 16.0) / 4095.0, 1e-7);
     EXPECT_NEAR(rows[at][2], std::lround(at % 17 * 4095 / 16.0) / 4095.0, 1e-7);
   }
-  EXPECT_NE(Run("lut info look.cube").out.find("size:    17 points per axis"), npos);
 }
 
 TEST_F(ToolTest, LutConvertKeepsThePluginsDomainScaling) {
@@ -600,7 +596,7 @@ TEST_F(ToolTest, LutCommandsRefuseWithoutWritingAnything) {
 TEST_F(ToolTest, LutBakeOfExposureAppliesLikeTheFilter) {
   WriteInput("in.png", 33, 21);
   ASSERT_EQ(Run("lut bake -f ColorAdjust -p u_exposure=20 exposure.cube").exitCode, 0);
-  EXPECT_NE(Run("lut info exposure.cube").out.find("size:    33 points per axis"), npos);
+  EXPECT_EQ(CubeRows(Slurp(Path("exposure.cube"))).size(), 33u * 33 * 33);  // the default size
   const Outcome baked =
       Run("apply ColorLut3dAdjust -p lut3dPath=" + Path("exposure.cube") + " in.png baked.png");
   ASSERT_EQ(baked.exitCode, 0) << baked.err;
