@@ -11,6 +11,7 @@
 #include "../tools/DemoScene.h"
 #include "lut/CubeLutApply.h"
 #include "support/EffectHarness.h"
+#include "support/ImageBuilders.h"
 #include "support/OpenCLHarness.h"
 #include "support/TempDir.h"
 #include "tessarofx/CubeLut.h"
@@ -71,18 +72,6 @@ TEST_F(OpenCLEffects, WhiteBalanceFollowsTheCpuClassWithinALevel) {
   EXPECT_LT(differing, pixels.size() / 100);
 }
 
-// Every byte triple once: a 4096 x 4096 frame.
-Bytes EveryColour() {
-  Bytes out(size_t{1} << 26);
-  for (uint32_t i = 0; i < (1u << 24); ++i) {
-    out[4 * size_t{i}] = static_cast<uint8_t>(i);
-    out[4 * size_t{i} + 1] = static_cast<uint8_t>(i >> 8);
-    out[4 * size_t{i} + 2] = static_cast<uint8_t>(i >> 16);
-    out[4 * size_t{i} + 3] = static_cast<uint8_t>(i * 7);
-  }
-  return out;
-}
-
 // A lattice of N points whose values reach every branch of the byte rounding: below -0.5 (wraps),
 // above 255, exact halves, NaN, infinities and values outside 32 bits.
 void FillHostileLattice(CubeLut* lut, int n, unsigned salt) {
@@ -125,7 +114,8 @@ TEST_F(OpenCLEffects, LutKernelIsTheTetrahedralFormulaToTheByte) {
   OPENCL::openclKernel* kernel = program->getopenclKernel("MAIN");
   ASSERT_NE(kernel, nullptr);
 
-  const Bytes every = EveryColour();
+  const CxImage& colours = tfx_test::EveryColour();
+  const Bytes every(colours.GetBits(), colours.GetBits() + colours.GetSize());
   const Bytes sample(every.begin(), every.begin() + (size_t{1} << 22));  // a quarter of the reds
   struct Case {
     int n;

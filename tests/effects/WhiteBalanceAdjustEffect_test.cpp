@@ -1,12 +1,12 @@
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <cstdint>
 #include <opencv2/core.hpp>
 #include <string>
 #include <vector>
 
 #include "support/EffectHarness.h"
+#include "support/ImageBuilders.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"
 #include "tessarofx/WhiteBalance.h"
@@ -28,20 +28,11 @@ uint8_t Scaled(int v, double factor) {
 TEST(WhiteBalanceAdjustEffect, EveryColourMatchesTheFactors) {
   // Every 24-bit colour with an independent alpha, through Running, at both signs, the range
   // ends and far outside them (negative and above-2 factors).
-#if defined(TFX_SANITIZE_BUILD)
-  constexpr int kHeight = 512;  // every 32nd row
-#else
-  constexpr int kHeight = 4096;
-#endif
-  TestFrame* fg = new TestFrame(4096, kHeight);
-  TestFrame* dst = new TestFrame(4096, kHeight);
+  const CxImage& all = tfx_test::EveryColour();
+  TestFrame* fg = new TestFrame(4096, static_cast<int>(all.GetHeight()));
+  TestFrame* dst = new TestFrame(4096, static_cast<int>(all.GetHeight()));
   NLEComPtr<INLEFrame> h1(fg), h2(dst);
-  for (uint32_t i = 0; i < 4096u * kHeight; ++i) {
-    const uint32_t colour = (i * (4096 / kHeight)) & 0xffffff;
-    const uint8_t pixel[4] = {uint8_t(colour), uint8_t(colour >> 8), uint8_t(colour >> 16),
-                              uint8_t((i * 2654435761u) >> 24)};
-    std::copy(pixel, pixel + 4, &fg->pixels[4 * size_t{i}]);
-  }
+  fg->pixels.assign(all.GetBits(), all.GetBits() + all.GetSize());
   NLEComPtr<INLECGFilter> filter =
       CreateEffect(kWhiteBalance, Settings({{L"u_temperature", 0}, {L"u_tint", 0}}));
   filter->SetForeground(fg);
