@@ -260,9 +260,15 @@ TEST(WhiteBalance, BlackBodyColoursFollowTheFormulaAndFillTheGradient) {
   }
 }
 
-// The helpers the image functions reach only with k, -k, k and ints in range.
-TEST(WhiteBalance, TintHelpersSaturateWithoutOverflow) {
+// The blend helper the temperature tables do not use, and the tint helper, which the image
+// function reaches only with k, -k, k and ints in range.
+TEST(WhiteBalance, PerPixelHelpersKeepTheirChannelsAndSaturateWithoutOverflow) {
   const tagRGBQUAD c{10, 100, 200, 77};
+  const tagRGBQUAD m = mixColorAndTmpColor(c, tagRGBQUAD{250, 0, 100, 3}, 0.5f);
+  EXPECT_EQ(m.rgbBlue, 130);
+  EXPECT_EQ(m.rgbGreen, 50);
+  EXPECT_EQ(m.rgbRed, 150);
+  EXPECT_EQ(m.rgbReserved, 77);
   tagRGBQUAD p = calNewTintPixel(c, INT_MAX, INT_MIN, 0);
   EXPECT_EQ(p.rgbRed, 255);
   EXPECT_EQ(p.rgbGreen, 0);
