@@ -2,7 +2,8 @@
 // host's temperature and tint sliders, and the colour-science steps behind the measure.
 //
 // Images are width * height 32-bit pixels without row padding, bytes blue, green, red, alpha.
-// Colour conversions are in float, the rates in double. No state is shared between calls.
+// An image above INT_MAX bytes counts as a size below 1 (the functions return as stated for
+// that). Colour conversions are in float, the rates in double. No state is shared between calls.
 #pragma once
 
 #include <cstdint>

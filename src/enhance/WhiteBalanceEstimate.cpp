@@ -4,6 +4,7 @@
 // pixels, divided with truncation and cut to their low byte.
 #include "tessarofx/WhiteBalanceEstimate.h"
 
+#include <climits>
 #include <cmath>
 #include <cstddef>
 #include <cstdint>
@@ -13,9 +14,12 @@
 namespace {
 
 // Pixels in a width x height image, or 0 when either side is below 1.
+// 0 for a size below 1 or an image above INT_MAX bytes: no caller holds such a buffer, and its
+// byte count would wrap the arithmetic that walks it.
 size_t PixelCount(int width, int height) {
   if (width < 1 || height < 1) return 0;
-  return static_cast<size_t>(width) * static_cast<size_t>(height);
+  const size_t count = static_cast<size_t>(width) * static_cast<size_t>(height);
+  return count > static_cast<size_t>(INT_MAX) / 4 ? 0 : count;
 }
 
 struct Means {
@@ -88,7 +92,7 @@ unsigned char channelMean(const unsigned char* pixels, int width, int height, in
 }
 
 unsigned char* doAutoWhiteBalance(unsigned char* src, unsigned char* dst, int width, int height) {
-  if (!src || !dst || width < 1 || height < 1) return src;
+  if (!src || !dst || PixelCount(width, height) == 0) return src;
   // One row only, on purpose: the balance itself is left to the caller.
   std::memmove(dst, src, static_cast<size_t>(width) * 4);
   return dst;

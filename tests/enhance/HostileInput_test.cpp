@@ -6,6 +6,7 @@
 #include <climits>
 #include <cstdint>
 #include <functional>
+#include <utility>
 #include <vector>
 
 #include "support/ImageBuilders.h"
@@ -13,6 +14,7 @@
 #include "tessarofx/Compositing.h"
 #include "tessarofx/CxImage.h"
 #include "tessarofx/Denoise.h"
+#include "tessarofx/WhiteBalanceEstimate.h"
 
 namespace {
 
@@ -84,6 +86,19 @@ TEST(DeNoise, LeavesAWrappedImageItsRowsCannotBePaddedIn) {
     EXPECT_EQ(image.GetWidth(), 5u);
     EXPECT_EQ(image.GetEffWidth(), 15u);
     EXPECT_EQ(pixels, before);
+  }
+}
+
+// A size above INT_MAX bytes over a small buffer counts as no image: nothing is read.
+TEST(WhiteBalanceEstimate, TreatsImagesAboveIntMaxBytesAsEmpty) {
+  std::vector<uint8_t> src(16, 200), dst(16, 7);
+  for (const auto& [width, height] : {std::pair{32768, 16384}, std::pair{INT_MAX, 1}}) {
+    SCOPED_TRACE(width);
+    EXPECT_EQ(channelMean(src.data(), width, height, 0), 255);
+    EXPECT_EQ(doAutoWhiteBalance(src.data(), dst.data(), width, height), src.data());
+    EXPECT_EQ(getAutoWhiteBalanceCCTChangeRate(src.data(), dst.data(), width, height), 0.0);
+    EXPECT_EQ(getAutoWhiteBalanceTintChangeRate(src.data(), dst.data(), width, height), 0.0);
+    EXPECT_EQ(dst, std::vector<uint8_t>(16, 7));
   }
 }
 
