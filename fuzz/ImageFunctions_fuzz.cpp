@@ -69,6 +69,12 @@ int Dim(FuzzedDataProvider& in) {
   }
 }
 
+// A row length as a host would compute it, saturated instead of overflowing.
+int Times(int a, int b) {
+  const int64_t v = int64_t{a} * b;
+  return v > INT_MAX ? INT_MAX : (v < INT_MIN ? INT_MIN : static_cast<int>(v));
+}
+
 float Real(FuzzedDataProvider& in) {
   switch (in.ConsumeIntegralInRange<int>(0, 9)) {
     case 0:
@@ -393,7 +399,7 @@ void OnBuffers(FuzzedDataProvider& in, Arena& arena) {
     case 15:
     case 16: {
       const int bpp = in.PickValueInArray({32, 24, 8, 0, -32, 64});
-      const int stride = in.ConsumeBool() ? width * 4 : Dim(in);
+      const int stride = in.ConsumeBool() ? Times(width, 4) : Dim(in);
       uint8_t* src = Plane(arena, in, stride, height, 1);
       if (!src) break;
       const int border = in.ConsumeBool() ? in.ConsumeIntegralInRange<int>(-2, 24) : Dim(in);
@@ -419,7 +425,7 @@ void OnBuffers(FuzzedDataProvider& in, Arena& arena) {
     }
     case 17: {
       const int dstWidth = Dim(in), dstHeight = Dim(in);
-      const int srcStride = in.ConsumeBool() ? width * 4 : Dim(in);
+      const int srcStride = in.ConsumeBool() ? Times(width, 4) : Dim(in);
       uint8_t* src = Plane(arena, in, srcStride, height, 1);
       uint8_t* dst = Plane(arena, in, dstWidth, dstHeight, 4);
       if (!src || !dst) break;
@@ -429,8 +435,8 @@ void OnBuffers(FuzzedDataProvider& in, Arena& arena) {
     }
     case 18: {
       const int dstWidth = Dim(in), dstHeight = Dim(in);
-      const int srcStride = in.ConsumeBool() ? width * 4 : Dim(in);
-      const int dstStride = in.ConsumeBool() ? dstWidth * 4 : Dim(in);
+      const int srcStride = in.ConsumeBool() ? Times(width, 4) : Dim(in);
+      const int dstStride = in.ConsumeBool() ? Times(dstWidth, 4) : Dim(in);
       uint8_t* src = Plane(arena, in, srcStride, height, 1);
       uint8_t* dst = Plane(arena, in, dstStride, dstHeight, 1);
       if (src && dst) {
@@ -449,7 +455,7 @@ void OnBuffers(FuzzedDataProvider& in, Arena& arena) {
       break;
     }
     case 20: {
-      const int stride = in.ConsumeBool() ? width * 4 : Dim(in);
+      const int stride = in.ConsumeBool() ? Times(width, 4) : Dim(in);
       uint8_t* pixels = Plane(arena, in, stride, height, 1);
       if (!pixels) break;
       AutoWhiteBalance balance;
@@ -515,7 +521,7 @@ void OnLattice(FuzzedDataProvider& in, Arena& arena) {
     case 0: {
       const int width = Dim(in), height = Dim(in);
       const int bytesPerPixel = in.ConsumeIntegralInRange<int>(-1, 5);
-      const int pitch = in.ConsumeBool() ? width * bytesPerPixel : Dim(in);
+      const int pitch = in.ConsumeBool() ? Times(width, bytesPerPixel) : Dim(in);
       bool overflowed = false;
       const int64_t span = pitch < 0 ? -int64_t{pitch} : pitch;
       const uint64_t bytes = Bytes(span, height, &overflowed);

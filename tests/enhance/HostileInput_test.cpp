@@ -102,4 +102,10 @@ TEST(WhiteBalanceEstimate, TreatsImagesAboveIntMaxBytesAsEmpty) {
   }
 }
 
+TEST(DctDenoise, LeavesPlanesAboveIntMaxBytesAlone) {
+  std::vector<uint8_t> src = NoiseBytes(64, 1), dst(64, 7);
+  dct_Denosing(src.data(), dst.data(), 16, 3, INT_MAX / 2, 10.0f);
+  EXPECT_EQ(dst, std::vector<uint8_t>(64, 7));
+}
+
 }  // namespace
