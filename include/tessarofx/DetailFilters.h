@@ -28,7 +28,7 @@ TFX_API unsigned char* getMinDarkChannel(CxImage* image, uint32_t* maxRGB, uint3
 
 // A new plane (array new, the caller deletes it): min(dark[i], byte(trunc(mean[i] * factor)))
 // for each of width * height positions, byte() keeping the low 8 bits of the 32-bit truncation
-// (0 past 32 bits). Null for null planes or a size below 1.
+// (0 past 32 bits). Null for null planes, a size below 1, or planes above INT_MAX bytes.
 TFX_API unsigned char* calL(const unsigned char* dark, const unsigned char* mean, int width,
                             int height, float factor);
 

@@ -4,6 +4,7 @@
 // 15 x 15 mean of that channel, then stretches each colour away from it; addition lifts every
 // value towards white. The arithmetic is float, as the strength is.
 #include <algorithm>
+#include <climits>
 #include <cmath>
 #include <cstddef>
 #include <cstdint>
@@ -162,6 +163,8 @@ unsigned char* calL(const unsigned char* dark, const unsigned char* mean, int wi
                     float factor) {
   if (!dark || !mean || width < 1 || height < 1) return nullptr;
   const size_t count = static_cast<size_t>(width) * static_cast<size_t>(height);
+  // No caller holds planes above INT_MAX bytes.
+  if (count > static_cast<size_t>(INT_MAX)) return nullptr;
   uint8_t* out = new (std::nothrow) uint8_t[count];
   if (!out) return nullptr;
   uint8_t scaled[256];

@@ -14,6 +14,7 @@
 #include "tessarofx/Compositing.h"
 #include "tessarofx/CxImage.h"
 #include "tessarofx/Denoise.h"
+#include "tessarofx/DetailFilters.h"
 #include "tessarofx/WhiteBalanceEstimate.h"
 
 namespace {
@@ -102,10 +103,11 @@ TEST(WhiteBalanceEstimate, TreatsImagesAboveIntMaxBytesAsEmpty) {
   }
 }
 
-TEST(DctDenoise, LeavesPlanesAboveIntMaxBytesAlone) {
+TEST(Planes, AboveIntMaxBytesAreLeftAlone) {
   std::vector<uint8_t> src = NoiseBytes(64, 1), dst(64, 7);
   dct_Denosing(src.data(), dst.data(), 16, 3, INT_MAX / 2, 10.0f);
   EXPECT_EQ(dst, std::vector<uint8_t>(64, 7));
+  EXPECT_EQ(calL(src.data(), dst.data(), 65536, 65536, 1.0f), nullptr);
 }
 
 }  // namespace
