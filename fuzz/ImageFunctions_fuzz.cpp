@@ -309,18 +309,17 @@ void OnBuffers(FuzzedDataProvider& in, Arena& arena) {
     }
     case 1:
     case 2: {
+      // gaussianBlur's rows are padded to 4 bytes, fastAverageBlur's are not.
+      const bool gaussian = in.ConsumeBool();
       const int channels = in.ConsumeIntegralInRange<int>(-1, 5);
       bool overflowed = false;
-      const uint64_t row = Bytes(width, channels, &overflowed);
-      uint64_t bytes = overflowed ? 0 : Bytes(int64_t(row), height, &overflowed);
-      // gaussianBlur pads its rows to 4 bytes.
-      if (!overflowed && in.ConsumeBool()) {
-        bytes = Bytes(int64_t((row + 3) & ~uint64_t{3}), height, &overflowed);
-      }
+      uint64_t row = Bytes(width, channels, &overflowed);
+      if (gaussian) row = (row + 3) & ~uint64_t{3};
+      const uint64_t bytes = overflowed ? 0 : Bytes(int64_t(row), height, &overflowed);
       uint8_t* p = arena.Buffer(bytes, 9, overflowed);
       if (p) {
         const int radius = Dim(in);
-        if (in.ConsumeBool()) {
+        if (gaussian) {
           gaussianBlur(p, width, height, channels, radius);
         } else {
           fastAverageBlur(p, width, height, channels, radius);

@@ -136,6 +136,9 @@ struct WhitePointinfo {
 // their pixel-weighted mean colour. The gains bring that colour to grey with green fixed at 1:
 // gain = mean green / mean channel. Without candidates the gains stay 1.
 //
+// Every call that takes a BGRA buffer refuses (false, or an all-zero block) a buffer above
+// INT_MAX bytes (stride * height) as well as the cases it names.
+//
 // One object is used by one thread at a time.
 class TFX_API AutoWhiteBalance {
  public:

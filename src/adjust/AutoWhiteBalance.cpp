@@ -2,6 +2,7 @@
 // neutral are taken as lit white or grey surfaces; the brightest of them give the white point.
 // The thresholds and their reasons are in the header.
 #include <algorithm>
+#include <climits>
 #include <cmath>
 #include <cstddef>
 #include <cstdint>
@@ -30,6 +31,13 @@ uint8_t RoundToByte(float v) {
 
 // A caller's block lies inside the converted image (width x height) and holds pixels; in 64 bits,
 // as x + width may pass INT_MAX.
+// A BGRA buffer of `height` rows `stride` bytes apart, each holding `width` pixels, no larger than
+// INT_MAX bytes: no caller holds more, and the sample arrays of a larger one would not fit.
+bool DescribesBuffer(const uint8_t* bgra, int width, int height, int stride) {
+  return bgra && width > 0 && height > 0 && stride / 4 >= width &&
+         static_cast<int64_t>(stride) * height <= INT_MAX;
+}
+
 bool InsideImage(const WhitePointinfo* block, int width, int height) {
   return block && block->x >= 0 && block->y >= 0 && block->width > 0 && block->height > 0 &&
          int64_t{block->x} + block->width <= width && int64_t{block->y} + block->height <= height;
@@ -98,7 +106,7 @@ void AutoWhiteBalance::BGR2YCbCr(uint8_t b, uint8_t g, uint8_t r, int* y, int* c
 
 bool AutoWhiteBalance::BGR2YCbCr(const uint8_t* bgra, int width, int height, int stride) {
   Reset();
-  if (!bgra || width <= 0 || height <= 0 || stride / 4 < width) return false;
+  if (!DescribesBuffer(bgra, width, height, stride)) return false;
   const size_t count = static_cast<size_t>(width) * static_cast<size_t>(height);
   try {
     samples_.resize(count);
@@ -156,7 +164,10 @@ void AutoWhiteBalance::CalcAVD(WhitePointinfo* block) const {
 WhitePointinfo AutoWhiteBalance::FindWhitePointBlock(const uint8_t* bgra, int stride, int x,
                                                      int y) const {
   WhitePointinfo block{};
-  if (!bgra || x < 0 || y < 0 || x >= width_ || y >= height_ || stride / 4 < width_) return block;
+  if (!DescribesBuffer(bgra, width_, height_, stride) || x < 0 || y < 0 || x >= width_ ||
+      y >= height_) {
+    return block;
+  }
   block.x = x;
   block.y = y;
   block.width = std::min(kBlockSize, width_ - x);
@@ -188,7 +199,7 @@ WhitePointinfo AutoWhiteBalance::FindWhitePointBlock(const uint8_t* bgra, int st
 
 bool AutoWhiteBalance::FindWhitePoint(const uint8_t* bgra, int stride) {
   blocks_.clear();
-  if (!bgra || width_ <= 0 || height_ <= 0 || stride / 4 < width_) return false;
+  if (!DescribesBuffer(bgra, width_, height_, stride)) return false;
   std::vector<WhitePointinfo*> candidates;
   for (int y = 0; y < height_; y += kBlockSize) {
     for (int x = 0; x < width_; x += kBlockSize) {
@@ -265,7 +276,10 @@ void AutoWhiteBalance::SetWhitePoint(const BGRAColor& white) {
 
 bool AutoWhiteBalance::SetWhitePointPos(const uint8_t* bgra, int width, int height, int stride,
                                         int x, int y, int radius) {
-  if (!bgra || x < 0 || y < 0 || x >= width || y >= height || stride / 4 < width) return false;
+  if (!DescribesBuffer(bgra, width, height, stride) || x < 0 || y < 0 || x >= width ||
+      y >= height) {
+    return false;
+  }
   // In 64 bits: x + radius and the pixel count of a large square pass INT_MAX.
   const int64_t reach = std::max(radius, 0);
   const int64_t x0 = std::max<int64_t>(x - reach, 0), x1 = std::min<int64_t>(x + reach, width - 1);
@@ -297,7 +311,8 @@ void AutoWhiteBalance::CalcAdjustPos(float* temperature, float* tint) const {
 
 bool AutoWhiteBalance::Process(const uint8_t* src, uint8_t* dst, int width, int height,
                                int srcStride, int dstStride) const {
-  if (!src || !dst || width <= 0 || height <= 0 || srcStride / 4 < width || dstStride / 4 < width) {
+  if (!DescribesBuffer(src, width, height, srcStride) ||
+      !DescribesBuffer(dst, width, height, dstStride)) {
     return false;
   }
   uint8_t blue[256], green[256], red[256];

@@ -197,6 +197,9 @@ TEST(AutoWhiteBalance, TakesExtremePositionsAndBlocksWithoutStraying) {
     EXPECT_EQ(awb.WhitePoint().r, 30);
   }
   EXPECT_FALSE(awb.SetWhitePointPos(image.data(), 4, 4, 12, 0, 0, 1));
+  // A buffer described as larger than INT_MAX bytes is not walked, nor are samples made for it.
+  EXPECT_FALSE(awb.BGR2YCbCr(image.data(), 65536, 65536, 262144));
+  EXPECT_FALSE(awb.SetWhitePointPos(image.data(), 65536, 65536, 262144, 0, 0, 1));
 
   // Blocks reaching outside the converted image are left as they are.
   ASSERT_TRUE(awb.BGR2YCbCr(image.data(), 4, 4, 16));
