@@ -478,7 +478,9 @@ void OnBuffers(FuzzedDataProvider& in, Arena& arena) {
       int histogram[768] = {};
       for (int i = 0; i < 768; i += 17) histogram[i] = in.ConsumeIntegral<int>();
       calThreshold(histogram, width, height, Real(in));
-      delete createTemperateColor(width, height);
+      // It allocates the image it returns: only sizes a run can afford, or ones that overflow.
+      const long double bytes = static_cast<long double>(width) * height * 4;
+      if (bytes <= kCap || bytes > UINT32_MAX) delete createTemperateColor(width, height);
       break;
     }
   }

@@ -27,8 +27,8 @@ TFX_API CxImage* vignetteAdjustFilter(CxImage* img, float amount, float feather,
 
 // Fills mask[y * width + x] with the vignette weight of each pixel: 1 inside the ellipse, a
 // raised cosine falling to 0 across the feather band, 0 beyond it. feather, size and roundness
-// are fractions (the percent values divided by 100). A null mask, or a width or height below 1,
-// does nothing.
+// are fractions (the percent values divided by 100). A null mask, a width or height below 1, or
+// a mask above INT_MAX bytes does nothing.
 TFX_API void generateGradient(int width, int height, float feather, float size, float roundness,
                               float* mask);
 

@@ -293,6 +293,8 @@ CxImage* vignetteAdjustFilter(CxImage* img, float amount, float feather, float h
 void generateGradient(int width, int height, float feather, float size, float roundness,
                       float* mask) {
   if (!mask || width <= 0 || height <= 0) return;
+  // No caller holds a mask above INT_MAX bytes.
+  if (static_cast<int64_t>(width) * height > INT_MAX / 4) return;
   const std::unique_ptr<float[]> quadrant =
       tfx::GradientQuadrant(width, height, feather, size, roundness);
   if (!quadrant) return;

@@ -223,4 +223,10 @@ TEST(AutoWhiteBalance, TakesExtremePositionsAndBlocksWithoutStraying) {
   EXPECT_EQ(awb.FindWhitePointBlock(image.data(), 12, 0, 0).width, 0);
 }
 
+TEST(GenerateGradient, LeavesMasksAboveIntMaxBytesAlone) {
+  std::vector<float> mask(16, -1.0f);
+  generateGradient(65536, 8192, 0.5f, 1.0f, 0.0f, mask.data());
+  EXPECT_EQ(mask, std::vector<float>(16, -1.0f));
+}
+
 }  // namespace
