@@ -523,13 +523,18 @@ void OnLattice(FuzzedDataProvider& in, Arena& arena) {
       const int width = Dim(in), height = Dim(in);
       const int bytesPerPixel = in.ConsumeIntegralInRange<int>(-1, 5);
       const int pitch = in.ConsumeBool() ? Times(width, bytesPerPixel) : Dim(in);
-      bool overflowed = false;
+      // Every row but the last is a pitch long; the last holds its pixels.
       const int64_t span = pitch < 0 ? -int64_t{pitch} : pitch;
-      const uint64_t bytes = Bytes(span, height, &overflowed);
-      uint8_t* pixels = arena.Buffer(bytes, 3, overflowed);
+      const bool none = width < 1 || height < 1 || bytesPerPixel < 1;
+      const long double need = none ? 0.0L
+                                    : static_cast<long double>(height - 1) * span +
+                                          static_cast<long double>(width) * bytesPerPixel;
+      const bool overflowed = need > INT_MAX;
+      uint8_t* pixels = arena.Buffer(overflowed ? 0 : static_cast<uint64_t>(need), 3, overflowed);
       if (!pixels) break;
       // A bottom-up image starts at its last row.
-      uint8_t* start = pitch < 0 && height > 0 && !overflowed ? pixels + bytes + pitch : pixels;
+      uint8_t* start =
+          pitch < 0 && height > 1 && !overflowed ? pixels + (height - 1) * span : pixels;
       lut->doLUT(in.ConsumeBool() ? start : nullptr, width, height, pitch, bytesPerPixel);
       break;
     }

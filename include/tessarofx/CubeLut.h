@@ -86,8 +86,8 @@ class TFX_API CubeLut {
   // red; further bytes (alpha) are left as they are. Rows start `pitch` bytes apart (negative for
   // bottom-up rows), each at least width * bytesPerPixel bytes long. Returns 23 without touching
   // the pixels when the size is outside 1..64; otherwise 0, and the pixels are left untouched
-  // when `pixels` is null, width or height is below 1, bytesPerPixel is below 3, or |pitch| is
-  // shorter than a row.
+  // when `pixels` is null, width or height is below 1, bytesPerPixel is below 3, |pitch| is
+  // shorter than a row, or the rows span more than INT_MAX bytes.
   int doLUT(unsigned char* pixels, int width, int height, int pitch, int bytesPerPixel);
 
   // A deep copy without the row table. The copy becomes the process-wide instance.

@@ -4,6 +4,7 @@
 #include "tessarofx/CubeLut.h"
 
 #include <algorithm>
+#include <climits>
 #include <cmath>
 #include <cstdint>
 #include <cstring>
@@ -74,7 +75,10 @@ int CubeLut::doLUT(unsigned char* pixels, int width, int height, int pitch, int 
   // Rows closer together than a row's bytes would run past the end of the caller's buffer; one
   // row needs no pitch at all.
   const int64_t rowBytes = int64_t{width} * bytesPerPixel;
-  if (height > 1 && (pitch < 0 ? -int64_t{pitch} : int64_t{pitch}) < rowBytes) return 0;
+  const int64_t span = pitch < 0 ? -int64_t{pitch} : int64_t{pitch};
+  if (height > 1 && span < rowBytes) return 0;
+  // Nor does any caller hold an image above INT_MAX bytes.
+  if ((height - 1) * span + rowBytes > INT_MAX) return 0;
   const tfx::TetraTable table{&lattice_[0][0][0][0], ft_, gt_, size_};
   for (int y = 0; y < height; ++y) {
     tfx::TetraRow(table, pixels + static_cast<ptrdiff_t>(y) * pitch, width, bytesPerPixel);

@@ -2,6 +2,7 @@
 // the library: the process-wide instance, and pixel arguments doLUT cannot use.
 #include <gtest/gtest.h>
 
+#include <climits>
 #include <cstdint>
 #include <memory>
 #include <vector>
@@ -54,9 +55,13 @@ TEST(CubeLutApply, LeavesPixelsAloneWhenItsArgumentsCannotDescribeThem) {
     int width, height, pitch, bytesPerPixel;
   };
   const Case cases[] = {
-      {"null pixels", true, 4, 2, 16, 4},           {"pitch below a row", false, 4, 2, 15, 4},
-      {"negative short pitch", false, 4, 2, -8, 4}, {"zero width", false, 0, 2, 16, 4},
-      {"two bytes a pixel", false, 4, 2, 16, 2},    {"negative width", false, -4, 2, 16, 4},
+      {"null pixels", true, 4, 2, 16, 4},
+      {"pitch below a row", false, 4, 2, 15, 4},
+      {"negative short pitch", false, 4, 2, -8, 4},
+      {"zero width", false, 0, 2, 16, 4},
+      {"two bytes a pixel", false, 4, 2, 16, 2},
+      {"negative width", false, -4, 2, 16, 4},
+      {"rows past INT_MAX bytes", false, 4, 3, INT_MAX / 2 + 1, 4},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.name);
