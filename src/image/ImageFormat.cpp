@@ -281,6 +281,8 @@ bool CxImage::SplitRGBA(CxImage* r, CxImage* g, CxImage* b, CxImage* a) {
   for (CxImage* plane : planes) {
     if (plane) plane->Create(width, height, 8, IPF_Gray8);
   }
+  // An empty size has no pixels, however many rows of none it claims.
+  if (width == 0 || height == 0) return true;
   for (unsigned long y = 0; y < height; ++y) {
     for (unsigned long x = 0; x < width; ++x) {
       const tagRGBQUAD c = GetPixelColor(x, y, true);
@@ -300,6 +302,8 @@ bool CxImage::SplitHSLA(CxImage* r, CxImage* g, CxImage* b, CxImage* a) {
   for (CxImage* plane : planes) {
     if (plane) plane->Create(width, height, 8, IPF_Gray8);
   }
+  // An empty size has no pixels, however many rows of none it claims.
+  if (width == 0 || height == 0) return true;
   for (unsigned long y = 0; y < height; ++y) {
     for (unsigned long x = 0; x < width; ++x) {
       const tagRGBQUAD c = GetPixelColor(x, y, true);

@@ -108,6 +108,11 @@ TEST(CxImageWrapping, NeverGrowsPastTheCallersBuffer) {
   EXPECT_FALSE(shortRows.SplitRGBA(&r, &g, &b, nullptr));
   EXPECT_FALSE(shortRows.SplitHSLA(&r, &g, &b, nullptr));
   EXPECT_EQ(r.GetWidth(), 4u);
+  // Rows of no pixels split at once into empty planes, however many rows the header claims.
+  CxImage noColumns(&bits, 0, UINT32_MAX, 32, 0, IPF_BGRA);
+  EXPECT_TRUE(noColumns.SplitRGBA(&r, &g, &b, nullptr));
+  EXPECT_TRUE(noColumns.SplitHSLA(&r, &g, &b, nullptr));
+  EXPECT_EQ(r.GetWidth(), 0u);
 }
 
 TEST(AdjustFunctions, LeaveInconsistentHeadersUntouched) {
