@@ -56,8 +56,9 @@ TFX_API bool mergeImage(unsigned char* dst, const unsigned char* src, int dstWid
                         int dstOpacity);
 
 // Copies the centred dstWidth x dstHeight block of `src` into `dst`. False for a null image, a
-// destination larger than the source, or a stride below the row it must hold (strides count in
-// whole pixels); true, copying nothing, for a destination size below 1.
+// destination larger than the source, a stride below the row it must hold (strides count in
+// whole pixels), or an image above INT_MAX bytes (stride * height); true, copying nothing, for a
+// destination size below 1.
 TFX_API bool clipOutBorder(const unsigned char* src, unsigned char* dst, int srcWidth,
                            int srcHeight, int srcStride, int dstWidth, int dstHeight,
                            int dstStride);

@@ -249,6 +249,9 @@ bool clipOutBorder(const unsigned char* src, unsigned char* dst, int srcWidth, i
   const int srcPitch = srcStride / 4;
   const int dstPitch = dstStride / 4;
   if (srcPitch < srcWidth || dstPitch < dstWidth) return false;
+  if (int64_t{srcStride} * srcHeight > INT_MAX || int64_t{dstStride} * dstHeight > INT_MAX) {
+    return false;
+  }
   const int top = (srcHeight - dstHeight) / 2;
   const int left = (srcWidth - dstWidth) / 2;
   for (int y = 0; y < dstHeight; ++y) {

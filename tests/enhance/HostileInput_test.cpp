@@ -108,6 +108,8 @@ TEST(Planes, AboveIntMaxBytesAreLeftAlone) {
   dct_Denosing(src.data(), dst.data(), 16, 3, INT_MAX / 2, 10.0f);
   EXPECT_EQ(dst, std::vector<uint8_t>(64, 7));
   EXPECT_EQ(calL(src.data(), dst.data(), 65536, 65536, 1.0f), nullptr);
+  EXPECT_FALSE(clipOutBorder(src.data(), dst.data(), 4, 3, INT_MAX / 2, 2, 2, 8));
+  EXPECT_EQ(dst, std::vector<uint8_t>(64, 7));
 }
 
 }  // namespace
