@@ -400,8 +400,10 @@ void OnBuffers(FuzzedDataProvider& in, Arena& arena) {
     case 14:
     case 15:
     case 16: {
+      // makeImageFrame takes a stride; scaleImage and blurImage read packed rows.
+      const int which = in.ConsumeIntegralInRange<int>(0, 2);
       const int bpp = in.PickValueInArray({32, 24, 8, 0, -32, 64});
-      const int stride = in.ConsumeBool() ? Times(width, 4) : Dim(in);
+      const int stride = which == 0 && in.ConsumeBool() ? Dim(in) : Times(width, 4);
       uint8_t* src = Plane(arena, in, stride, height, 1);
       if (!src) break;
       const int border = in.ConsumeBool() ? in.ConsumeIntegralInRange<int>(-2, 24) : Dim(in);
@@ -413,7 +415,6 @@ void OnBuffers(FuzzedDataProvider& in, Arena& arena) {
                              in.ConsumeIntegral<int>(), in.ConsumeIntegral<int>()};
       unsigned char* out = nullptr;
       int outWidth = 0, outHeight = 0;
-      const int which = in.ConsumeIntegralInRange<int>(0, 2);
       if (which == 0) {
         makeImageFrame(&out, &outWidth, &outHeight, src, width, height, stride, bpp, colour,
                        border);
