@@ -133,7 +133,8 @@ void MakeImage(FuzzedDataProvider& in, Arena& arena, ImageHolder* holder) {
     case 2: {
       // Create allocates what the header says; only sizes that cannot be, or small ones, are
       // asked for.
-      const long double bytes = (static_cast<long double>(bpp) * width + 31) / 8 * height;
+      const uint64_t row = ((uint64_t{bpp} * width + 31) >> 3) & ~uint64_t{3};
+      const long double bytes = static_cast<long double>(row) * height;
       if (bytes > kCap && bytes <= UINT32_MAX) return;
       holder->image.reset(new CxImage());
       holder->image->Create(width, height, bpp, format);
