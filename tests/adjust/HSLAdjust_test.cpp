@@ -7,7 +7,6 @@
 #include <cstdint>
 #include <cstdlib>
 #include <string>
-#include <thread>
 #include <vector>
 
 #include "support/EveryTarget.h"
@@ -220,30 +219,6 @@ TEST(HSLAdjust, LeavesWhatNoBandTouchesExactlyAlone) {
   EXPECT_EQ(hslAdjustment(nullptr, kEveryBand), nullptr);
   EXPECT_EQ(hslAdjustment(&empty, kEveryBand), &empty);
   EXPECT_EQ(hslAdjustment(&headerOnly, kEveryBand), &headerOnly);
-}
-
-TEST(HSLAdjust, ThreadsWithDifferentSettingsKeepTheirOwnTables) {
-  const Image source = NoiseImage(128, 32, 32, IPF_BGRA, 512, 12);
-  const HSLBands* settings[2] = {&kEveryBand, &kRedOnly};
-  Image expected[2];
-  for (int t = 0; t < 2; ++t) {
-    expected[t] = Clone(*source);
-    hslAdjustment(expected[t].get(), *settings[t]);
-  }
-  bool same[2] = {true, true};
-  std::thread threads[2];
-  for (int t = 0; t < 2; ++t) {
-    threads[t] = std::thread([&, t] {
-      for (int round = 0; round < 30; ++round) {
-        const Image image = Clone(*source);
-        hslAdjustment(image.get(), *settings[(t + round) % 2]);
-        same[t] = same[t] && SameBuffer(*expected[(t + round) % 2], *image);
-      }
-    });
-  }
-  for (std::thread& t : threads) t.join();
-  EXPECT_TRUE(same[0]);
-  EXPECT_TRUE(same[1]);
 }
 
 }  // namespace

@@ -2,11 +2,9 @@
 
 #include <gtest/gtest.h>
 
-#include <atomic>
 #include <cmath>
 #include <cstdint>
 #include <cstring>
-#include <thread>
 #include <vector>
 
 #include "adjust/LensMaps.h"
@@ -192,37 +190,6 @@ TEST(LensCache, ReusesMapsUntilStrengthSizeOrReleaseChanges) {
   EXPECT_NE(tfx::FringingMaps(10.0f, 40, 30), fringing);
   EXPECT_EQ(builds(), 7u);
   EXPECT_EQ(changed->plane[0][0].x, ReferenceDistortMap(10.5f, 40, 30)[0].x);
-}
-
-TEST(LensCache, FiltersOnTwoThreadsGetTheSingleThreadedResults) {
-  // Four settings over two threads keep evicting each other's maps, and one thread keeps
-  // releasing them; every frame must still come out as it does alone.
-  const struct {
-    unsigned width, height;
-    float distortion, fringing;
-  } jobs[] = {{64, 40, 30, 45}, {64, 40, -20, -60}, {48, 36, 80, 15}, {80, 50, -75, 90}};
-  std::vector<Image> inputs, expected;
-  releaseLensVariables();
-  for (const auto& job : jobs) {
-    inputs.push_back(NoiseImage(job.width, job.height, 32, IPF_BGRA, job.width * 4, job.width));
-    expected.push_back(Clone(*inputs.back()));
-    fringingFilter(distortFilter(expected.back().get(), job.distortion), job.fringing);
-  }
-  constexpr int kIterations = 300;
-  std::atomic<int> mismatches{0};
-  const auto worker = [&](int firstJob, bool release) {
-    for (int i = 0; i < kIterations; ++i) {
-      const int j = firstJob + i % 2;
-      const Image frame = Clone(*inputs[j]);
-      fringingFilter(distortFilter(frame.get(), jobs[j].distortion), jobs[j].fringing);
-      if (!SameBuffer(*expected[j], *frame)) ++mismatches;
-      if (release && i % 16 == 15) releaseLensVariables();
-    }
-  };
-  std::thread a(worker, 0, false), b(worker, 2, true);
-  a.join();
-  b.join();
-  EXPECT_EQ(mismatches.load(), 0);
 }
 
 }  // namespace

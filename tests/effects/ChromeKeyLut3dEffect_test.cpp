@@ -1,7 +1,6 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <thread>
 #include <vector>
 
 #include "lut/ChromeKeyLut3dGenerator.h"
@@ -109,25 +108,6 @@ TEST(ChromeKeyLut3dEffect, RebuildsOnlyTheTablesAChangeAffects) {
   NLEComPtr<INLECGFilter> fresh = GreenKey(1);
   SetParam(fresh.get(), L"green", 180);
   EXPECT_EQ(RunFrame(fresh.get()), beautyAfterKey);
-}
-
-// Filters on different threads each build their own tables (and construct their CubeLuts, which
-// registers them as the process-wide instance) without disturbing one another.
-TEST(ChromeKeyLut3dEffect, FiltersOnTwoThreadsGiveTheirSingleThreadedResults) {
-  const std::vector<uint8_t> mask = RunFrame(GreenKey(0).get());
-  const std::vector<uint8_t> beauty = RunFrame(GreenKey(1).get());
-  std::vector<uint8_t> results[2][3];
-  std::thread threads[2];
-  for (int t = 0; t < 2; ++t) {
-    threads[t] = std::thread([t, &results] {
-      for (int frame = 0; frame < 3; ++frame) results[t][frame] = RunFrame(GreenKey(t).get());
-    });
-  }
-  for (std::thread& thread : threads) thread.join();
-  for (int frame = 0; frame < 3; ++frame) {
-    EXPECT_EQ(results[0][frame], mask);
-    EXPECT_EQ(results[1][frame], beauty);
-  }
 }
 
 }  // namespace

@@ -19,6 +19,7 @@
 #include "tessarofx/CxImage.h"
 #include "tessarofx/Denoise.h"
 #include "tessarofx/DetailFilters.h"
+#include "tessarofx/HSLAdjust.h"
 #include "tessarofx/HueAdjust.h"
 #include "tessarofx/LensAdjust.h"
 #include "tessarofx/WhiteBalance.h"
@@ -165,6 +166,16 @@ std::vector<Job> Jobs(const std::wstring& cube) {
   image("clarity", 28, 28, [](CxImage* i) { clarity(i, -30.0f); });
   image("diffuse", 33, 21, [](CxImage* i) { diffuse(i, 120.0f); });
   image("addNoiseFilter", 27, 13, [](CxImage* i) { addNoiseFilter(i, 30.0f, 0.5f); });
+  image("hslAdjustment", 29, 11, [](CxImage* i) {
+    HSLBands bands{};
+    bands.band[0] = HSLBandValues{40.0f, -30.0f, 10.0f, 20.0f, 50.0f};
+    hslAdjustment(i, bands);
+  });
+  // Releasing the lens maps while other threads build and read them.
+  image("distortFilter and releaseLensVariables", 31, 17, [](CxImage* i) {
+    distortFilter(i, -15.0f);
+    releaseLensVariables();
+  });
 
   const auto buffer = [&](const char* name, size_t bytes, std::function<void(uint8_t*)> fn) {
     jobs.push_back({name, [=] { return RunOnBuffer(bytes, static_cast<unsigned>(bytes), fn); }});
