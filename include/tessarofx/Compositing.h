@@ -31,7 +31,7 @@ TFX_API bool reMallocImage(unsigned char** buffer, int width, int height, int by
 // outline does not reach, and elsewhere gets the colour with alpha scaled by the outline's
 // coverage (0 in the outermost `border` pixels). Border 0 copies the source. Returns 1, or 0 for a
 // null pointer, bits per pixel other than 32, a negative border, a size below 1, a stride below
-// width * 4, an output or mask above INT_MAX bytes, or no memory.
+// width * 4, a source (stride * height), output or mask above INT_MAX bytes, or no memory.
 TFX_API int makeImageFrame(unsigned char** out, int* outWidth, int* outHeight,
                            const unsigned char* src, int width, int height, int stride, int bpp,
                            PIPNLERGB color, int border);

@@ -70,6 +70,7 @@ int makeImageFrame(unsigned char** out, int* outWidth, int* outHeight, const uns
                    int width, int height, int stride, int bpp, PIPNLERGB color, int border) {
   if (!out || !outWidth || !outHeight || !src || bpp != 32 || border < 0) return 0;
   if (width < 1 || height < 1 || stride < RowBytes(width)) return 0;
+  if (int64_t{stride} * height > INT_MAX) return 0;  // no caller holds such a source
   if (border == 0) {
     if (!FitsInt(width, height, 4)) return 0;
     if (!KeepOrResize(out, outWidth, outHeight, width, height)) return 0;

@@ -109,6 +109,12 @@ TEST(Planes, AboveIntMaxBytesAreLeftAlone) {
   EXPECT_EQ(dst, std::vector<uint8_t>(64, 7));
   EXPECT_EQ(calL(src.data(), dst.data(), 65536, 65536, 1.0f), nullptr);
   EXPECT_FALSE(clipOutBorder(src.data(), dst.data(), 4, 3, INT_MAX / 2, 2, 2, 8));
+  unsigned char* frame = nullptr;
+  int frameWidth = 0, frameHeight = 0;
+  EXPECT_EQ(makeImageFrame(&frame, &frameWidth, &frameHeight, src.data(), 2, 3, INT_MAX / 2, 32,
+                           PIPNLERGB{1, 2, 3, 255}, 1),
+            0);
+  delete[] frame;
   EXPECT_EQ(dst, std::vector<uint8_t>(64, 7));
 }
 
