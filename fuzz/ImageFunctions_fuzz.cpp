@@ -484,8 +484,12 @@ void OnBuffers(FuzzedDataProvider& in, Arena& arena) {
       for (int i = 0; i < 768; i += 17) histogram[i] = in.ConsumeIntegral<int>();
       calThreshold(histogram, width, height, Real(in));
       // It allocates the image it returns: only sizes a run can afford, or ones that overflow.
-      const long double bytes = static_cast<long double>(width) * height * 4;
-      if (bytes <= kCap || bytes > UINT32_MAX) delete createTemperateColor(width, height);
+      // 24-bit rows padded to 4 bytes, as Create makes them.
+      const long double bytes =
+          static_cast<long double>((int64_t{width} * 24 + 31) / 32 * 4) * height;
+      if (width < 1 || height < 1 || bytes <= kCap || bytes > UINT32_MAX) {
+        delete createTemperateColor(width, height);
+      }
       break;
     }
   }
