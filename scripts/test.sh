@@ -1,7 +1,8 @@
 #!/usr/bin/env bash
 # Sets the machine up, then builds and runs every test: a format check, the release build with
-# its unit and tool tests, the same suite under AddressSanitizer + UndefinedBehaviorSanitizer, and
-# the LUT reader's fuzz target over its corpus and then for a bounded time.
+# its unit, stress and tool tests, the same suite under AddressSanitizer +
+# UndefinedBehaviorSanitizer, the frame-parallel stress test under ThreadSanitizer, and each
+# libFuzzer target over its corpus and then for a bounded time.
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
@@ -22,15 +23,34 @@ cmake --preset asan-ubsan
 cmake --build --preset asan-ubsan -j "$jobs"
 ctest --preset asan-ubsan -j "$jobs"
 
-echo "== fuzz: LUT files (libFuzzer, ASan + UBSan; corpus replay, then 30 s)"
+echo "== stress test under ThreadSanitizer"
+cmake --preset tsan
+cmake --build --preset tsan -j "$jobs"
+ctest --preset tsan
+
+echo "== fuzz (libFuzzer, ASan + UBSan): each target replays its corpus, then runs for 30 s"
 cmake --preset fuzz
 cmake --build --preset fuzz -j "$jobs"
-fuzzer=build/fuzz/bin/CubeLutLoad_fuzz
 mkdir -p build/fuzz/artifacts
-"$fuzzer" -artifact_prefix=build/fuzz/artifacts/ fuzz/corpus/*
-# New inputs go to a scratch copy of the corpus, so the checkout stays as it is.
+# New inputs go to scratch copies of the corpora, so the checkout stays as it is.
 scratch=$(mktemp -d)
 trap 'rm -rf "$scratch"' EXIT
-cp fuzz/corpus/* "$scratch"/
-"$fuzzer" -max_total_time=30 -timeout=10 -print_final_stats=1 \
-  -artifact_prefix=build/fuzz/artifacts/ "$scratch"
+fuzz() {
+  local target=$1
+  local fuzzer=build/fuzz/bin/${target}_fuzz
+  "$fuzzer" -runs=0 -rss_limit_mb=4096 -artifact_prefix="build/fuzz/artifacts/$target-" fuzz/corpus/"$target" \
+    >"$scratch/$target-replay.log" 2>&1 || { tail -n 80 "$scratch/$target-replay.log"; return 1; }
+  mkdir "$scratch/$target"
+  cp fuzz/corpus/"$target"/* "$scratch/$target"/
+  "$fuzzer" -max_total_time=30 -timeout=20 -rss_limit_mb=4096 -print_final_stats=1 \
+    -artifact_prefix="build/fuzz/artifacts/$target-" "$scratch/$target" \
+    >"$scratch/$target.log" 2>&1 || { tail -n 80 "$scratch/$target.log"; return 1; }
+  echo "$target: replayed $(ls fuzz/corpus/"$target" | wc -l) inputs; $(grep -E '^#[0-9]+ +DONE' "$scratch/$target.log")"
+}
+# Two at a time, one a core.
+status=0
+fuzz CubeLutLoad & first=$!
+fuzz PluginFrames || status=1
+wait "$first" || status=1
+fuzz ImageFunctions || status=1
+exit "$status"
