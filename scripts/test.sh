@@ -45,7 +45,9 @@ fuzz() {
   "$fuzzer" -max_total_time=30 -timeout=20 -rss_limit_mb=4096 -print_final_stats=1 \
     -artifact_prefix="build/fuzz/artifacts/$target-" "$scratch/$target" \
     >"$scratch/$target.log" 2>&1 || { tail -n 80 "$scratch/$target.log"; return 1; }
-  echo "$target: replayed $(ls fuzz/corpus/"$target" | wc -l) inputs; $(grep -E '^#[0-9]+ +DONE' "$scratch/$target.log")"
+  echo "$target: replayed $(ls fuzz/corpus/"$target" | wc -l) inputs, clean; then" \
+    "$(grep -E '^Done [0-9]+ runs' "$scratch/$target.log"), no crash;" \
+    "$(grep -E '^#[0-9]+[[:space:]]+DONE' "$scratch/$target.log" | grep -oE 'cov: [0-9]+ ft: [0-9]+')"
 }
 # Two at a time, one a core.
 status=0
