@@ -44,12 +44,12 @@ struct Arena {
 
   // `bytes` bytes of a pattern, or a 16-byte block for a size that cannot be, or null when the
   // size is real but too large for a fuzz run.
-  uint8_t* Buffer(uint64_t bytes, uint8_t seed, bool overflowed) {
+  uint8_t* Buffer(uint64_t bytes, uint8_t salt, bool overflowed) {
     if (!overflowed && bytes > kCap) return nullptr;
     const uint64_t n = overflowed ? 16 : bytes;
     blocks.emplace_back(new uint8_t[n ? n : 1]);
     uint8_t* p = blocks.back().get();
-    for (uint64_t i = 0; i < n; ++i) p[i] = static_cast<uint8_t>(seed + i * 31 + (i >> 5));
+    for (uint64_t i = 0; i < n; ++i) p[i] = static_cast<uint8_t>(salt + i * 31 + (i >> 5));
     return p;
   }
 };

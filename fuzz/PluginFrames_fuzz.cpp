@@ -124,8 +124,8 @@ NLEComPtr<INLEMemoryFrame> Frame(FuzzedDataProvider& in) {
   NLEComPtr<INLEFrameBuffer> buffer;
   if (pixels && NLE_SUCCEEDED(frame->GetBuffer(&buffer)) && buffer) {
     const int32_t bytes = buffer->GetSize();
-    const uint8_t seed = in.ConsumeIntegral<uint8_t>();
-    for (int32_t i = 0; i < bytes; ++i) pixels[i] = static_cast<uint8_t>(seed + i * 29 + i / 7);
+    const uint8_t salt = in.ConsumeIntegral<uint8_t>();
+    for (int32_t i = 0; i < bytes; ++i) pixels[i] = static_cast<uint8_t>(salt + i * 29 + i / 7);
   }
   return frame;
 }

@@ -14,6 +14,7 @@
 #include <vector>
 
 #include "support/EffectHarness.h"
+#include "support/ImageBuilders.h"
 #include "tessarofx/Blur.h"
 #include "tessarofx/Compositing.h"
 #include "tessarofx/CxImage.h"
@@ -34,14 +35,6 @@ struct Job {
   std::function<Bytes()> run;
 };
 
-void Fill(uint8_t* p, size_t n, unsigned seed) {
-  uint32_t x = seed * 2654435761u + 1;
-  for (size_t i = 0; i < n; ++i) {
-    x = x * 1664525u + 1013904223u;
-    p[i] = static_cast<uint8_t>(x >> 24);
-  }
-}
-
 // Frames through one filter object; between frames one parameter changes, as a host's keyframes
 // change it.
 Bytes RunFilter(const wchar_t* guid, EffectParams params, int width, int height, int padding,
@@ -57,8 +50,8 @@ Bytes RunFilter(const wchar_t* guid, EffectParams params, int width, int height,
     TestFrame* bg = new TestFrame(width, height);
     TestFrame* dst = new TestFrame(width, height, width * 4 + padding, false, 7);
     NLEComPtr<INLEFrame> h1(fg), h2(bg), h3(dst);
-    Fill(fg->pixels.data(), fg->pixels.size(), static_cast<unsigned>(frame * 31 + width));
-    Fill(bg->pixels.data(), bg->pixels.size(), static_cast<unsigned>(frame + height));
+    tfx_test::FillRandom(fg, static_cast<unsigned>(frame * 31 + width));
+    tfx_test::FillRandom(bg, static_cast<unsigned>(frame + height));
     filter->SetForeground(fg);
     if (mask) filter->SetBackground(bg);
     EXPECT_EQ(filter->Running(dst), NLE_S_OK);
@@ -68,16 +61,16 @@ Bytes RunFilter(const wchar_t* guid, EffectParams params, int width, int height,
 }
 
 // A function on a 32-bit BGRA image of its own.
-Bytes RunOnImage(int width, int height, unsigned seed, const std::function<void(CxImage*)>& fn) {
-  CxImage image(static_cast<unsigned>(width), static_cast<unsigned>(height), 32, IPF_BGRA);
-  Fill(image.GetBits(), image.GetSize(), seed);
-  fn(&image);
-  return Bytes(image.GetBits(), image.GetBits() + image.GetSize());
+Bytes RunOnImage(int width, int height, uint32_t salt, const std::function<void(CxImage*)>& fn) {
+  const tfx_test::Image image =
+      tfx_test::NoiseImage(static_cast<unsigned>(width), static_cast<unsigned>(height), 32,
+                           IPF_BGRA, static_cast<unsigned>(width) * 4, salt);
+  fn(image.get());
+  return Bytes(image->GetBits(), image->GetBits() + image->GetSize());
 }
 
-Bytes RunOnBuffer(size_t bytes, unsigned seed, const std::function<void(uint8_t*)>& fn) {
-  Bytes buffer(bytes);
-  Fill(buffer.data(), buffer.size(), seed);
+Bytes RunOnBuffer(size_t bytes, uint32_t salt, const std::function<void(uint8_t*)>& fn) {
+  Bytes buffer = tfx_test::NoiseBytes(bytes, salt);
   fn(buffer.data());
   return buffer;
 }
@@ -145,14 +138,14 @@ std::vector<Job> Jobs(const std::wstring& cube) {
                     TestFrame* fg = new TestFrame(35, 18);
                     TestFrame* dst = new TestFrame(35, 18);
                     NLEComPtr<INLEFrame> h1(fg), h2(dst);
-                    Fill(fg->pixels.data(), fg->pixels.size(), 5);
+                    tfx_test::FillRandom(fg, 5);
                     f->SetForeground(fg);
                     EXPECT_EQ(f->Running(dst), NLE_S_OK);
                     return dst->pixels;
                   }});
 
   const auto image = [&](const char* name, int w, int h, std::function<void(CxImage*)> fn) {
-    jobs.push_back({name, [=] { return RunOnImage(w, h, static_cast<unsigned>(w * h), fn); }});
+    jobs.push_back({name, [=] { return RunOnImage(w, h, static_cast<uint32_t>(w * h), fn); }});
   };
   image("hueAdjustment a", 41, 9, [](CxImage* i) { hueAdjustment(i, 40.0f); });
   image("hueAdjustment b", 23, 17, [](CxImage* i) { hueAdjustment(i, -70.0f); });
@@ -178,7 +171,7 @@ std::vector<Job> Jobs(const std::wstring& cube) {
   });
 
   const auto buffer = [&](const char* name, size_t bytes, std::function<void(uint8_t*)> fn) {
-    jobs.push_back({name, [=] { return RunOnBuffer(bytes, static_cast<unsigned>(bytes), fn); }});
+    jobs.push_back({name, [=] { return RunOnBuffer(bytes, static_cast<uint32_t>(bytes), fn); }});
   };
   buffer("gaussianBlur", 36 * 20 * 4, [](uint8_t* p) { gaussianBlur(p, 36, 20, 4, 5); });
   buffer("fastAverageBlur", 30 * 25 * 3, [](uint8_t* p) { fastAverageBlur(p, 30, 25, 3, 4); });
