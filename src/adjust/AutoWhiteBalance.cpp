@@ -9,6 +9,7 @@
 #include <new>
 #include <vector>
 
+#include "base/ByteLimits.h"
 #include "tessarofx/WhiteBalance.h"
 
 namespace {
@@ -31,11 +32,10 @@ uint8_t RoundToByte(float v) {
 
 // A caller's block lies inside the converted image (width x height) and holds pixels; in 64 bits,
 // as x + width may pass INT_MAX.
-// A BGRA buffer of `height` rows `stride` bytes apart, each holding `width` pixels, no larger than
-// INT_MAX bytes: no caller holds more, and the sample arrays of a larger one would not fit.
+// A BGRA buffer of `height` rows `stride` bytes apart, each holding `width` pixels, within the
+// library's byte limit.
 bool DescribesBuffer(const uint8_t* bgra, int width, int height, int stride) {
-  return bgra && width > 0 && height > 0 && stride / 4 >= width &&
-         static_cast<int64_t>(stride) * height <= INT_MAX;
+  return bgra && width > 0 && height > 0 && stride / 4 >= width && tfx::FitsInt(stride, height, 1);
 }
 
 bool InsideImage(const WhitePointinfo* block, int width, int height) {

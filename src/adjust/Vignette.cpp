@@ -16,6 +16,7 @@
 #include <vector>
 
 #include "adjust/VignetteRows.h"
+#include "base/ByteLimits.h"
 #include "image/ImageLayout.h"
 
 namespace tfx {
@@ -293,8 +294,7 @@ CxImage* vignetteAdjustFilter(CxImage* img, float amount, float feather, float h
 void generateGradient(int width, int height, float feather, float size, float roundness,
                       float* mask) {
   if (!mask || width <= 0 || height <= 0) return;
-  // No caller holds a mask above INT_MAX bytes.
-  if (static_cast<int64_t>(width) * height > INT_MAX / 4) return;
+  if (!tfx::FitsInt(width, height, sizeof(float))) return;
   const std::unique_ptr<float[]> quadrant =
       tfx::GradientQuadrant(width, height, feather, size, roundness);
   if (!quadrant) return;

@@ -15,6 +15,7 @@
 #include <memory>
 #include <new>
 
+#include "base/ByteLimits.h"
 #include "enhance/ImagePrimitives.h"
 
 namespace {
@@ -23,10 +24,6 @@ namespace {
 int64_t RowBytes(int64_t width) { return (width * 32 + 31) / 32 * 4; }
 
 // width x height x bytesPerPixel (all at least 1) fits in an int.
-bool FitsInt(int64_t width, int64_t height, int64_t bytesPerPixel) {
-  return width <= INT_MAX && height <= INT_MAX && width * height <= INT_MAX / bytesPerPixel;
-}
-
 using Mask = std::unique_ptr<unsigned char[]>;
 
 Mask ZeroedMask(int64_t bytes) { return Mask(new (std::nothrow) unsigned char[bytes]()); }
@@ -59,7 +56,7 @@ BlendWeights Weights(int sourceAlpha, int destAlpha, int sourceOpacity, int dest
 
 bool reMallocImage(unsigned char** buffer, int width, int height, int bytesPerPixel) {
   if (!buffer || width < 1 || height < 1 || bytesPerPixel < 1) return false;
-  if (!FitsInt(width, height, bytesPerPixel)) return false;
+  if (!tfx::FitsInt(width, height, bytesPerPixel)) return false;
   unsigned char* old = *buffer;
   delete[] old;
   *buffer = new (std::nothrow) unsigned char[int64_t{width} * height * bytesPerPixel]();
@@ -70,9 +67,9 @@ int makeImageFrame(unsigned char** out, int* outWidth, int* outHeight, const uns
                    int width, int height, int stride, int bpp, PIPNLERGB color, int border) {
   if (!out || !outWidth || !outHeight || !src || bpp != 32 || border < 0) return 0;
   if (width < 1 || height < 1 || stride < RowBytes(width)) return 0;
-  if (int64_t{stride} * height > INT_MAX) return 0;  // no caller holds such a source
+  if (!tfx::FitsInt(stride, height, 1)) return 0;
   if (border == 0) {
-    if (!FitsInt(width, height, 4)) return 0;
+    if (!tfx::FitsInt(width, height, 4)) return 0;
     if (!KeepOrResize(out, outWidth, outHeight, width, height)) return 0;
     return ippiCopy_8u_C4R(src, stride, *out, width * 4, {width, height}) < 0 ? 0 : 1;
   }
@@ -82,7 +79,7 @@ int makeImageFrame(unsigned char** out, int* outWidth, int* outHeight, const uns
   const int64_t h4 = int64_t{height} + 4 * int64_t{b};
   const int64_t w2 = int64_t{width} + 2 * int64_t{b};
   const int64_t h2 = int64_t{height} + 2 * int64_t{b};
-  if (!FitsInt(w4, h4, 1) || !FitsInt(w2, h2, 4)) return 0;
+  if (!tfx::FitsInt(w4, h4, 1) || !tfx::FitsInt(w2, h2, 4)) return 0;
   const int W4 = static_cast<int>(w4);
   const int W2 = static_cast<int>(w2);
   const int H2 = static_cast<int>(h2);
@@ -151,7 +148,7 @@ int scaleImage(unsigned char** out, int* outWidth, int* outHeight, const unsigne
   if (width < 1 || height < 1) return 0;
   const int64_t w = int64_t{width} + 2 * int64_t{border};
   const int64_t h = int64_t{height} + 2 * int64_t{border};
-  if (!FitsInt(w, h, 4)) return 0;
+  if (!tfx::FitsInt(w, h, 4)) return 0;
   const int W = static_cast<int>(w);
   const int H = static_cast<int>(h);
   const int b = border;
@@ -196,7 +193,8 @@ bool mergeImage(unsigned char* dst, const unsigned char* src, int dstWidth, int 
   if (srcOpacity < 0 || srcOpacity > 100 || dstOpacity < 0 || dstOpacity > 100) return true;
   // Images above INT_MAX bytes are refused, as everywhere in this file; a destination far beyond
   // that would also take its row offsets past 64 bits.
-  if (!FitsInt(dstWidth, dstHeight, 4) || int64_t{srcStride} * srcHeight > INT_MAX) return true;
+  if (!tfx::FitsInt(dstWidth, dstHeight, 4) || int64_t{srcStride} * srcHeight > INT_MAX)
+    return true;
 
   // A negative destination position clips the block and moves its source origin along.
   const int64_t clipX = std::min(dstX, 0);
@@ -250,9 +248,8 @@ bool clipOutBorder(const unsigned char* src, unsigned char* dst, int srcWidth, i
   const int srcPitch = srcStride / 4;
   const int dstPitch = dstStride / 4;
   if (srcPitch < srcWidth || dstPitch < dstWidth) return false;
-  if (int64_t{srcStride} * srcHeight > INT_MAX || int64_t{dstStride} * dstHeight > INT_MAX) {
+  if (!tfx::FitsInt(srcStride, srcHeight, 1) || !tfx::FitsInt(dstStride, dstHeight, 1))
     return false;
-  }
   const int top = (srcHeight - dstHeight) / 2;
   const int left = (srcWidth - dstWidth) / 2;
   for (int y = 0; y < dstHeight; ++y) {
@@ -265,11 +262,11 @@ bool clipOutBorder(const unsigned char* src, unsigned char* dst, int srcWidth, i
 int blurImage(unsigned char** out, int* outWidth, int* outHeight, const unsigned char* src,
               int width, int height, int bpp, int radius) {
   if (!out || !outWidth || !outHeight || !src || bpp != 32) return 0;
-  if (width < 1 || height < 1 || radius < 0 || !FitsInt(width, height, 4)) return 0;
+  if (width < 1 || height < 1 || radius < 0 || !tfx::FitsInt(width, height, 4)) return 0;
   const int64_t w = int64_t{width} + 2 * int64_t{radius};
   const int64_t h = int64_t{height} + 2 * int64_t{radius};
   // The temporary is another radius wider on every side.
-  if (!FitsInt(w + 2 * int64_t{radius}, h + 2 * int64_t{radius}, 4)) return 0;
+  if (!tfx::FitsInt(w + 2 * int64_t{radius}, h + 2 * int64_t{radius}, 4)) return 0;
   const int W = static_cast<int>(w);
   const int H = static_cast<int>(h);
   const int r = radius;

@@ -1,10 +1,10 @@
 // The sliding 8 x 8 DCT denoiser and its colour forms. The transforms themselves live in
 // simd/dct8_hwy.cpp; this file checks arguments, keeps the unfiltered border and splits images
 // into planes.
-#include <climits>
 #include <cstdint>
 #include <cstring>
 
+#include "base/ByteLimits.h"
 #include "simd/dct8.h"
 #include "tessarofx/Denoise.h"
 
@@ -26,8 +26,7 @@ void DCT8X82DR(const float* rows, float* out) {
 void dct_Denosing(const unsigned char* src, unsigned char* dst, int width, int height, int stride,
                   float sigma) {
   if (!src || !dst || width < 1 || height < 1 || stride < width) return;
-  // No caller holds a plane above INT_MAX bytes; its row offsets would only wrap.
-  if (int64_t{stride} * height > INT_MAX) return;
+  if (!tfx::FitsInt(stride, height, 1)) return;
   // 3 * sigma rounds to the same float whether formed in float or in double.
   const float threshold = 3.0f * sigma;
   const bool blocks = width > 8 && height > 8;

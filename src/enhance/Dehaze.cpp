@@ -11,6 +11,7 @@
 #include <memory>
 #include <new>
 
+#include "base/ByteLimits.h"
 #include "enhance/DetailImage.h"
 #include "simd/detail_rows.h"
 #include "tessarofx/Blur.h"
@@ -163,8 +164,7 @@ unsigned char* calL(const unsigned char* dark, const unsigned char* mean, int wi
                     float factor) {
   if (!dark || !mean || width < 1 || height < 1) return nullptr;
   const size_t count = static_cast<size_t>(width) * static_cast<size_t>(height);
-  // No caller holds planes above INT_MAX bytes.
-  if (count > static_cast<size_t>(INT_MAX)) return nullptr;
+  if (!tfx::FitsInt(width, height, 1)) return nullptr;
   uint8_t* out = new (std::nothrow) uint8_t[count];
   if (!out) return nullptr;
   uint8_t scaled[256];

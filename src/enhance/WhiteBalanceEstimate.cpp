@@ -11,15 +11,14 @@
 #include <cstring>
 #include <limits>
 
+#include "base/ByteLimits.h"
+
 namespace {
 
-// Pixels in a width x height image, or 0 when either side is below 1.
-// 0 for a size below 1 or an image above INT_MAX bytes: no caller holds such a buffer, and its
-// byte count would wrap the arithmetic that walks it.
+// Pixels in a width x height image; 0 for a size below 1 or an image above INT_MAX bytes.
 size_t PixelCount(int width, int height) {
-  if (width < 1 || height < 1) return 0;
-  const size_t count = static_cast<size_t>(width) * static_cast<size_t>(height);
-  return count > static_cast<size_t>(INT_MAX) / 4 ? 0 : count;
+  if (width < 1 || height < 1 || !tfx::FitsInt(width, height, 4)) return 0;
+  return static_cast<size_t>(width) * static_cast<size_t>(height);
 }
 
 struct Means {
