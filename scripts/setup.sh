@@ -12,6 +12,10 @@ packages=(
   libgtest-dev libgmock-dev googletest
   libbenchmark-dev
   libopencolorio-dev
+  frei0r-plugins-dev
+  ffmpeg melt gstreamer1.0-tools gstreamer1.0-plugins-base gstreamer1.0-plugins-good
+  gstreamer1.0-plugins-bad
+  dpkg-dev file
 )
 
 missing=()

@@ -36,7 +36,7 @@ class NLE3dlutAToWhiteEffect final : public NLEDynamicEffect {
   }
 };
 
-const NLE3dlutAToWhiteEffect::_auto_register s_register(L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356",
+const NLE3dlutAToWhiteEffect::_auto_register s_register(tfx::catalog::kAToWhite.wideGuid,
                                                         L"lutAToWhiteEffect",
                                                         &NLE3dlutAToWhiteEffect::create);
 

@@ -46,7 +46,7 @@ class NLEChromeKeyCombineEffect final : public NLEDynamicEffect {
   }
 };
 
-const NLEChromeKeyCombineEffect::_auto_register s_register(L"41AA934B-757A-4EAD-8F7B-85E2E2952B6A",
+const NLEChromeKeyCombineEffect::_auto_register s_register(tfx::catalog::kChromeKeyCombine.wideGuid,
                                                            L"ChromeKeyCombine",
                                                            &NLEChromeKeyCombineEffect::create);
 

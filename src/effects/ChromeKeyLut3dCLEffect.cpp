@@ -22,11 +22,12 @@ class NLEChromeKeyLut3dCLEffect final : public NLEBasicCrossFilter {
 
   HRESULT RunEffect(OPENCL::openclMemory* src, OPENCL::openclMemory* dst) override {
     if (!src) return NLE_E_INVALIDARG;
-    const int red = ParamInt(L"red");
-    const int blue = ParamInt(L"blue");
-    const int green = ParamInt(L"green");
-    const double contrast = ParamDouble(L"contrast", 50.0);
-    const double offset = ParamDouble(L"offset", 0.0);
+    using namespace tfx::catalog::chroma_key;
+    const int red = ParamInt(kRed);
+    const int blue = ParamInt(kBlue);
+    const int green = ParamInt(kGreen);
+    const double contrast = ParamDouble(kContrast);
+    const double offset = ParamDouble(kOffset);
     const ChromeKeyTables::Rebuilt rebuilt =
         tables_.KeepCurrent(red, green, blue, contrast, offset);
     if (rebuilt.beauty) createTableMemoryRGB();
@@ -34,7 +35,7 @@ class NLEChromeKeyLut3dCLEffect final : public NLEBasicCrossFilter {
 
     // Any other mode keeps the table an earlier frame chose. The buffers are bound afresh, as a
     // rebuild since then has replaced them; before any choice there is nothing to run.
-    const int mode = ParamInt(L"mode");
+    const int mode = ParamInt(kMode);
     if (mode == 0 || mode == 1) boundTable_ = mode;
     if (boundTable_ < 0) return NLE_E_RESOURCE;
     const bool beauty = boundTable_ == 1;
@@ -71,7 +72,7 @@ class NLEChromeKeyLut3dCLEffect final : public NLEBasicCrossFilter {
   int boundTable_ = -1;
 };
 
-const NLEChromeKeyLut3dCLEffect::_auto_register s_register(L"DB4BBA18-48FC-4164-B572-E59757B02796",
+const NLEChromeKeyLut3dCLEffect::_auto_register s_register(tfx::catalog::kChromeKey.wideGuid,
                                                            L"ChromeKeyLut3dCL",
                                                            &NLEChromeKeyLut3dCLEffect::create);
 

@@ -15,11 +15,12 @@ class NLEColorAdjustEffect final : public NLEDynamicEffect {
     (void)srcWidth;
     if (!dst || !src) return NLE_E_INVALIDARG;
     // Parameters go to the operations as floats, unscaled; an absent one is a no-op.
-    const float exposure = static_cast<float>(ParamDouble(L"u_exposure"));
-    const float brightness = static_cast<float>(ParamDouble(L"u_brightness"));
-    const float contrast = static_cast<float>(ParamDouble(L"u_contrast"));
-    const float vibrance = static_cast<float>(ParamDouble(L"u_vib"));
-    const float saturation = static_cast<float>(ParamDouble(L"u_sat"));
+    using namespace tfx::catalog::color_adjust;
+    const float exposure = static_cast<float>(ParamDouble(kExposure));
+    const float brightness = static_cast<float>(ParamDouble(kBrightness));
+    const float contrast = static_cast<float>(ParamDouble(kContrast));
+    const float vibrance = static_cast<float>(ParamDouble(kVibrance));
+    const float saturation = static_cast<float>(ParamDouble(kSaturation));
 
     // Never more rows than both frames hold: a foreground larger than the output is cut.
     myCopy(src, dst, srcWidth, srcHeight < dstHeight ? srcHeight : dstHeight, srcStride, dstStride);
@@ -32,7 +33,7 @@ class NLEColorAdjustEffect final : public NLEDynamicEffect {
   }
 };
 
-const NLEColorAdjustEffect::_auto_register s_register(L"18C6E879-4138-42D0-B0B9-6B4401AA97E6",
+const NLEColorAdjustEffect::_auto_register s_register(tfx::catalog::kColorAdjust.wideGuid,
                                                       L"ColorAdjust",
                                                       &NLEColorAdjustEffect::create);
 

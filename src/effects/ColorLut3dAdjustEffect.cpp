@@ -16,7 +16,7 @@ class NLEColorLut3dAdjustEffect final : public NLEDynamicEffect {
   int Transform(uint8_t* dst, int dstWidth, int dstHeight, int dstPitch, const uint8_t*, int, int,
                 int, const uint8_t* src, int srcWidth, int srcHeight, int srcPitch) override {
     if (!dst || !src) return NLE_E_INVALIDARG;
-    const std::wstring path = GetParamWString(L"lut3dPath");
+    const std::wstring path = GetParamWString(tfx::catalog::lut::kPath);
     if (path.empty()) return NLE_E_RESOURCE;
     lut_.Refresh(path);
 
@@ -39,7 +39,7 @@ class NLEColorLut3dAdjustEffect final : public NLEDynamicEffect {
   LutFileCache lut_;
 };
 
-const NLEColorLut3dAdjustEffect::_auto_register s_register(L"74EB022D-1D73-4D1E-9F70-487C356D46CD",
+const NLEColorLut3dAdjustEffect::_auto_register s_register(tfx::catalog::kLut.wideGuid,
                                                            L"ColorLut3dAdjust",
                                                            &NLEColorLut3dAdjustEffect::create);
 

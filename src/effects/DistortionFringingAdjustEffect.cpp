@@ -14,8 +14,8 @@ class NLEDistortionFringingAdjustEffect final : public NLEDynamicEffect {
                 int, const uint8_t* src, int srcWidth, int srcHeight, int srcStride) override {
     if (!dst || !src) return NLE_E_INVALIDARG;
     // Percent values, passed on as floats; an absent one is a no-op.
-    const float distortion = static_cast<float>(ParamDouble(L"distortion"));
-    const float fringing = static_cast<float>(ParamDouble(L"fringing"));
+    const float distortion = static_cast<float>(ParamDouble(tfx::catalog::lens::kDistortion));
+    const float fringing = static_cast<float>(ParamDouble(tfx::catalog::lens::kFringing));
 
     CxImage image(&dst, static_cast<unsigned>(dstWidth), static_cast<unsigned>(dstHeight), 32,
                   static_cast<unsigned>(dstStride), IPF_BGRA);
@@ -49,7 +49,7 @@ class NLEDistortionFringingAdjustEffect final : public NLEDynamicEffect {
 };
 
 const NLEDistortionFringingAdjustEffect::_auto_register s_register(
-    L"CFAAD60B-AC2B-4B39-A8E1-D25E35A6F735", L"DistortionFringingAdjust",
+    tfx::catalog::kLens.wideGuid, L"DistortionFringingAdjust",
     &NLEDistortionFringingAdjustEffect::create);
 
 }  // namespace

@@ -13,10 +13,10 @@ class NLELightAdjustEffect final : public NLEDynamicEffect {
                 int, const uint8_t* src, int srcWidth, int srcHeight, int srcStride) override {
     if (!dst || !src) return NLE_E_INVALIDARG;
     // Parameters go to the operations as floats, unscaled; an absent one is a no-op.
-    const float highlight = static_cast<float>(ParamDouble(L"u_highLight"));
-    const float shadow = static_cast<float>(ParamDouble(L"u_shadow"));
-    const float whiteLevel = static_cast<float>(ParamDouble(L"u_whiteLevel"));
-    const float blackLevel = static_cast<float>(ParamDouble(L"u_blackLevel"));
+    const float highlight = static_cast<float>(ParamDouble(tfx::catalog::light::kHighlight));
+    const float shadow = static_cast<float>(ParamDouble(tfx::catalog::light::kShadow));
+    const float whiteLevel = static_cast<float>(ParamDouble(tfx::catalog::light::kWhiteLevel));
+    const float blackLevel = static_cast<float>(ParamDouble(tfx::catalog::light::kBlackLevel));
 
     // Never more rows than both frames hold: a foreground larger than the output is cut.
     myCopy(src, dst, srcWidth, srcHeight < dstHeight ? srcHeight : dstHeight, srcStride, dstStride);
@@ -27,7 +27,7 @@ class NLELightAdjustEffect final : public NLEDynamicEffect {
   }
 };
 
-const NLELightAdjustEffect::_auto_register s_register(L"D8651B53-F47A-4B98-B8E9-35B491D5EADC",
+const NLELightAdjustEffect::_auto_register s_register(tfx::catalog::kLightAdjust.wideGuid,
                                                       L"LightAdjust",
                                                       &NLELightAdjustEffect::create);
 

@@ -38,7 +38,6 @@ class NLEOpenCL3dlutAToWhiteEffect final : public NLEBasicCrossFilter {
 };
 
 const NLEOpenCL3dlutAToWhiteEffect::_auto_register s_register(
-    L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356", L"lutAToWhiteEffect",
-    &NLEOpenCL3dlutAToWhiteEffect::create);
+    tfx::catalog::kAToWhite.wideGuid, L"lutAToWhiteEffect", &NLEOpenCL3dlutAToWhiteEffect::create);
 
 }  // namespace

@@ -18,7 +18,7 @@ class NLEOpenCLLut final : public NLEBasicCrossFilter {
 
   HRESULT RunEffect(OPENCL::openclMemory* src, OPENCL::openclMemory* dst) override {
     if (!src) return NLE_E_NOTIMPL;
-    const std::wstring path = GetParamWString(L"lut3dPath");
+    const std::wstring path = GetParamWString(tfx::catalog::lut::kPath);
     if (path.empty()) return NLE_E_RESOURCE;
     const OPENCL::openclMemoryInfo info = src->getOpenCLMemoryInfo();
     if (lut_.Refresh(path) && lut_.Loaded()) createTableMemory(0, 0);
@@ -56,7 +56,7 @@ class NLEOpenCLLut final : public NLEBasicCrossFilter {
   LutFileCache lut_;
 };
 
-const NLEOpenCLLut::_auto_register s_register(L"74EB022D-1D73-4D1E-9F70-487C356D46CD", L"Lut",
+const NLEOpenCLLut::_auto_register s_register(tfx::catalog::kLut.wideGuid, L"Lut",
                                               &NLEOpenCLLut::create);
 
 }  // namespace

@@ -48,7 +48,7 @@ class NLEOpenCLWhiteBalanceAdjustEffect final : public NLEBasicCrossFilter {
 };
 
 const NLEOpenCLWhiteBalanceAdjustEffect::_auto_register s_register(
-    L"39509FB9-39FB-4516-9464-3D891DD61D62", L"WhiteBalanceAdjust",
+    tfx::catalog::kWhiteBalance.wideGuid, L"WhiteBalanceAdjust",
     &NLEOpenCLWhiteBalanceAdjustEffect::create, &RegisterWhiteBalanceParams);
 
 }  // namespace

@@ -15,12 +15,13 @@ class NLEVignetteAdjustEffect final : public NLEDynamicEffect {
     if (!dst || !src) return NLE_E_INVALIDARG;
     // Percent values, passed on as floats; an absent one takes the neutral setting of the
     // effect's controls (a full-size, half-feathered ellipse with neutral highlights).
-    const float amount = static_cast<float>(ParamDouble(L"amount"));
-    const float size = static_cast<float>(ParamDouble(L"size", 100.0));
-    const float roundness = static_cast<float>(ParamDouble(L"roundness"));
-    const float feather = static_cast<float>(ParamDouble(L"feather", 50.0));
-    const float exposure = static_cast<float>(ParamDouble(L"exposure"));
-    const float highlights = static_cast<float>(ParamDouble(L"highlights", 50.0));
+    using namespace tfx::catalog::vignette;
+    const float amount = static_cast<float>(ParamDouble(kAmount));
+    const float size = static_cast<float>(ParamDouble(kSize));
+    const float roundness = static_cast<float>(ParamDouble(kRoundness));
+    const float feather = static_cast<float>(ParamDouble(kFeather));
+    const float exposure = static_cast<float>(ParamDouble(kExposure));
+    const float highlights = static_cast<float>(ParamDouble(kHighlights));
 
     // Never more rows than both frames hold: a foreground larger than the output is cut.
     myCopy(src, dst, srcWidth, srcHeight < dstHeight ? srcHeight : dstHeight, srcStride, dstStride);
@@ -31,7 +32,7 @@ class NLEVignetteAdjustEffect final : public NLEDynamicEffect {
   }
 };
 
-const NLEVignetteAdjustEffect::_auto_register s_register(L"8622FC58-4DF1-44BD-9B37-2F633D4D3368",
+const NLEVignetteAdjustEffect::_auto_register s_register(tfx::catalog::kVignette.wideGuid,
                                                          L"VignetteAdjust",
                                                          &NLEVignetteAdjustEffect::create);
 

@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "catalog/FilterCatalog.h"
 #include "tessarofx/NLECGFilter.h"
 #include "tessarofx/NLEComBase.h"
 #include "tessarofx/NLEProperties.h"
@@ -56,6 +57,15 @@ class NLEBasicFilter : public scombase::CUnknown, public INLECGFilter {
   // the filter has no such parameter.
   static constexpr size_t kMaxParamText = 512;
   std::wstring GetParamWString(const wchar_t* name, const std::wstring& fallback = {}) const;
+  // The same for a catalogued parameter, whose default stands in for a value the host left out.
+  double ParamDouble(const tfx::catalog::Param& p) const {
+    return ParamDouble(p.wideName, p.defaultValue);
+  }
+  // Catalogued integers all default to 0, the value an absent one reads as.
+  int ParamInt(const tfx::catalog::Param& p) const { return ParamInt(p.wideName); }
+  std::wstring GetParamWString(const tfx::catalog::Param& p) const {
+    return GetParamWString(p.wideName);
+  }
 
   INLEFrame* Background() const { return background_; }
   INLEFrame* Foreground() const { return foreground_; }
