@@ -1,6 +1,7 @@
 // The plug-in's three entry points and the merged list of published filters.
 #include <cstring>
 #include <map>
+#include <mutex>
 #include <string>
 
 #include "plugin/NLEBasicCrossFilter.h"
@@ -13,6 +14,9 @@ namespace {
 // Filters as the host sees them, by GUID: built by the first GetFilterCount. Where a GUID has
 // both classes, the OpenCL class's descriptor is published and carries both support flags.
 std::map<std::wstring, NLEComPtr<INLEProperties>> gAllProps;
+// Several hosts may share one loaded plug-in (each frei0r module of the process is one), so the
+// list is built under a lock; afterwards it never changes.
+std::mutex gAllPropsMutex;
 
 // The compiled-in source path after its last backslash, else after its last slash.
 const wchar_t* SourceFileName() {
@@ -80,6 +84,7 @@ HRESULT CreateFilterFromGUID(INLECGDevice* device, const wchar_t* guid, INLEProp
 }
 
 uint32_t GetFilterCount() {
+  std::lock_guard<std::mutex> lock(gAllPropsMutex);
   if (!gAllProps.empty()) return static_cast<uint32_t>(gAllProps.size());
   const auto openclSet = NLEBasicCrossFilter::get_class_set();
   const auto cpuSet = NLEDynamicEffect::get_class_set();
@@ -100,6 +105,7 @@ uint32_t GetFilterCount() {
 }
 
 HRESULT GetFilterProperties(int index, INLEProperties** props) {
+  std::lock_guard<std::mutex> lock(gAllPropsMutex);
   if (!props || gAllProps.empty() || index < 0) return NLE_E_INVALIDARG;
   auto it = gAllProps.begin();
   for (int i = 0; i < index && it != gAllProps.end(); ++i) ++it;

@@ -1,0 +1,193 @@
+#!/usr/bin/env bash
+# The frei0r modules inside the real hosts: FFmpeg, melt and GStreamer run each filter on a
+# lossless path, and every result must be the bytes `tessarofx apply` gives with the equivalent
+# parameters. Then the hosts' own threading, and hostile input.
+#   frei0r_hosts_test.sh TOOL FREI0R_DIR
+set -uo pipefail
+tool=$1
+export FREI0R_PATH=$2
+work=$(mktemp -d)
+[ -n "${KEEP:-}" ] || trap 'rm -rf "$work"' EXIT
+cd "$work"
+failures=0
+fail() { echo "FAIL: $*"; failures=$((failures + 1)); }
+
+ff() { ffmpeg -nostdin -v error -y "$@"; }
+raw() { ff -i "$1" -f rawvideo -pix_fmt bgra "$2"; }
+same() {  # same NAME GOT WANT
+  if cmp -s "$2" "$3"; then echo "ok: $1"; else fail "$1: $2 and $3 differ"; fi
+}
+# The tool's result for a filter, as raw BGRA: apply NAME OUT.raw [-p N=V]... [--background F]
+apply() {
+  local name=$1 out=$2
+  shift 2
+  "$tool" apply "$name" "$@" in.png "$out.png" >/dev/null || fail "tessarofx apply $name $*"
+  raw "$out.png" "$out"
+}
+
+# An asymmetric picture: colour bars and gradients, a transparent strip and varying alpha, so a
+# swapped channel or a lost alpha shows. 128 wide: FFmpeg shears rows that are not a multiple of
+# 16 pixels.
+ff -f lavfi -i "testsrc2=s=128x96,format=bgra,geq=r='r(X,Y)':g='g(X,Y)':b='b(X,Y)':a='if(lt(X,16),0,255-Y)'" \
+  -frames:v 1 in.png
+raw in.png in.raw
+# A LUT that moves every channel differently.
+{
+  echo 'LUT_3D_SIZE 2'
+  for b in 0 1; do for g in 0 1; do for r in 0 1; do
+    echo "$(echo "$r*0.8+0.1" | bc) $(echo "$g*0.6+0.3" | bc) $(echo "$b*0.9" | bc)"
+  done; done; done
+} > look.cube
+printf 'LUT_3D_SIZE 2\n0 0 oops\n' > broken.cube
+
+# --- FFmpeg: every one-input filter. Parameters are 0..1 over each range; 0.75 of -100..100 is 50.
+ffmpeg_case() {  # ffmpeg_case SLUG "frei0r params" NAME [-p N=V]...
+  local slug=$1 params=$2 name=$3
+  shift 3
+  ff -i in.png -vf "frei0r=tessarofx-$slug:$params" -f rawvideo -pix_fmt bgra "ff-$slug.raw" ||
+    fail "ffmpeg $slug"
+  apply "$name" "ref-$slug.raw" "$@"
+  same "ffmpeg $slug" "ff-$slug.raw" "ref-$slug.raw"
+}
+ffmpeg_case coloradjust '0.75|0.4|0.6|0.3|0.7' ColorAdjust -p u_exposure=50 -p u_brightness=-20 \
+  -p u_contrast=20 -p u_vib=-40 -p u_sat=40
+ffmpeg_case whitebalance '0.7|0.35' WhiteBalanceAdjust -p u_temperature=40 -p u_tint=-30
+ffmpeg_case lut "$work/look.cube" Lut -p "lut3dPath=$work/look.cube"
+ffmpeg_case vignette '0.25|0.6|0.75|0.3|0.6|0.7' VignetteAdjust -p amount=-50 -p size=60 \
+  -p roundness=50 -p feather=30 -p exposure=20 -p highlights=70
+ffmpeg_case atowhite '' lutAToWhiteEffect
+ffmpeg_case hsl '0.75|0.25|0.6|0.5|0.5|0.3' HSLAdjust -p u_red_hue=50 -p u_red_sat=-50 \
+  -p u_red_light=20 -p u_orange_hue=-40
+ffmpeg_case lens '0.7|0.8' DistortionFringingAdjust -p distortion=40 -p fringing=60
+ffmpeg_case light '0.7|0.6|0.4|0.3' LightAdjust -p u_highLight=40 -p u_shadow=20 \
+  -p u_whiteLevel=-20 -p u_blackLevel=-40
+key=(-p red=48 -p green=192 -p blue=64 -p contrast=60)
+ffmpeg_case chromakey '0x30C040|0.6|0.5|n' ChromeKeyLut3d "${key[@]}" -p mode=0
+cp ref-chromakey.raw ref-mask.raw
+ffmpeg_case chromakey '0x30C040|0.6|0.5|y' ChromeKeyLut3d "${key[@]}" -p mode=1
+
+# --- melt: a profile of the picture's own size, so that nothing is scaled.
+cat > profile <<'PROFILE'
+description=test
+width=128
+height=96
+progressive=1
+sample_aspect_num=1
+sample_aspect_den=1
+display_aspect_num=4
+display_aspect_den=3
+frame_rate_num=25
+frame_rate_den=1
+colorspace=709
+PROFILE
+melt_run() {  # melt_run OUT.raw FRAMES [melt args]... ; writes every frame
+  local out=$1 frames=$2
+  shift 2
+  melt -quiet -profile profile "$@" -consumer "avformat:$out" f=rawvideo pix_fmt=bgra \
+    >/dev/null 2>melt.log || { fail "melt $*"; cat melt.log; }
+  local want=$((128 * 96 * 4 * frames))
+  [ "$(stat -c %s "$out" 2>/dev/null || echo 0)" = "$want" ] || fail "melt $*: wrong size"
+}
+# Every frame of a multi-frame result against one reference.
+same_frames() {  # same_frames NAME GOT WANT FRAMES
+  local f
+  for ((f = 0; f < $4; f++)); do
+    if ! cmp -s -i $((f * 128 * 96 * 4)):0 -n $((128 * 96 * 4)) "$2" "$3"; then
+      fail "$1: frame $f differs"
+      return
+    fi
+  done
+  echo "ok: $1"
+}
+clip=(pixbuf:in.png out=5)
+melt_run m-color.raw 6 "${clip[@]}" -attach frei0r.tessarofx-coloradjust u_exposure=0.75 \
+  u_brightness=0.4 u_contrast=0.6 u_vib=0.3 u_sat=0.7
+same_frames "melt coloradjust" m-color.raw ref-coloradjust.raw 6
+melt_run m-lut.raw 6 "${clip[@]}" -attach frei0r.tessarofx-lut "lut3dPath=$work/look.cube"
+same_frames "melt lut" m-lut.raw ref-lut.raw 6
+# The key chain: mask and colours on two tracks, joined by the two-input module as a transition.
+keyset=(keyColor=#30c040 contrast=0.6 offset=0.5)
+"$tool" apply ChromeKeyLut3d "${key[@]}" -p mode=0 in.png mask.png >/dev/null
+"$tool" apply ChromeKeyLut3d "${key[@]}" -p mode=1 in.png colours.png >/dev/null
+"$tool" apply ChromeKeyCombine --background mask.png colours.png keyed.png >/dev/null
+raw keyed.png ref-keyed.raw
+keychain=("${clip[@]}" -attach frei0r.tessarofx-chromakey "${keyset[@]}" mode=0
+  -track "${clip[@]}" -attach frei0r.tessarofx-chromakey "${keyset[@]}" mode=1
+  -transition frei0r.tessarofx-chromakeycombine a_track=0 b_track=1 in=0 out=5)
+melt_run m-key.raw 6 "${keychain[@]}"
+same_frames "melt key chain" m-key.raw ref-keyed.raw 6
+
+# MLT's threading: a rendering thread per frame, and frames cut into slices processed at once.
+melt_run m-key-rt.raw 6 "${keychain[@]}" real_time=-4
+same_frames "melt key chain, real_time=-4" m-key-rt.raw ref-keyed.raw 6
+melt_run m-color-rt.raw 6 "${clip[@]}" -attach frei0r.tessarofx-coloradjust u_exposure=0.75 \
+  u_brightness=0.4 u_contrast=0.6 u_vib=0.3 u_sat=0.7 threads=4 real_time=-4
+same_frames "melt coloradjust, sliced and real_time=-4" m-color-rt.raw ref-coloradjust.raw 6
+for slug in whitebalance lut atowhite hsl light chromakey; do
+  case $slug in
+    whitebalance) p=(u_temperature=0.7 u_tint=0.35) ;;
+    lut) p=("lut3dPath=$work/look.cube") ;;
+    atowhite) p=() ;;
+    hsl) p=(u_red_hue=0.75 u_red_sat=0.25 u_red_light=0.6 u_orange_hue=0.3) ;;
+    light) p=(u_highLight=0.7 u_shadow=0.6 u_whiteLevel=0.4 u_blackLevel=0.3) ;;
+    chromakey) p=("${keyset[@]}" mode=1) ;;
+  esac
+  melt_run "m-$slug-sliced.raw" 6 "${clip[@]}" -attach "frei0r.tessarofx-$slug" "${p[@]}" threads=3
+  same_frames "melt $slug, sliced" "m-$slug-sliced.raw" "ref-$slug.raw" 6
+done
+
+# --- GStreamer: three pipelines at once, each against the tool.
+gst_run() {  # gst_run OUT.raw ELEMENT [properties]...
+  local out=$1
+  shift
+  gst-launch-1.0 -q filesrc location=in.png ! pngdec ! videoconvert ! "$@" ! videoconvert ! \
+    video/x-raw,format=BGRA ! filesink "location=$out" >"$out.log" 2>&1 || {
+    fail "gst-launch $*"
+    cat "$out.log"
+  }
+}
+gst_run g-color.raw frei0r-filter-tessarofx-coloradjust u-exposure=0.75 u-brightness=0.4 \
+  u-contrast=0.6 u-vib=0.3 u-sat=0.7 &
+gst_run g-lut.raw frei0r-filter-tessarofx-lut "lut3dpath=$work/look.cube" &
+gst_run g-color2.raw frei0r-filter-tessarofx-coloradjust u-exposure=0.75 u-brightness=0.4 \
+  u-contrast=0.6 u-vib=0.3 u-sat=0.7 &
+wait
+same "gst-launch coloradjust" g-color.raw ref-coloradjust.raw
+same "gst-launch coloradjust, second pipeline" g-color2.raw ref-coloradjust.raw
+same "gst-launch lut" g-lut.raw ref-lut.raw
+
+# --- Hostile input: a message, no crash, frames still come out.
+expect_message() {  # expect_message NAME PATTERN LOG
+  if grep -q "$2" "$3"; then echo "ok: $1"; else fail "$1: no message like '$2'"; cat "$3"; fi
+}
+ff -i in.png -vf "frei0r=tessarofx-coloradjust:7|nan|-3" -f rawvideo -pix_fmt bgra h1.raw \
+  2>h1.log || fail "ffmpeg with values outside 0..1"
+expect_message "values outside 0..1" "outside 0..1; it is clamped" h1.log
+expect_message "a value that is not a number" "is not a number" h1.log
+apply ColorAdjust ref-clamped.raw -p u_exposure=100 -p u_contrast=-100
+same "values outside 0..1 are clamped" h1.raw ref-clamped.raw
+# A missing and a malformed LUT: frames pass through, and the user hears of it once.
+ff -f lavfi -i "testsrc2=s=64x48" -frames:v 20 -vf "frei0r=tessarofx-lut:$work/none.cube" \
+  -f rawvideo -pix_fmt bgra h2.raw 2>h2.log || fail "ffmpeg with a missing LUT"
+expect_message "a missing LUT" "cannot read the LUT file" h2.log
+[ "$(grep -c tessarofx h2.log)" = 1 ] || fail "a missing LUT is reported once, not per frame"
+ff -i in.png -vf "frei0r=tessarofx-lut:$work/broken.cube" -f rawvideo -pix_fmt bgra h3.raw \
+  2>h3.log || fail "ffmpeg with a malformed LUT"
+expect_message "a malformed LUT" "is not a .cube or .3dl LUT" h3.log
+same "a malformed LUT passes frames through" h3.raw in.raw
+# Sizes that are not multiples of 8, and a size that changes mid-stream (each host builds a new
+# instance). GStreamer feeds packed rows of any width.
+ff -f lavfi -i "testsrc2=s=40x24" -frames:v 1 -vf format=rgba,crop=37:23:0:0 size1.png
+ff -f lavfi -i "testsrc2=s=64x40" -frames:v 1 size2.png
+gst-launch-1.0 -q multifilesrc location=size%d.png index=1 stop-index=2 \
+  caps=image/png,framerate=25/1 ! pngdec ! videoconvert ! \
+  frei0r-filter-tessarofx-vignette amount=0.2 ! videoconvert ! video/x-raw,format=BGRA ! \
+  filesink location=h4.raw 2>h4.log || fail "gst-launch with 37x23 and 64x40 frames"
+[ "$(stat -c %s h4.raw)" = $(((37 * 23 + 64 * 40) * 4)) ] || fail "37x23 and 64x40 frames in GStreamer"
+ff -i size%d.png -vf "frei0r=tessarofx-light:0.9" -f rawvideo -pix_fmt bgra h5.raw 2>h5.log ||
+  fail "ffmpeg with a change of frame size"
+# FFmpeg scales the later frames to the first size for its encoder.
+[ "$(stat -c %s h5.raw)" = $((37 * 23 * 4 * 2)) ] || fail "37x23 and 64x40 frames in FFmpeg"
+
+[ "$failures" = 0 ] || { echo "$failures failure(s)"; exit 1; }
+echo "all frei0r host checks passed"
