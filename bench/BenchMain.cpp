@@ -56,6 +56,20 @@ int main(int argc, char** argv) {
     else
       std::printf("%-48s %14.1f %12s\n", row.name.c_str(), row.mpixPerSec, "-");
   }
+  // A benchmark of another path to the same work ("BM_Frei0r/...") beside its reference
+  // ("BM_Running/...", the same size and case): the ratio of their times.
+  std::map<std::string, double> runningRate;
+  for (const auto& row : reporter.rows)
+    if (row.name.rfind("BM_Running/", 0) == 0) runningRate[row.name.substr(11)] = row.mpixPerSec;
+  bool header = false;
+  for (const auto& row : reporter.rows) {
+    if (row.name.rfind("BM_Frei0r/", 0) != 0) continue;
+    auto ref = runningRate.find(row.name.substr(10));
+    if (ref == runningRate.end() || row.mpixPerSec <= 0) continue;
+    if (!header) std::printf("\n%-48s %14s\n", "benchmark", "time x Running");
+    header = true;
+    std::printf("%-48s %14.4f\n", row.name.c_str(), ref->second / row.mpixPerSec);
+  }
   benchmark::Shutdown();
   return 0;
 }
