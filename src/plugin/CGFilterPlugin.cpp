@@ -30,6 +30,9 @@ const wchar_t* SourceFileName() {
   return name.c_str();
 }
 
+constexpr int kOpenCLCreationLine = 66;
+constexpr int kCpuCreationLine = 78;
+
 void LogCreation(const wchar_t* format, const NLEBasicFilter* filter, int line) {
   INLELogger* logger = NLEGetDefaultLogger();
   if (!logger || !logger->IsLevelEnabled(kNLELogInfo)) return;
@@ -50,9 +53,8 @@ HRESULT HandOut(T* object, void** filter) {
 extern "C" {
 
 // The OpenCL class when a device is passed, else the CPU class; the host's properties override
-// the registered defaults. Creation is logged with this file's name and the line of the logging
-// call. Log readers match those lines as published, so the two calls stay on lines 66 and 78
-// (a test pins them): keep the line count above them when editing this file.
+// the registered defaults. Creation is logged with this file's name and a line number; log
+// readers match the numbers as published, so they are fixed rather than taken from the source.
 // A new filter that cannot be bound to the device is released and reported as a bad argument.
 // *filter receives the caller's reference.
 HRESULT CreateFilterFromGUID(INLECGDevice* device, const wchar_t* guid, INLEProperties* props,
@@ -67,7 +69,7 @@ HRESULT CreateFilterFromGUID(INLECGDevice* device, const wchar_t* guid, INLEProp
       object->Release();
       return NLE_E_INVALIDARG;
     }
-    LogCreation(L"CREATE <OPENCL> Filter: %ls  [%ls, %d]", object, __LINE__);
+    LogCreation(L"CREATE <OPENCL> Filter: %ls  [%ls, %d]", object, kOpenCLCreationLine);
     const HRESULT hr = HandOut(object, filter);
     object->Release();
     return hr;
@@ -79,7 +81,7 @@ HRESULT CreateFilterFromGUID(INLECGDevice* device, const wchar_t* guid, INLEProp
   NLEDynamicEffect* object = NLEDynamicEffect::create(guid);
   if (!object) return NLE_E_INVALIDARG;
   object->CopyFromFilterProperty(props);
-  LogCreation(L"CREATE <PureC> Filter: %ls  [%ls, %d]", object, __LINE__);
+  LogCreation(L"CREATE <PureC> Filter: %ls  [%ls, %d]", object, kCpuCreationLine);
   return HandOut(object, filter);
 }
 
