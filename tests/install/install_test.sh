@@ -21,7 +21,7 @@ fail() {
 cmake --install "$build" --prefix "$prefix" >/dev/null
 
 # Relative RUNPATHs only: an absolute one would point into the build tree or the staging root.
-for f in "$prefix"/bin/tessarofx "$prefix"/lib*/libTessaroFx.so.0; do
+for f in "$prefix"/bin/tessarofx "$prefix"/lib*/libTessaroFx.so.0 "$prefix"/lib/frei0r-1/*.so; do
   runpath=$(readelf -d "$f" | sed -n 's/.*(RUNPATH).*\[\(.*\)\]/\1/p')
   [[ $runpath == '$ORIGIN'* && $runpath != *:* ]] || fail "$f has RUNPATH '$runpath'"
 done
@@ -29,6 +29,11 @@ done
 "$prefix/bin/tessarofx" list >"$work/list" || fail "the installed tool cannot list the filters"
 grep -q 'ColorAdjust  *18C6E879-4138-42D0-B0B9-6B4401AA97E6' "$work/list" ||
   fail "ColorAdjust is missing from the installed tool's list"
+
+# The frei0r modules load from where the hosts look under the prefix.
+FREI0R_PATH=$prefix/lib/frei0r-1 ffmpeg -nostdin -v error -f lavfi -i testsrc2=s=32x16 \
+  -frames:v 1 -vf frei0r=tessarofx-coloradjust:0.7 -f null - ||
+  fail "ffmpeg cannot run an installed frei0r module"
 
 pcdir=$(dirname "$(find "$prefix" -name tessarofx.pc)")
 export PKG_CONFIG_PATH=$pcdir
