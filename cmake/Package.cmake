@@ -23,7 +23,7 @@ set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
 set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
 set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
 # The OpenCL classes need a driver; without one the CPU classes do all the work.
-set(CPACK_DEBIAN_PACKAGE_SUGGESTS "pocl-opencl-icd | opencl-icd")
+set(CPACK_DEBIAN_PACKAGE_SUGGESTS "pocl-opencl-icd | opencl-icd, ffmpeg, melt, gstreamer1.0-plugins-bad")
 # The plug-in and the tool need the host kit, which this package itself ships: dpkg-shlibdeps
 # looks it up among the staged files and the shlibs file generated for them.
 set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS ON)
