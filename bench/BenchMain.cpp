@@ -18,13 +18,19 @@ class CollectingReporter : public benchmark::ConsoleReporter {
   void ReportRuns(const std::vector<Run>& runs) override {
     ConsoleReporter::ReportRuns(runs);
     for (const Run& run : runs) {
-      if (run.error_occurred || run.run_type != Run::RT_Iteration) continue;
+      if (run.error_occurred) continue;
       auto it = run.counters.find("items_per_second");
       if (it == run.counters.end()) continue;
-      rows.push_back({run.benchmark_name(), it->second.value / 1e6});
+      if (run.run_type == Run::RT_Iteration) {
+        rows.push_back({run.benchmark_name(), it->second.value / 1e6});
+      } else if (run.aggregate_name == "median") {
+        medians[run.run_name.str()] = it->second.value / 1e6;
+      }
     }
   }
   std::vector<Row> rows;
+  // With --benchmark_repetitions: each benchmark's median, by its name without the suffix.
+  std::map<std::string, double> medians;
 };
 
 // "BM_Name/4K/..." -> "4K": the size label is the first path segment after the name.
@@ -57,18 +63,19 @@ int main(int argc, char** argv) {
       std::printf("%-48s %14.1f %12s\n", row.name.c_str(), row.mpixPerSec, "-");
   }
   // A benchmark of another path to the same work ("BM_Frei0r/...") beside its reference
-  // ("BM_Running/...", the same size and case): the ratio of their times.
-  std::map<std::string, double> runningRate;
-  for (const auto& row : reporter.rows)
-    if (row.name.rfind("BM_Running/", 0) == 0) runningRate[row.name.substr(11)] = row.mpixPerSec;
+  // ("BM_Running/...", the same size and case): the ratio of their times, from the medians when
+  // the benchmarks were repeated.
+  std::map<std::string, double> rates;
+  for (const auto& row : reporter.rows) rates[row.name] = row.mpixPerSec;
+  for (const auto& [name, rate] : reporter.medians) rates[name] = rate;
   bool header = false;
-  for (const auto& row : reporter.rows) {
-    if (row.name.rfind("BM_Frei0r/", 0) != 0) continue;
-    auto ref = runningRate.find(row.name.substr(10));
-    if (ref == runningRate.end() || row.mpixPerSec <= 0) continue;
+  for (const auto& [name, rate] : rates) {
+    if (name.rfind("BM_Frei0r/", 0) != 0 || rate <= 0) continue;
+    auto ref = rates.find("BM_Running/" + name.substr(10));
+    if (ref == rates.end()) continue;
     if (!header) std::printf("\n%-48s %14s\n", "benchmark", "time x Running");
     header = true;
-    std::printf("%-48s %14.4f\n", row.name.c_str(), ref->second / row.mpixPerSec);
+    std::printf("%-48s %14.4f\n", name.c_str(), ref->second / rate);
   }
   benchmark::Shutdown();
   return 0;
