@@ -32,12 +32,9 @@ ff -f lavfi -i "testsrc2=s=128x96,format=bgra,geq=r='r(X,Y)':g='g(X,Y)':b='b(X,Y
   -frames:v 1 in.png
 raw in.png in.raw
 # A LUT that moves every channel differently.
-{
-  echo 'LUT_3D_SIZE 2'
-  for b in 0 1; do for g in 0 1; do for r in 0 1; do
-    echo "$(echo "$r*0.8+0.1" | bc) $(echo "$g*0.6+0.3" | bc) $(echo "$b*0.9" | bc)"
-  done; done; done
-} > look.cube
+awk 'BEGIN { print "LUT_3D_SIZE 2"
+  for (b = 0; b < 2; b++) for (g = 0; g < 2; g++) for (r = 0; r < 2; r++)
+    printf "%g %g %g\n", r * 0.8 + 0.1, g * 0.6 + 0.3, b * 0.9 }' >look.cube
 printf 'LUT_3D_SIZE 2\n0 0 oops\n' > broken.cube
 
 # --- FFmpeg: every one-input filter. Parameters are 0..1 over each range; 0.75 of -100..100 is 50.
