@@ -12,8 +12,8 @@
 // unload it.
 //
 // Call order.
-//   1. GetFilterCount() once, from one thread, before anything else: it builds the list of
-//      published filters (ten, in ascending GUID order).
+//   1. GetFilterCount() before anything else: the first call builds the list of published
+//      filters (ten, in ascending GUID order); later calls, from any thread, return its length.
 //   2. GetFilterProperties(i, &desc) for i below the count: the descriptor bag of filter i
 //      (NLEKey::Filter::kFilterID, kFilterFriendName, kFilterCSupport, kFilterOpenclSupport and,
 //      for filters that register them, the parameter descriptors under kParamsArray[i]).
