@@ -16,6 +16,8 @@ packages=(
   ffmpeg melt gstreamer1.0-tools gstreamer1.0-plugins-base gstreamer1.0-plugins-good
   gstreamer1.0-plugins-bad
   dpkg-dev file
+  libavformat-dev libavcodec-dev libswscale-dev libavutil-dev
+  libcli11-dev libutfcpp-dev
 )
 
 missing=()
