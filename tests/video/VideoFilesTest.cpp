@@ -149,17 +149,18 @@ TEST_F(VideoFiles, LosslessRoundTripKeepsPixelsTimesAlphaAndSideStreams) {
 }
 
 TEST_F(VideoFiles, VariableFrameRateKeepsEveryTimestamp) {
-  // Steady, then a 0.3 s hold, then ever longer gaps.
+  // Steady, then a 0.31 s hold, then ever longer gaps, all off the 1/25 s grid.
   const std::string source =
       Make("vfr.mkv",
-           "-f lavfi -i testsrc2=s=64x48:r=25:d=1 -vf \"setpts='N/25/TB+gte(N,10)*0.3/TB+"
-           "gte(N,18)*(N-18)*0.01/TB'\" -fps_mode passthrough -c:v ffv1");
+           "-f lavfi -i testsrc2=s=64x48:r=25:d=1 -vf \"settb=1/1000,setpts='N/25/TB+"
+           "gte(N,10)*0.31/TB+gte(N,18)*(N-18)*0.013/TB'\" -fps_mode passthrough -enc_time_base "
+           "1:1000 -c:v ffv1");
   for (const char* target : {"vfr.mp4", "vfr-copy.mkv"}) {
     Status s = Transcode(source, Path(target), {});
     ASSERT_TRUE(s.ok()) << s.message();
     const Clip in = ReadAll(source), out = ReadAll(Path(target));
     ASSERT_EQ(in.frames.size(), 25u);
-    EXPECT_GT(Seconds(in, 10) - Seconds(in, 9), 0.3);
+    EXPECT_NEAR(Seconds(in, 10) - Seconds(in, 9), 0.35, 1e-9);
     ExpectSameTimes(in, out);
   }
 }

@@ -121,6 +121,7 @@ Status VideoReader::Open(const std::string& path) {
   }
   if (ret < 0) return Status::Error("cannot read " + quoted + ": " + AvError(ret));
   m.stream = raw->streams[ret];
+  const AVCodec* usual = codec;
   codec = DecoderFor(m.stream, codec);
 
   m.decoder.reset(avcodec_alloc_context3(codec));
@@ -145,8 +146,12 @@ Status VideoReader::Open(const std::string& path) {
   info.sampleAspect = {aspect.num, aspect.den};
   info.frameCountEstimate = EstimateFrames(raw, m.stream, rate);
   const auto format = AVPixelFormat(par->format);
-  info.hasAlpha = HasAlpha(format);
-  info.pixelFormat = format == AV_PIX_FMT_NONE ? "" : av_get_pix_fmt_name(format);
+  // The stream's parameters come from the usual decoder, blind to an alpha plane kept apart.
+  const bool alphaApart = codec != usual && format == AV_PIX_FMT_YUV420P;
+  info.hasAlpha = alphaApart || HasAlpha(format);
+  info.pixelFormat = alphaApart                  ? "yuva420p"
+                     : format == AV_PIX_FMT_NONE ? ""
+                                                 : av_get_pix_fmt_name(format);
   info.codec = codec->name;
   info.streamIndex = m.stream->index;
   info.colour = {par->color_primaries, par->color_trc, par->color_space, par->color_range};

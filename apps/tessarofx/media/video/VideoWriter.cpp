@@ -109,6 +109,7 @@ struct VideoWriter::Impl {
   bool fullRange = false;
   bool rgbOut = false;
   int64_t framesSent = 0;
+  int64_t lastPts = 0;
   int64_t videoPackets = 0;
 
   InputPtr copyInput;
@@ -240,10 +241,13 @@ Status VideoWriter::Impl::OpenEncoder(const EncoderChoice& choice, const WriterO
   enc->sample_aspect_ratio = AVRational{info.sampleAspect.num, info.sampleAspect.den};
   if (info.timeBase.num > 0 && info.timeBase.den > 0)
     sourceTimeBase = AVRational{info.timeBase.num, info.timeBase.den};
-  // The source's own time base keeps variable frame timing exact.
+  // The source's own time base keeps variable frame timing exact. AVI counts frames instead of
+  // timing them: there a tick is one frame.
   enc->time_base = sourceTimeBase;
-  if (info.frameRate.num > 0 && info.frameRate.den > 0)
+  if (info.frameRate.num > 0 && info.frameRate.den > 0) {
     enc->framerate = AVRational{info.frameRate.num, info.frameRate.den};
+    if (std::strcmp(output->oformat->name, "avi") == 0) enc->time_base = av_inv_q(enc->framerate);
+  }
   enc->thread_count = 0;
 
   // Back into YUV with the matrix and range the reader took out of it, so that an untouched
@@ -419,7 +423,15 @@ Status VideoWriter::Open(const std::string& target, const VideoReader& source,
       av_dict_set(&muxing, "start_number", std::to_string(m.firstNumber).c_str(), 0);
     ret = avformat_write_header(raw, &muxing);
     av_dict_free(&muxing);
-    if (ret < 0) return Status::Error("cannot write '" + target + "': " + AvError(ret));
+    if (ret < 0) {
+      // The muxer refuses one of its streams without saying which; name them all.
+      std::string streams;
+      for (unsigned i = 0; i < raw->nb_streams; ++i)
+        streams += std::string(i == 0 ? "" : ", ") +
+                   avcodec_get_name(raw->streams[i]->codecpar->codec_id) + " " +
+                   av_get_media_type_string(raw->streams[i]->codecpar->codec_type);
+      return Status::Error("cannot write '" + target + "' with " + streams + ": " + AvError(ret));
+    }
     return Status::Ok();
   }();
   if (!status.ok()) {
@@ -453,8 +465,18 @@ Status VideoWriter::Write(const VideoFrame& source) {
   const uint8_t* planes[1] = {source.bgra.data};
   const int strides[1] = {int(source.bgra.step[0])};
   sws_scale(m.sws.get(), planes, strides, 0, source.bgra.rows, m.frame->data, m.frame->linesize);
-  m.frame->pts = av_rescale_q(source.pts, m.sourceTimeBase, enc->time_base);
+  // Where the output's ticks are coarser than the source's, two frames may fall on one tick; the
+  // later one moves to the next, as encoders take no repeated times.
+  int64_t pts = av_rescale_q(source.pts, m.sourceTimeBase, enc->time_base);
+  if (m.framesSent > 0 && pts <= m.lastPts) pts = m.lastPts + 1;
+  m.lastPts = pts;
+  m.frame->pts = pts;
   m.frame->pict_type = AV_PICTURE_TYPE_NONE;
+  // Some encoders (ProRes) store the frame's colour tags rather than the stream's.
+  m.frame->color_primaries = enc->color_primaries;
+  m.frame->color_trc = enc->color_trc;
+  m.frame->colorspace = enc->colorspace;
+  m.frame->color_range = enc->color_range;
   const int ret = avcodec_send_frame(enc, m.frame.get());
   if (ret < 0)
     return m.Fail("cannot encode frame " + std::to_string(source.index) + " of '" + m.target +
