@@ -61,8 +61,8 @@ struct VideoInfo {
   // From the container's frame count, else its duration times the rate; -1 when neither is known.
   int64_t frameCountEstimate = -1;
   bool hasAlpha = false;
-  // Clockwise degrees in [0, 360) a player turns the picture by; the matrix itself, as stored in
-  // the container, travels to the writer so that flips survive too.
+  // Clockwise degrees in [0, 360) a player turns the picture by (as ffmpeg's autorotate does);
+  // the matrix itself, as stored in the container, travels to the writer so that flips survive.
   double rotation = 0;
   bool hasDisplayMatrix = false;
   std::array<int32_t, 9> displayMatrix{};
@@ -105,7 +105,11 @@ class VideoReader {
 };
 
 struct WriterOptions {
-  // Any encoder FFmpeg knows (libx264, ffv1, prores_ks, png, ...); empty picks by container.
+  // Any encoder FFmpeg knows (libx264, ffv1, prores_ks, png, ...), given the pixel format closest
+  // to the frames that it takes (BGRA or RGBA for alpha where it can). Empty picks by container:
+  // H.264 (libx264, yuv420p) for .mp4 .m4v .mkv .mov and VP9 (libvpx-vp9, yuv420p) for .webm;
+  // with alpha ProRes 4444 (yuva444p10le) for .mov, VP9 (yuva420p) for .webm, FFV1 (bgra) for
+  // .mkv; PNG (rgba, or rgb24) for pictures and "%04d" sequences; elsewhere the container's own.
   std::string codec;
   // Constant-quality setting: the encoder's crf where it has one, else its quantiser scale;
   // empty keeps the default (crf 17 for x264, visually lossless). Lossless codecs ignore it.
@@ -115,7 +119,8 @@ struct WriterOptions {
 
 // Writes into a hidden file beside the target and moves it onto the target only in Finish(), so
 // that a failure or an interrupt never leaves a partial file there. The source's audio and
-// subtitle streams are copied packet for packet.
+// subtitle streams are copied packet for packet (pictures and sequences get none); one that the
+// container cannot hold fails Open().
 class VideoWriter {
  public:
   VideoWriter();
@@ -126,7 +131,9 @@ class VideoWriter {
   // Takes size, timing, colour tags and rotation from the opened source, and opens the source's
   // file a second time for its audio and subtitle packets.
   Status Open(const std::string& target, const VideoReader& source, const WriterOptions& options);
-  // Frames in order, with the source's pts.
+  // Frames in order, with the source's pts; each keeps its time (AVI, which only counts frames,
+  // keeps their order). A frame whose time does not advance moves to the next tick. A frame of
+  // another size is scaled to the source's.
   Status Write(const VideoFrame& frame);
   Status Finish();
   void Abort();

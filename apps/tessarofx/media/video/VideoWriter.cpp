@@ -225,6 +225,18 @@ Status VideoWriter::Impl::ChooseEncoder(const WriterOptions& options, const Vide
     return Status::Error("codec '" + codecName + "' takes no pixel format this tool can give");
   if (options.alpha && !HasAlpha(out->format))
     return Status::Error("codec '" + codecName + "' cannot keep alpha");
+  // Most encoders refuse a size their chroma grid does not cover with an error that does not say
+  // so (x264: "generic error"); the VP8/VP9/AV1 family pads by itself.
+  const AVPixFmtDescriptor* d = av_pix_fmt_desc_get(out->format);
+  const AVCodecID id = out->codec->id;
+  const bool padsItself = id == AV_CODEC_ID_VP8 || id == AV_CODEC_ID_VP9 || id == AV_CODEC_ID_AV1;
+  const bool offGrid = (info.width & ((1 << d->log2_chroma_w) - 1)) != 0 ||
+                       (info.height & ((1 << d->log2_chroma_h) - 1)) != 0;
+  if (!padsItself && offGrid)
+    return Status::Error("'" + codecName + "' in " + d->name + " needs an even " +
+                         (info.width % 2 ? "width" : "height") + ", not " +
+                         std::to_string(info.width) + "x" + std::to_string(info.height) +
+                         "; name a codec without chroma subsampling, such as ffv1");
   return Status::Ok();
 }
 
