@@ -41,6 +41,7 @@
 #include <locale>
 #include <sstream>
 
+#include "Utf8.h"
 #include "tessarofx/CubeLut.h"
 
 namespace {
@@ -113,38 +114,17 @@ std::istringstream ClassicStream(const std::string& text) {
 
 }  // namespace
 
-// A Linux wchar_t holds a code point, so negative values count as 0x110000 and up, and
-// surrogates are encoded as they are.
 void tfx::WideToUtf8Path(const std::wstring& wide, char* out) {
-  size_t used = 0;
-  for (const wchar_t wc : wide) {
-    uint32_t cp = static_cast<uint32_t>(wc);
-    if (cp >= 0x110000u) cp = 0xFFFDu;
-    unsigned char bytes[4];
-    size_t n;
-    if (cp < 0x80u) {
-      bytes[0] = static_cast<unsigned char>(cp);
-      n = 1;
-    } else if (cp < 0x800u) {
-      bytes[0] = static_cast<unsigned char>(0xC0u | (cp >> 6));
-      bytes[1] = static_cast<unsigned char>(0x80u | (cp & 0x3Fu));
-      n = 2;
-    } else if (cp < 0x10000u) {
-      bytes[0] = static_cast<unsigned char>(0xE0u | (cp >> 12));
-      bytes[1] = static_cast<unsigned char>(0x80u | ((cp >> 6) & 0x3Fu));
-      bytes[2] = static_cast<unsigned char>(0x80u | (cp & 0x3Fu));
-      n = 3;
-    } else {
-      bytes[0] = static_cast<unsigned char>(0xF0u | (cp >> 18));
-      bytes[1] = static_cast<unsigned char>(0x80u | ((cp >> 12) & 0x3Fu));
-      bytes[2] = static_cast<unsigned char>(0x80u | ((cp >> 6) & 0x3Fu));
-      bytes[3] = static_cast<unsigned char>(0x80u | (cp & 0x3Fu));
-      n = 4;
+  std::string utf8;
+  for (const wchar_t& c : wide) {
+    const size_t before = utf8.size();
+    tfx::host::AppendUtf8(utf8, &c, 1);
+    if (utf8.size() > kLutPathMaxBytes) {
+      utf8.resize(before);
+      break;
     }
-    if (used + n > kLutPathMaxBytes) return;
-    std::memcpy(out + used, bytes, n);
-    used += n;
   }
+  std::memcpy(out, utf8.data(), utf8.size());
 }
 
 std::string convertFloat2String(float v) {

@@ -15,7 +15,8 @@ constexpr size_t kLutPathMaxBytes = 2047;
 
 // The UTF-8 form of a wide path into `out`, which the caller zero-fills with
 // kLutPathBufferBytes bytes. At most kLutPathMaxBytes bytes are written: conversion stops before
-// the first character that would not fit whole. Values from 0x110000 up become U+FFFD.
+// the first character that would not fit whole. Converted by the host kit's one policy
+// (host/Utf8.h): surrogates and values from 0x110000 up become U+FFFD.
 void WideToUtf8Path(const std::wstring& wide, char* out);
 
 }  // namespace tfx
