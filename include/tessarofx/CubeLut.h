@@ -15,7 +15,9 @@
 //   12 end of file while looking for a line    23 size missing or outside 2..64 (doLUT: 1..64)
 //   13 no line end in the first 252 bytes      24 a row with fewer than three numbers, or a
 //                                                 value that is infinite, NaN or past float
-// A failed read leaves the lattice zeroed up to the rows read before the error.
+// A failed read leaves the lattice zeroed up to the rows read before the error. statusText()
+// gives these meanings in words, and the readers that take a Stop say on which physical line
+// they stopped, for messages that point into the file.
 //
 // Threading: an object is used by one thread at a time. getInstance() hands out a process-wide
 // object that every public construction (clone() included) replaces; objects may be built on
@@ -29,6 +31,7 @@
 #pragma once
 
 #include <atomic>
+#include <cstddef>
 #include <cstdint>
 #include <fstream>
 #include <string>
@@ -46,6 +49,25 @@ class TFX_API CubeLut {
   };
 
   static constexpr int kMaxSize = 64;  // points per axis the lattice holds
+  // Points per axis the ".CUBE" format allows, and loadCubeLattice reads.
+  static constexpr int kMaxFileSize = 256;
+  // Bytes of a line a Stop keeps: one more than a message quotes, to tell that it was cut.
+  static constexpr size_t kStopTextBytes = 61;
+
+  // Where and why a reader stopped. `line` counts physical lines from 1, comments and blank
+  // lines included, and is the line holding the last byte the reader took: the offending line
+  // for an error, the last table row after a success. Two exceptions: a ".CUBE" header that
+  // fails its checks as a whole (status 22, or 23 for a missing size) is blamed on the first
+  // table row, where the reader found that the header had ended; and status 13 is line 1. An
+  // empty file is line 0.
+  struct Stop {
+    int status = 1;
+    long line = 0;
+    // The start of that line (at most kStopTextBytes bytes) without its line end.
+    std::string text;
+    // The largest size the reader took, which status 23 refers to.
+    int sizeLimit = kMaxSize;
+  };
 
   // Status 1, size 0: doLUT refuses to run (23) until something is loaded or generated. The new
   // object becomes the process-wide instance.
@@ -73,6 +95,31 @@ class TFX_API CubeLut {
   // stream's position afterwards to tell where reading stopped.
   int load3DlFile(std::ifstream& in);
   int loadCubeFile(std::ifstream& in);
+  // The same readers, also saying where they stopped; `stop` may be null. Named apart rather
+  // than overloaded, so that code taking the address of the readers above still compiles.
+  int load3DlFileWithStop(std::ifstream& in, Stop* stop);
+  int loadCubeFileWithStop(std::ifstream& in, Stop* stop);
+  // Reads a ".CUBE" file as loadCubeFile does (the same keywords, line skipping, sticky missing
+  // components, status codes and Stop lines, the domain's width as the scale) but up to
+  // kMaxFileSize points per axis, into `points` rather than an object: point (i, j, k) = (red,
+  // green, blue index) at ((i * n + j) * n + k) * 3, and *size receives n (0 on failure). For
+  // tables too big for the lattice, which a caller resamples. Returns the status code.
+  static int loadCubeLattice(std::ifstream& in, std::vector<float>* points, int* size, Stop* stop);
+
+  // What a status code means, in words: "" for 0, "unknown status" for a code no reader gives.
+  static const char* statusText(int status);
+  // The one form of every complaint about a LUT file a reader stopped on:
+  //   FILE, line N ("TEXT"): status S, MEANING
+  // without the line part for line 0. The text is cut to 60 bytes ("..." marks the cut) and its
+  // quotes, backslashes and control bytes are escaped.
+  static std::string stopMessage(const std::string& file, const Stop& stop);
+
+  // doLUT's tetrahedral interpolation on a lattice of any size n >= 1, laid out as
+  // loadCubeLattice's, at a position in lattice units (0..n - 1 per axis; outside, or NaN, is
+  // clamped). The corner choice, weights and float arithmetic are doLUT's, without its rounding
+  // to bytes, so resampling a table with it matches what applying the table does.
+  static void interpolate(const float* points, int size, float red, float green, float blue,
+                          float out[3]);
   // The next line that is not empty, not a '#' comment and not a bare "\r".
   std::string readLine(std::ifstream& in, char terminator);
   // Cuts at every single space; empty pieces count.
@@ -124,9 +171,8 @@ class TFX_API CubeLut {
  private:
   void buildTables();  // fraction and grid index tables from size_
   int atlasIndex(int i, int j, int k) const;
-  // What both readers do first: status 0, no title, the default domain, a zeroed lattice, and the
-  // line terminator detected (status 13 when none is found). Returns the terminator.
-  char beginRead(std::ifstream& in);
+  // What both readers do first: status 0, no title, the default domain, a zeroed lattice.
+  void beginRead();
   void allocateAtlas();  // frees the atlas and allocates a zeroed tile image for size_
 
   int32_t status_;

@@ -86,6 +86,30 @@ int CubeLut::doLUT(unsigned char* pixels, int width, int height, int pitch, int 
   return status_;
 }
 
+void CubeLut::interpolate(const float* points, int size, float red, float green, float blue,
+                          float out[3]) {
+  if (!points || size < 1) {
+    out[0] = out[1] = out[2] = 0.0f;
+    return;
+  }
+  const float position[3] = {red, green, blue};
+  const ptrdiff_t stride[3] = {ptrdiff_t{size} * size * 3, ptrdiff_t{size} * 3, 3};
+  const float* c000 = points;
+  ptrdiff_t step[3];
+  float fraction[3];
+  for (int axis = 0; axis < 3; ++axis) {
+    float p = position[axis];
+    if (!(p > 0.0f)) p = 0.0f;
+    p = std::min(p, static_cast<float>(size - 1));
+    // The lower point and the offset inside its cell, in float as doLUT's tables are.
+    const int lower = static_cast<int>(p);
+    fraction[axis] = p - static_cast<float>(lower);
+    step[axis] = lower + 1 < size ? stride[axis] : 0;
+    c000 += lower * stride[axis];
+  }
+  tfx::Tetrahedral(c000, step[0], step[1], step[2], fraction[0], fraction[1], fraction[2], out);
+}
+
 CubeLut* CubeLut::clone() {
   CubeLut* copy = new CubeLut();
   copy->status_ = status_;

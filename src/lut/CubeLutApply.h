@@ -32,6 +32,34 @@ inline uint8_t LutComponentToByte(float v) {
   return TruncatedLowByte(w);
 }
 
+// doLUT's tetrahedra at one point of a cell: `c000` is the lower corner, and dr, dg, db the
+// distances (in floats) to the upper neighbour along red, green and blue, 0 where the lattice
+// ends. The path from the lower to the upper corner follows the fractions in decreasing order,
+// strict comparisons tested in this order; every caller shares this arithmetic, so a table
+// resampled with it means what applying it does.
+inline void Tetrahedral(const float* c000, ptrdiff_t dr, ptrdiff_t dg, ptrdiff_t db, float fr,
+                        float fg, float fb, float out[3]) {
+  float w0, w1, w2, w3;  // weights of the lower corner, the two between, the upper
+  const float *m1, *m2;  // the two corners between
+  if (fr > fg) {
+    if (fg > fb) {
+      w0 = 1 - fr, w1 = fr - fg, w2 = fg - fb, w3 = fb, m1 = c000 + dr, m2 = c000 + dr + dg;
+    } else if (fr > fb) {
+      w0 = 1 - fr, w1 = fr - fb, w2 = fb - fg, w3 = fg, m1 = c000 + dr, m2 = c000 + dr + db;
+    } else {
+      w0 = 1 - fb, w1 = fb - fr, w2 = fr - fg, w3 = fg, m1 = c000 + db, m2 = c000 + dr + db;
+    }
+  } else if (fb > fg) {
+    w0 = 1 - fb, w1 = fb - fg, w2 = fg - fr, w3 = fr, m1 = c000 + db, m2 = c000 + dg + db;
+  } else if (fb > fr) {
+    w0 = 1 - fg, w1 = fg - fb, w2 = fb - fr, w3 = fr, m1 = c000 + dg, m2 = c000 + dg + db;
+  } else {
+    w0 = 1 - fg, w1 = fg - fr, w2 = fr - fb, w3 = fb, m1 = c000 + dg, m2 = c000 + dr + dg;
+  }
+  const float* c111 = c000 + dr + dg + db;
+  for (int c = 0; c < 3; ++c) out[c] = w0 * c000[c] + w1 * m1[c] + w2 * m2[c] + w3 * c111[c];
+}
+
 // Applies the table to `width` pixels of `bytesPerPixel` bytes (blue, green, red first) in place.
 void TetraRow(const TetraTable& table, uint8_t* row, int width, int bytesPerPixel);
 

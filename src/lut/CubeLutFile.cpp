@@ -27,10 +27,11 @@
 //
 // Hostile files are the normal case: the readers never write outside the 64-point lattice, never
 // allocate more than the input and an N <= 64 atlas, and every loop consumes input or stops.
-// Reading stops at the first error, and the stream is left where it stopped so that a caller
-// holding the stream can point at the line.
+// Reading stops at the first error, and the stream is left where it stopped. The readers count
+// the physical lines they take, so that a caller can be told which line stopped them.
 #include "lut/CubeLutFile.h"
 
+#include <algorithm>
 #include <cctype>
 #include <climits>
 #include <cmath>
@@ -61,14 +62,30 @@ bool StoreFinite(float* point, float red, float green, float blue) {
   return true;
 }
 
+// The physical lines a read has taken, and the start of the last one, so that a failure can
+// point at it.
+struct LineCursor {
+  long line = 0;
+  std::string text;  // at most CubeLut::kStopTextBytes, without the line end
+};
+
+void Remember(const std::string& line, LineCursor* at) {
+  ++at->line;
+  size_t length = line.size();
+  if (length > 0 && line[length - 1] == '\r') --length;
+  at->text.assign(line, 0, std::min(length, CubeLut::kStopTextBytes));
+}
+
 // Finds the line terminator from the start of the stream: the first '\n' or '\r'; a '\r'
 // followed by '\n' makes a CR-LF file, read with '\n' so that its lines keep their '\r'. Returns
-// false when the first kTerminatorWindow characters hold neither. A file that ends sooner is read
-// with '\n' and has at most one line. The stream goes back to its start either way.
-bool DetectTerminator(std::ifstream& in, char* terminator) {
+// false when the first kTerminatorWindow characters hold neither, and then puts the start of
+// that overlong first line in `at`. A file that ends sooner is read with '\n' and has at most
+// one line. The stream goes back to its start either way.
+bool DetectTerminator(std::ifstream& in, char* terminator, LineCursor* at) {
   using Traits = std::ifstream::traits_type;
   *terminator = '\n';
   bool found = false;
+  std::string start;
   for (int count = 0; count < kTerminatorWindow; ++count) {
     const Traits::int_type c = in.get();
     if (Traits::eq_int_type(c, Traits::eof())) {
@@ -84,12 +101,46 @@ bool DetectTerminator(std::ifstream& in, char* terminator) {
       found = true;
       break;
     }
+    if (start.size() < CubeLut::kStopTextBytes) start += Traits::to_char_type(c);
+  }
+  if (!found) {
+    at->line = 1;
+    at->text = start;
   }
   // Cleared before the seek as well: a stream that met its end refuses to seek.
   in.clear();
   in.seekg(0);
   in.clear();
   return found;
+}
+
+// readLine's loop, counting every physical line it takes in `at` (when there is one).
+std::string NextLine(std::ifstream& in, char terminator, int32_t* status, LineCursor* at) {
+  std::string line;
+  for (;;) {
+    // A '#' only comments out a line when it is the very first character.
+    if (!line.empty() && line[0] != '#' && line != "\r") return line;
+    // Kept on purpose: a last line without a terminator leaves the end flag set and the next
+    // call reports 12, while one with a terminator lets getline fail first, which reports 10.
+    if (in.eof()) {
+      *status = 12;
+      return line;
+    }
+    std::getline(in, line, terminator);
+    if (in.fail() || in.bad()) {
+      *status = 10;
+      return line;
+    }
+    if (at) Remember(line, at);
+  }
+}
+
+void Report(int32_t status, const LineCursor& at, int sizeLimit, CubeLut::Stop* stop) {
+  if (!stop) return;
+  stop->status = status;
+  stop->line = at.line;
+  stop->text = at.text;
+  stop->sizeLimit = sizeLimit;
 }
 
 // The header's test for a numeric line: a first word that sorts after "+" and before ":", so a
@@ -110,6 +161,101 @@ std::istringstream ClassicStream(const std::string& text) {
   std::istringstream in(text);
   in.imbue(std::locale::classic());
   return in;
+}
+
+struct CubeHeader {
+  std::string title;
+  float min[3] = {0.0f, 0.0f, 0.0f};
+  float max[3] = {1.0f, 1.0f, 1.0f};
+  int size = 0;  // 0 until a LUT_3D_SIZE line is taken
+};
+
+// A ".CUBE" header, up to and not including the first table row, which is put back for the row
+// loop. The header is judged as a whole only once that row was met, and then the row is blamed.
+void ReadCubeHeader(std::ifstream& in, char terminator, int maxSize, int32_t* status,
+                    LineCursor* at, CubeHeader* header) {
+  bool sawTitle = false, sawMin = false, sawMax = false, sawSize = false;
+  LineCursor row;
+  while (*status == 0) {
+    const std::streampos start = in.tellg();
+    const LineCursor before = *at;
+    const std::string line = NextLine(in, terminator, status, at);
+    if (*status != 0) break;
+    std::istringstream words = ClassicStream(line);
+    std::string word;
+    words >> word;
+    if (IsNumericWord(word)) {
+      // The first table row: read again by the row loop, which counts its lines again.
+      in.seekg(start);
+      row = *at;
+      *at = before;
+      break;
+    }
+    // A failed extraction reports 10 before any check of the value it should have produced.
+    if (word == "TITLE" && !sawTitle) {
+      sawTitle = true;
+      char quote = 0;
+      if (!(words >> quote)) {
+        *status = 10;
+      } else if (quote != '"') {
+        *status = 21;
+      } else if (!std::getline(words, header->title, '"')) {
+        *status = 10;
+      }
+    } else if (word == "DOMAIN_MIN" && !sawMin) {
+      sawMin = true;
+      if (!(words >> header->min[0] >> header->min[1] >> header->min[2])) *status = 10;
+    } else if (word == "DOMAIN_MAX" && !sawMax) {
+      sawMax = true;
+      if (!(words >> header->max[0] >> header->max[1] >> header->max[2])) *status = 10;
+    } else if (word == "LUT_3D_SIZE" && !sawSize) {
+      sawSize = true;
+      int n = 0;
+      if (!(words >> n)) {
+        *status = 10;
+      } else if (n < 2 || n > maxSize) {
+        // A refused size is never stored.
+        *status = 23;
+      } else {
+        header->size = n;
+      }
+    } else {
+      *status = 20;
+    }
+  }
+  if (*status != 0) return;
+  if (!sawSize) {
+    *status = 23;
+  } else {
+    for (int c = 0; c < 3; ++c) {
+      if (!(header->max[c] > header->min[c])) *status = 22;
+    }
+  }
+  if (*status != 0) *at = row;
+}
+
+// The n^3 table rows, red fastest, each scaled by `scale`; point(i, j, k) says where the point
+// for red index i, green j and blue k goes. A component that fails to convert keeps the previous
+// row's value, 0 before the first row.
+template <class Point>
+void ReadCubeRows(std::ifstream& in, char terminator, int n, const float scale[3], int32_t* status,
+                  LineCursor* at, Point point) {
+  float x = 0.0f, y = 0.0f, z = 0.0f;
+  for (int k = 0; *status == 0 && k < n; ++k) {
+    for (int j = 0; *status == 0 && j < n; ++j) {
+      for (int i = 0; *status == 0 && i < n; ++i) {
+        const std::string line = NextLine(in, terminator, status, at);
+        if (*status != 0) break;
+        std::sscanf(line.c_str(), "%f %f %f", &x, &y, &z);
+        if (!StoreFinite(point(i, j, k), x * scale[0], y * scale[1], z * scale[2])) *status = 24;
+      }
+    }
+  }
+}
+
+// Deliberately only the domain's width: the minimum is not subtracted.
+void DomainScale(const float min[3], const float max[3], float scale[3]) {
+  for (int c = 0; c < 3; ++c) scale[c] = (max[c] - min[c]) * 255.0f;
 }
 
 }  // namespace
@@ -163,22 +309,7 @@ bool CubeLut::loadFile(const wchar_t* path) {
 }
 
 std::string CubeLut::readLine(std::ifstream& in, char terminator) {
-  std::string line;
-  for (;;) {
-    // A '#' only comments out a line when it is the very first character.
-    if (!line.empty() && line[0] != '#' && line != "\r") return line;
-    // Kept on purpose: a last line without a terminator leaves the end flag set and the next
-    // call reports 12, while one with a terminator lets getline fail first, which reports 10.
-    if (in.eof()) {
-      status_ = 12;
-      return line;
-    }
-    std::getline(in, line, terminator);
-    if (in.fail() || in.bad()) {
-      status_ = 10;
-      return line;
-    }
-  }
+  return NextLine(in, terminator, &status_, nullptr);
 }
 
 void CubeLut::splitString(const std::string& line, std::vector<std::string>& out) {
@@ -209,7 +340,7 @@ std::vector<float> CubeLut::parseTableRow(const std::string& line) {
   return values;
 }
 
-char CubeLut::beginRead(std::ifstream& in) {
+void CubeLut::beginRead() {
   status_ = 0;
   title_.clear();
   for (int c = 0; c < 3; ++c) {
@@ -217,16 +348,18 @@ char CubeLut::beginRead(std::ifstream& in) {
     domainMax_[c] = 1.0f;
   }
   std::memset(lattice_, 0, sizeof lattice_);
-  char terminator;
-  if (!DetectTerminator(in, &terminator)) status_ = 13;
-  return terminator;
 }
 
-int CubeLut::load3DlFile(std::ifstream& in) {
-  const char terminator = beginRead(in);
+int CubeLut::load3DlFile(std::ifstream& in) { return load3DlFileWithStop(in, nullptr); }
+
+int CubeLut::load3DlFileWithStop(std::ifstream& in, Stop* stop) {
+  beginRead();
+  LineCursor at;
+  char terminator;
+  if (!DetectTerminator(in, &terminator, &at)) status_ = 13;
 
   while (status_ == 0) {
-    const std::string line = readLine(in, terminator);
+    const std::string line = NextLine(in, terminator, &status_, &at);
     if (status_ != 0) break;
     std::istringstream words = ClassicStream(line);
     std::string word;
@@ -263,7 +396,7 @@ int CubeLut::load3DlFile(std::ifstream& in) {
   for (int i = 0; status_ == 0 && i < n; ++i) {
     for (int j = 0; status_ == 0 && j < n; ++j) {
       for (int k = 0; status_ == 0 && k < n; ++k) {
-        const std::string line = readLine(in, terminator);
+        const std::string line = NextLine(in, terminator, &status_, &at);
         if (status_ != 0) break;
         std::sscanf(line.c_str(), "%f %f %f", &x, &y, &z);
         // Single precision: divided by the 12-bit maximum, then scaled to 0..255.
@@ -274,66 +407,26 @@ int CubeLut::load3DlFile(std::ifstream& in) {
       }
     }
   }
+  Report(status_, at, kMaxSize, stop);
   return status_;
 }
 
-int CubeLut::loadCubeFile(std::ifstream& in) {
-  const char terminator = beginRead(in);
+int CubeLut::loadCubeFile(std::ifstream& in) { return loadCubeFileWithStop(in, nullptr); }
 
-  bool sawTitle = false, sawMin = false, sawMax = false, sawSize = false;
-  while (status_ == 0) {
-    const std::streampos start = in.tellg();
-    const std::string line = readLine(in, terminator);
-    if (status_ != 0) break;
-    std::istringstream words = ClassicStream(line);
-    std::string word;
-    words >> word;
-    if (IsNumericWord(word)) {
-      // The first table row: read again by the data loop.
-      in.seekg(start);
-      break;
-    }
-    // A failed extraction reports 10 before any check of the value it should have produced.
-    if (word == "TITLE" && !sawTitle) {
-      sawTitle = true;
-      char quote = 0;
-      if (!(words >> quote)) {
-        status_ = 10;
-      } else if (quote != '"') {
-        status_ = 21;
-      } else if (!std::getline(words, title_, '"')) {
-        status_ = 10;
-      }
-    } else if (word == "DOMAIN_MIN" && !sawMin) {
-      sawMin = true;
-      if (!(words >> domainMin_[0] >> domainMin_[1] >> domainMin_[2])) status_ = 10;
-    } else if (word == "DOMAIN_MAX" && !sawMax) {
-      sawMax = true;
-      if (!(words >> domainMax_[0] >> domainMax_[1] >> domainMax_[2])) status_ = 10;
-    } else if (word == "LUT_3D_SIZE" && !sawSize) {
-      sawSize = true;
-      int n = 0;
-      if (!(words >> n)) {
-        status_ = 10;
-      } else if (n < 2 || n > kMaxSize) {
-        // The format goes up to 256, the lattice to kMaxSize; a refused size is never stored.
-        status_ = 23;
-      } else {
-        size_ = n;
-      }
-    } else {
-      status_ = 20;
-    }
+int CubeLut::loadCubeFileWithStop(std::ifstream& in, Stop* stop) {
+  beginRead();
+  LineCursor at;
+  char terminator;
+  if (!DetectTerminator(in, &terminator, &at)) status_ = 13;
+
+  CubeHeader header;
+  if (status_ == 0) ReadCubeHeader(in, terminator, kMaxSize, &status_, &at, &header);
+  title_ = header.title;
+  for (int c = 0; c < 3; ++c) {
+    domainMin_[c] = header.min[c];
+    domainMax_[c] = header.max[c];
   }
-  if (status_ == 0) {
-    if (!sawSize) {
-      status_ = 23;
-    } else {
-      for (int c = 0; c < 3; ++c) {
-        if (!(domainMax_[c] > domainMin_[c])) status_ = 22;
-      }
-    }
-  }
+  if (header.size != 0) size_ = header.size;
 
   pointCount_ = size_ * size_ * size_;
   allocateAtlas();
@@ -342,33 +435,114 @@ int CubeLut::loadCubeFile(std::ifstream& in) {
   if (rowTable_) {
     // The raw rows go to the attached table unscaled, and the lattice stays zeroed.
     for (int row = 0; status_ == 0 && row < n; ++row) {
-      const std::string line = readLine(in, terminator);
+      const std::string line = NextLine(in, terminator, &status_, &at);
       if (status_ != 0) break;
       const std::vector<float> values = parseTableRow(line);
       for (int c = 0; c < 3; ++c) rowTable_[row][c] = values[c];
     }
-    return status_;
+  } else {
+    if (status_ == 0) buildTables();
+    float scale[3];
+    DomainScale(domainMin_, domainMax_, scale);
+    ReadCubeRows(in, terminator, n, scale, &status_, &at,
+                 [this](int i, int j, int k) { return lattice_[i][j][k]; });
   }
+  Report(status_, at, kMaxSize, stop);
+  return status_;
+}
 
-  if (status_ == 0) buildTables();
-  // Deliberately only the domain's width: the minimum is not subtracted.
+int CubeLut::loadCubeLattice(std::ifstream& in, std::vector<float>* points, int* size, Stop* stop) {
+  int32_t status = 0;
+  LineCursor at;
+  char terminator;
+  if (!DetectTerminator(in, &terminator, &at)) status = 13;
+  CubeHeader header;
+  if (status == 0) ReadCubeHeader(in, terminator, kMaxFileSize, &status, &at, &header);
+  const int n = status == 0 ? header.size : 0;
+
+  // Rows are kept in file order as they arrive, so that memory follows the input rather than a
+  // size the header merely claims, and are put in lattice order once all are in.
+  points->clear();
   float scale[3];
-  for (int c = 0; c < 3; ++c) scale[c] = (domainMax_[c] - domainMin_[c]) * 255.0f;
-  // As in the ".3DL" reader, a missing component keeps the previous row's value, 0 at first.
-  float x = 0.0f, y = 0.0f, z = 0.0f;
-  for (int k = 0; status_ == 0 && k < n; ++k) {
-    for (int j = 0; status_ == 0 && j < n; ++j) {
-      for (int i = 0; status_ == 0 && i < n; ++i) {
-        const std::string line = readLine(in, terminator);
-        if (status_ != 0) break;
-        std::sscanf(line.c_str(), "%f %f %f", &x, &y, &z);
-        if (!StoreFinite(lattice_[i][j][k], x * scale[0], y * scale[1], z * scale[2])) {
-          status_ = 24;
+  DomainScale(header.min, header.max, scale);
+  ReadCubeRows(in, terminator, n, scale, &status, &at, [points](int, int, int) {
+    points->resize(points->size() + 3);
+    return points->data() + points->size() - 3;
+  });
+  if (status == 0) {
+    // File order has red fastest and blue slowest; lattice order the reverse. Swapping the red
+    // and blue indices of every point pairs them up.
+    const auto at3 = [n](int a, int b, int c) {
+      return ((static_cast<size_t>(a) * n + b) * n + c) * 3;
+    };
+    for (int k = 0; k < n; ++k) {
+      for (int j = 0; j < n; ++j) {
+        for (int i = 0; i < k; ++i) {
+          std::swap_ranges(points->begin() + at3(k, j, i), points->begin() + at3(k, j, i) + 3,
+                           points->begin() + at3(i, j, k));
         }
       }
     }
+  } else {
+    points->clear();
   }
-  return status_;
+  *size = status == 0 ? n : 0;
+  Report(status, at, kMaxFileSize, stop);
+  return status;
+}
+
+const char* CubeLut::statusText(int status) {
+  switch (status) {
+    case 0:
+      return "";
+    case 1:
+      return "nothing was loaded";
+    case 10:
+      return "a read failed: the table ends early, or a keyword's values cannot be read";
+    case 12:
+      return "the file ends before the table is complete";
+    case 13:
+      return "no line end in the first 252 bytes";
+    case 20:
+      return "unknown or repeated keyword";
+    case 21:
+      return "TITLE is not followed by '\"'";
+    case 22:
+      return "a DOMAIN_MAX value is not above its DOMAIN_MIN";
+    case 23:
+      return "the size is missing or outside 2..64";
+    case 24:
+      return "fewer than three numbers where three are needed, or one that is not finite";
+  }
+  return "unknown status";
+}
+
+std::string CubeLut::stopMessage(const std::string& file, const Stop& stop) {
+  constexpr size_t kShown = 60;  // bytes of the line a message quotes
+  std::string message = file;
+  if (stop.line > 0) {
+    std::string shown;
+    for (size_t i = 0; i < stop.text.size() && i < kShown; ++i) {
+      const unsigned char c = static_cast<unsigned char>(stop.text[i]);
+      if (c == '"' || c == '\\') {
+        shown += '\\';
+        shown += static_cast<char>(c);
+      } else if (c < 0x20 || c == 0x7f) {
+        char escaped[8];
+        std::snprintf(escaped, sizeof escaped, "\\x%02x", c);
+        shown += escaped;
+      } else {
+        shown += static_cast<char>(c);
+      }
+    }
+    if (stop.text.size() > kShown) shown += "...";
+    message += ", line " + std::to_string(stop.line) + " (\"" + shown + "\")";
+  }
+  // Status 23 names the limit of the reader that gave it.
+  const std::string meaning =
+      stop.status == 23 ? "the size is missing or outside 2.." + std::to_string(stop.sizeLimit)
+                        : statusText(stop.status);
+  return message + ": status " + std::to_string(stop.status) + ", " + meaning;
 }
 
 bool CubeLut::writeLUT3D2File(const char* path) {

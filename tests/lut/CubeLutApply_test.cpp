@@ -192,4 +192,39 @@ TEST(CubeLutApply, EveryColourMatchesTheReference) {
   ForEveryTarget([&] { EXPECT_TRUE(tfx_test::SameBuffer(*expected, *apply(&tfx::TetraRow))); });
 }
 
+// The interpolation a caller resamples with is the one doLUT applies: on a lattice of 18 points
+// (a cell of exactly 15 levels), every byte position, rounded as doLUT rounds, gives doLUT's
+// bytes; positions outside the lattice are clamped onto it.
+TEST(CubeLutApply, InterpolationOfAnySizeMatchesTheReference) {
+  constexpr int n = 18;
+  Lattice lattice(n);
+  std::mt19937 rng(18);
+  std::uniform_real_distribution<float> value(-20.0f, 280.0f);
+  lattice.Fill([&] { return value(rng); });
+  std::vector<float> dense;
+  for (int i = 0; i < n; ++i) {
+    for (int j = 0; j < n; ++j) {
+      for (int k = 0; k < n; ++k)
+        dense.insert(dense.end(), lattice.Point(i, j, k), lattice.Point(i, j, k) + 3);
+    }
+  }
+  const tfx::TetraTable table = lattice.Table();
+  for (int r = 0; r < 256; r += 3) {
+    for (int g = 1; g < 256; g += 3) {
+      for (int b = 2; b < 256; b += 3) {
+        uint8_t pixel[3] = {uint8_t(b), uint8_t(g), uint8_t(r)};
+        tfx::TetraRowReference(table, pixel, 1, 3);
+        float out[3];
+        CubeLut::interpolate(dense.data(), n, r / 15.0f, g / 15.0f, b / 15.0f, out);
+        ASSERT_EQ(tfx::LutComponentToByte(out[0]), pixel[2]) << r << " " << g << " " << b;
+        ASSERT_EQ(tfx::LutComponentToByte(out[1]), pixel[1]);
+        ASSERT_EQ(tfx::LutComponentToByte(out[2]), pixel[0]);
+      }
+    }
+  }
+  float out[3];
+  CubeLut::interpolate(dense.data(), n, -5.0f, std::numeric_limits<float>::quiet_NaN(), 99.0f, out);
+  for (int c = 0; c < 3; ++c) EXPECT_EQ(out[c], lattice.Point(0, 0, n - 1)[c]);
+}
+
 }  // namespace

@@ -13,7 +13,6 @@
 #include <string>
 #include <vector>
 
-#include "../tools/LutFiles.h"
 #include "support/TempDir.h"
 #include "tessarofx/CubeLut.h"
 
@@ -120,24 +119,23 @@ void ExpectStatuses(const std::vector<Mutation>& cases, const char* file, bool d
     const std::string path = dir.Write(file, m.bytes);
     const auto lut = std::make_unique<CubeLut>();
     std::ifstream in(path, std::ios::binary);
-    EXPECT_EQ(dl ? lut->load3DlFile(in) : lut->loadCubeFile(in), m.status);
+    CubeLut::Stop stop;
+    EXPECT_EQ(dl ? lut->load3DlFileWithStop(in, &stop) : lut->loadCubeFileWithStop(in, &stop),
+              m.status);
     EXPECT_EQ(lut->getStatus(), m.status);
-    in.clear();
-    const auto format = dl ? tfxtool::LutFormat::k3dl : tfxtool::LutFormat::kCube;
-    EXPECT_EQ(tfxtool::LocateStop(path, format, in.tellg(), m.status).number, m.line);
+    EXPECT_EQ(stop.status, m.status);
+    EXPECT_EQ(stop.line, m.line);
     ExpectBounded(*lut);
-    // The tool's reader, which takes tables up to 256 points, follows the same rules to the same
-    // line, and names none in a file without line ends.
+    // The reader of tables up to 256 points follows the same rules to the same line.
     if (!dl && m.bytes.find("LUT_3D_SIZE 65") == std::string::npos) {
-      tfxtool::LutTable table;
-      const tfxtool::Status tool = tfxtool::ReadCubeTable(path, &table);
-      EXPECT_EQ(tool.ok(), m.status == 0) << tool.message();
-      if (m.status != 0) {
-        const std::string where =
-            m.line && m.status != 13 ? ", line " + std::to_string(m.line) + " (" : "cube: ";
-        EXPECT_NE(tool.message().find(where), std::string::npos) << tool.message();
-        EXPECT_NE(tool.message().find("status " + std::to_string(m.status)), std::string::npos);
-      }
+      std::ifstream again(path, std::ios::binary);
+      std::vector<float> points;
+      int size = -1;
+      CubeLut::Stop big;
+      EXPECT_EQ(CubeLut::loadCubeLattice(again, &points, &size, &big), m.status);
+      EXPECT_EQ(big.line, m.line);
+      EXPECT_EQ(size, m.status == 0 ? 2 : 0);
+      EXPECT_EQ(points.size(), m.status == 0 ? 24u : 0u);
     }
     if (m.status != 0) continue;
     ExpectSample(*lut, dl ? 3 : 2, dl);
@@ -220,6 +218,58 @@ TEST(CubeLutFile, DlStatuses) {
           {"line of 252", std::string(252, 'x') + "\n" + kDl, 13, 1},
       },
       "case.3dl", true);
+}
+
+// Tables above the lattice's 64 points are read whole, in lattice order and with the domain's
+// scale; 257 points are too many even for them, and the message names that limit.
+TEST(CubeLutFile, LatticeReaderTakesEverySizeTheFormatAllows) {
+  constexpr int n = 65;
+  std::string text = "DOMAIN_MAX 2 2 2\nLUT_3D_SIZE 65\n";
+  for (int r = 0; r < n * n * n; ++r) {
+    char row[64];
+    std::snprintf(row, sizeof row, "%g %g %g\n", r % n / 64.0, r / n % n / 64.0, r / n / n / 64.0);
+    text += row;
+  }
+  TempDir dir;
+  std::ifstream in(dir.Write("big.cube", text), std::ios::binary);
+  std::vector<float> points;
+  int size = 0;
+  CubeLut::Stop stop;
+  ASSERT_EQ(CubeLut::loadCubeLattice(in, &points, &size, &stop), 0);
+  ASSERT_EQ(size, n);
+  EXPECT_EQ(stop.line, 2 + n * n * n);
+  for (const int i : {0, 1, 17, 64}) {
+    for (const int k : {0, 3, 64}) {
+      const float* p = &points[((static_cast<size_t>(i) * n + 5) * n + k) * 3];
+      EXPECT_EQ(p[0], static_cast<float>(i) / 64.0f * 510.0f);
+      EXPECT_EQ(p[1], 5.0f / 64.0f * 510.0f);
+      EXPECT_EQ(p[2], static_cast<float>(k) / 64.0f * 510.0f);
+    }
+  }
+
+  std::ifstream tooBig(dir.Write("257.cube", Replace(text, "SIZE 65", "SIZE 257")),
+                       std::ios::binary);
+  EXPECT_EQ(CubeLut::loadCubeLattice(tooBig, &points, &size, &stop), 23);
+  EXPECT_EQ(size, 0);
+  EXPECT_EQ(CubeLut::stopMessage("257.cube", stop),
+            "257.cube, line 2 (\"LUT_3D_SIZE 257\"): status 23, the size is missing or outside "
+            "2..256");
+}
+
+TEST(CubeLutFile, StopMessagesQuoteTheLineSafely) {
+  CubeLut::Stop stop;
+  stop.status = 20;
+  stop.line = 7;
+  stop.text = "TITLE \"a\\b\"\t" + std::string(49, 'x');
+  EXPECT_EQ(CubeLut::stopMessage("f.cube", stop),
+            "f.cube, line 7 (\"TITLE \\\"a\\\\b\\\"\\x09" + std::string(48, 'x') +
+                "...\"): status 20, unknown or repeated keyword");
+  stop.status = 10;
+  stop.line = 0;
+  EXPECT_EQ(CubeLut::stopMessage("f.cube", stop),
+            "f.cube: status 10, a read failed: the table ends early, or a keyword's values cannot "
+            "be read");
+  EXPECT_STREQ(CubeLut::statusText(99), "unknown status");
 }
 
 TEST(CubeLutFile, CubeValues) {
