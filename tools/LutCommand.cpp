@@ -56,24 +56,22 @@ int SizeOnLine(const std::string& text) {
 Status LoadThroughPlugin(const std::string& path, const PluginCubeLut& lut) {
   const LutFormat format = LutFormatOf(path);
   if (format == LutFormat::kNone) {
-    return Status::Error(LutFileMessage(path, 0, "", "not a .cube or .3dl file"));
+    return Status::Error(LutFileMessage(path, "not a .cube or .3dl file"));
   }
   std::ifstream in(path, std::ios::in | std::ios::binary);
-  if (!in.is_open()) return Status::Error(LutFileMessage(path, 0, "", "cannot be opened"));
-  const int status = format == LutFormat::kCube ? lut.LoadCube(in) : lut.Load3Dl(in);
+  if (!in.is_open()) return Status::Error(LutFileMessage(path, "cannot be opened"));
+  CubeLut::Stop stop;
+  const int status = format == LutFormat::kCube ? lut.LoadCube(in, &stop) : lut.Load3Dl(in, &stop);
   if (status == 0) return Status::Ok();
 
-  in.clear();
-  const long long offset = static_cast<long long>(in.tellg());
-  const LutLine stop = LocateStop(path, format, offset, status);
-  std::string reason = "status " + std::to_string(status) + ", " + LutStatusMeaning(status);
+  std::string reason = lut.StopMessage(path, stop);
   const int size = SizeOnLine(stop.text);
   if (status == 23 && size > kPluginMaxSize && size <= kMaxCubeFileSize) {
     reason += "; 'tessarofx lut convert " + path + " OUT.cube --size " +
               std::to_string(kPluginMaxSize) +
               "' (or smaller) resamples it to a size the plug-in takes";
   }
-  return Status::Error(LutFileMessage(path, stop.number, stop.text, reason));
+  return Status::Error(reason);
 }
 
 Status InfoCommand(const GlobalOptions& options, const Args& words) {
@@ -165,7 +163,7 @@ Status ConvertCommand(const GlobalOptions& options, const Args& args) {
   LutTable table;
   switch (LutFormatOf(input)) {
     case LutFormat::kCube:
-      if (Status s = ReadCubeTable(input, &table); !s.ok()) return s;
+      if (Status s = ReadCubeTable(*lut, input, &table); !s.ok()) return s;
       break;
     case LutFormat::k3dl: {
       // ".3DL" tables go through the plug-in's reader, so up to 64 points per axis.
@@ -183,19 +181,18 @@ Status ConvertCommand(const GlobalOptions& options, const Args& args) {
       break;
     }
     case LutFormat::kNone:
-      return Status::Error(LutFileMessage(input, 0, "", "not a .cube or .3dl file"));
+      return Status::Error(LutFileMessage(input, "not a .cube or .3dl file"));
   }
 
   if (size == 0) {
     if (table.size > kPluginMaxSize) {
-      return Status::Error(
-          LutFileMessage(input, 0, "",
-                         std::to_string(table.size) + " points per axis, more than the plug-in's " +
-                             std::to_string(kPluginMaxSize) + ": pass --size " +
-                             std::to_string(kPluginMaxSize) + " (or smaller) to resample it"));
+      return Status::Error(LutFileMessage(
+          input, std::to_string(table.size) + " points per axis, more than the plug-in's " +
+                     std::to_string(kPluginMaxSize) + ": pass --size " +
+                     std::to_string(kPluginMaxSize) + " (or smaller) to resample it"));
     }
   } else if (size != table.size) {
-    table = ResampleTable(table, size);
+    table = ResampleTable(*lut, table, size);
   }
   if (Status s = FillLattice(*lut, table); !s.ok()) return s;
   if (Status s = WriteThroughPlugin(*lut, output); !s.ok()) return s;

@@ -1,44 +1,26 @@
-// The tool's side of 3D LUT files: the one shape of every complaint about a file, the words for
-// the plug-in's status codes, and where in a file a reader stopped.
+// The tool's side of 3D LUT files: their formats, and tables of any size the format allows,
+// read and resampled by the plug-in's own code.
 #pragma once
 
 #include <string>
 #include <vector>
 
+#include "PluginCubeLut.h"
 #include "Status.h"
 
 namespace tfxtool {
 
-// Every complaint about a LUT file has this shape, from this one helper:
-//   FILE, line N ("TEXT"): REASON
-// Line numbers are physical (comments and blank lines count) and start at 1; line 0 leaves the
-// line and its text out. The text is cut to a readable length and control bytes are escaped.
-std::string LutFileMessage(const std::string& file, long line, const std::string& text,
-                           const std::string& reason);
-
-// What a CubeLut status code means, in words ("" for 0).
-std::string LutStatusMeaning(int status);
+// A complaint about a LUT file as a whole ("FILE: REASON"), in the shape of the plug-in's
+// complaints about a line of one.
+std::string LutFileMessage(const std::string& file, const std::string& reason);
 
 // The two formats, told apart by the extension in any letter case as the plug-in does.
 enum class LutFormat { kNone, kCube, k3dl };
 LutFormat LutFormatOf(const std::string& path);
 
-struct LutLine {
-  long number = 0;   // physical, from 1
-  std::string text;  // without its terminator or a trailing '\r'
-};
-
-// The physical line where a plug-in reader stopped, from the stream position it left (`offset`,
-// read with the flags cleared) and its status:
-//   - the line holding the last byte it consumed (line 1 when it consumed nothing);
-//   - except that a ".CUBE" header is only checked as a whole once the first table row has been
-//     read and put back, with the comments and blank lines before it: then (status 22, or 23
-//     without a LUT_3D_SIZE line just read) the line is that first table row.
-LutLine LocateStop(const std::string& path, LutFormat format, long long offset, int status);
-
-// The points per axis the tool's own ".CUBE" reader takes: the most the format allows. The
-// plug-in holds 64.
-constexpr int kMaxCubeFileSize = 256;
+// The points per axis a table the tool converts may have: the most the format allows. The
+// plug-in's lattice holds 64.
+constexpr int kMaxCubeFileSize = CubeLut::kMaxFileSize;
 
 // A 3D table of any size up to kMaxCubeFileSize, in the plug-in's units: values in 0..255 for
 // 0..1, point (i, j, k) = (red, green, blue index) at values[((i * size + j) * size + k) * 3].
@@ -51,17 +33,13 @@ struct LutTable {
   }
 };
 
-// Reads a ".CUBE" file by the plug-in's rules but up to kMaxCubeFileSize points per axis, for
-// tables the plug-in refuses. The same header keywords, each once; the same line skipping
-// (empty lines, '#' in the first column, bare "\r"); rows with missing numbers keep the previous
-// row's values. Like the plug-in, it multiplies each value by the domain's width (DOMAIN_MAX -
-// DOMAIN_MIN) without subtracting DOMAIN_MIN, so the table means what the plug-in would make of
-// the same file if it were small enough. Errors carry the plug-in's status code and the physical
-// line where reading stopped.
-Status ReadCubeTable(const std::string& path, LutTable* table);
+// Reads a ".CUBE" file of up to kMaxCubeFileSize points per axis with the plug-in's reader for
+// such tables: what the plug-in would make of the file if its lattice were big enough. Errors are
+// the plug-in's message, with the physical line where reading stopped.
+Status ReadCubeTable(const PluginCubeLut& lut, const std::string& path, LutTable* table);
 
-// The table resampled to m points per axis by tetrahedral interpolation, with doLUT's corner
-// choice and weights but on positions that fall anywhere in a cell, and without rounding.
-LutTable ResampleTable(const LutTable& in, int m);
+// The table resampled to m points per axis with the plug-in's tetrahedral interpolation, on
+// positions that fall anywhere in a cell and without rounding.
+LutTable ResampleTable(const PluginCubeLut& lut, const LutTable& in, int m);
 
 }  // namespace tfxtool

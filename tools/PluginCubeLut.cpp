@@ -3,8 +3,6 @@
 #include <new>
 #include <type_traits>
 
-#include "tessarofx/CubeLut.h"
-
 namespace tfxtool {
 namespace {
 
@@ -14,14 +12,23 @@ namespace {
 // referring to anything the tool would have to link.
 using CtorFn = void (*)(CubeLut*);
 using DtorFn = void (*)(CubeLut*);
-using LoadFn = int (*)(CubeLut*, std::ifstream&);
+using LoadFn = int (*)(CubeLut*, std::ifstream&, CubeLut::Stop*);
+using LoadLatticeFn = int (*)(std::ifstream&, std::vector<float>*, int*, CubeLut::Stop*);
+using StopMessageFn = std::string (*)(const std::string&, const CubeLut::Stop&);
+using InterpolateFn = void (*)(const float*, int, float, float, float, float*);
 using LatticeFn = float* (*)(CubeLut*, int*, int*, int*, int*);
 using DomainFn = void (*)(const CubeLut*, float*, float*);
 using TitleFn = const char* (*)(const CubeLut*);
 using GenerateFn = void (*)(CubeLut*, int);
 using WriteFn = bool (*)(CubeLut*, const char*);
-static_assert(std::is_same_v<decltype(&CubeLut::loadCubeFile), int (CubeLut::*)(std::ifstream&)>);
-static_assert(std::is_same_v<decltype(&CubeLut::load3DlFile), int (CubeLut::*)(std::ifstream&)>);
+static_assert(std::is_same_v<decltype(&CubeLut::loadCubeFileWithStop),
+                             int (CubeLut::*)(std::ifstream&, CubeLut::Stop*)>);
+static_assert(std::is_same_v<decltype(&CubeLut::load3DlFileWithStop),
+                             int (CubeLut::*)(std::ifstream&, CubeLut::Stop*)>);
+// Static members are plain functions.
+static_assert(std::is_same_v<decltype(&CubeLut::loadCubeLattice), LoadLatticeFn>);
+static_assert(std::is_same_v<decltype(&CubeLut::stopMessage), StopMessageFn>);
+static_assert(std::is_same_v<decltype(&CubeLut::interpolate), InterpolateFn>);
 static_assert(
     std::is_same_v<decltype(&CubeLut::getLut3DData), float* (CubeLut::*)(int*, int*, int*, int*)>);
 static_assert(
@@ -39,6 +46,9 @@ struct PluginCubeLut::Members {
   DtorFn destroy = nullptr;    // complete-object destructor (D1): the storage is ours
   LoadFn loadCube = nullptr;
   LoadFn load3Dl = nullptr;
+  LoadLatticeFn loadLattice = nullptr;
+  StopMessageFn stopMessage = nullptr;
+  InterpolateFn interpolate = nullptr;
   LatticeFn lattice = nullptr;
   DomainFn domain = nullptr;
   TitleFn title = nullptr;
@@ -52,10 +62,19 @@ Status PluginCubeLut::Create(const PluginLibrary& plugin, std::unique_ptr<Plugin
   const Status found[] = {
       plugin.Resolve("_ZN7CubeLutC1Ev", &m->construct),
       plugin.Resolve("_ZN7CubeLutD1Ev", &m->destroy),
-      plugin.Resolve("_ZN7CubeLut12loadCubeFileERSt14basic_ifstreamIcSt11char_traitsIcEE",
-                     &m->loadCube),
-      plugin.Resolve("_ZN7CubeLut11load3DlFileERSt14basic_ifstreamIcSt11char_traitsIcEE",
-                     &m->load3Dl),
+      plugin.Resolve(
+          "_ZN7CubeLut20loadCubeFileWithStopERSt14basic_ifstreamIcSt11char_traitsIcEEPNS_4StopE",
+          &m->loadCube),
+      plugin.Resolve(
+          "_ZN7CubeLut19load3DlFileWithStopERSt14basic_ifstreamIcSt11char_traitsIcEEPNS_4StopE",
+          &m->load3Dl),
+      plugin.Resolve("_ZN7CubeLut15loadCubeLatticeERSt14basic_ifstreamIcSt11char_traitsIcEEPSt6"
+                     "vectorIfSaIfEEPiPNS_4StopE",
+                     &m->loadLattice),
+      plugin.Resolve("_ZN7CubeLut11stopMessageERKNSt7__cxx1112basic_stringIcSt11char_traitsIcESaIc"
+                     "EEERKNS_4StopE",
+                     &m->stopMessage),
+      plugin.Resolve("_ZN7CubeLut11interpolateEPKfifffPf", &m->interpolate),
       plugin.Resolve("_ZN7CubeLut12getLut3DDataEPiS0_S0_S0_", &m->lattice),
       plugin.Resolve("_ZNK7CubeLut9getDomainEPfS0_", &m->domain),
       plugin.Resolve("_ZNK7CubeLut8getTitleEv", &m->title),
@@ -79,9 +98,27 @@ PluginCubeLut::PluginCubeLut(const PluginLibrary& plugin, std::unique_ptr<Member
 
 PluginCubeLut::~PluginCubeLut() { members_->destroy(object_); }
 
-int PluginCubeLut::LoadCube(std::ifstream& in) const { return members_->loadCube(object_, in); }
+int PluginCubeLut::LoadCube(std::ifstream& in, CubeLut::Stop* stop) const {
+  return members_->loadCube(object_, in, stop);
+}
 
-int PluginCubeLut::Load3Dl(std::ifstream& in) const { return members_->load3Dl(object_, in); }
+int PluginCubeLut::Load3Dl(std::ifstream& in, CubeLut::Stop* stop) const {
+  return members_->load3Dl(object_, in, stop);
+}
+
+int PluginCubeLut::LoadCubeLattice(std::ifstream& in, std::vector<float>* points, int* size,
+                                   CubeLut::Stop* stop) const {
+  return members_->loadLattice(in, points, size, stop);
+}
+
+std::string PluginCubeLut::StopMessage(const std::string& file, const CubeLut::Stop& stop) const {
+  return members_->stopMessage(file, stop);
+}
+
+void PluginCubeLut::Interpolate(const float* points, int size, float red, float green, float blue,
+                                float out[3]) const {
+  members_->interpolate(points, size, red, green, blue, out);
+}
 
 float* PluginCubeLut::Lattice(int* size) const {
   return members_->lattice(object_, size, nullptr, nullptr, nullptr);

@@ -1,4 +1,5 @@
-// A CubeLut object of the loaded plug-in, driven through the members it exports. The tool is a
+// A CubeLut object of the loaded plug-in, driven through the members it exports, and the
+// class's static functions beside it. The tool is a
 // dlopen host and never links the plug-in, so it cannot call CubeLut's members or even name its
 // type information (which a sanitizer's checks of member calls would need); instead it resolves
 // each member by its symbol and calls it with the object as the first argument, as the compiler
@@ -9,11 +10,11 @@
 #include <fstream>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "PluginLibrary.h"
 #include "Status.h"
-
-class CubeLut;
+#include "tessarofx/CubeLut.h"
 
 namespace tfxtool {
 
@@ -28,9 +29,17 @@ class PluginCubeLut {
   CubeLut* get() const { return object_; }
 
   // The plug-in's readers on a stream the caller opened (binary); they return the status code
-  // and leave the stream where they stopped.
-  int LoadCube(std::ifstream& in) const;
-  int Load3Dl(std::ifstream& in) const;
+  // and say in `stop` where they stopped.
+  int LoadCube(std::ifstream& in, CubeLut::Stop* stop) const;
+  int Load3Dl(std::ifstream& in, CubeLut::Stop* stop) const;
+  // The plug-in's ".CUBE" reader for tables of any size the format allows, into caller memory.
+  int LoadCubeLattice(std::ifstream& in, std::vector<float>* points, int* size,
+                      CubeLut::Stop* stop) const;
+  // The plug-in's complaint about a file a reader stopped on.
+  std::string StopMessage(const std::string& file, const CubeLut::Stop& stop) const;
+  // The plug-in's tetrahedral interpolation of a lattice of any size at a position.
+  void Interpolate(const float* points, int size, float red, float green, float blue,
+                   float out[3]) const;
 
   // The 64-strided float lattice, lattice[((i * 64 + j) * 64 + k) * 3 + c] for red index i,
   // green j, blue k; *size receives N.
