@@ -1,9 +1,8 @@
 // A CubeLut object of the loaded plug-in, driven through the members it exports, and the
-// class's static functions beside it. The tool is a
-// dlopen host and never links the plug-in, so it cannot call CubeLut's members or even name its
-// type information (which a sanitizer's checks of member calls would need); instead it resolves
-// each member by its symbol and calls it with the object as the first argument, as the compiler
-// would.
+// class's static functions beside it. The tool is a dlopen host and never links the plug-in, so
+// it cannot call CubeLut's members or even name its type information (which a sanitizer's checks
+// of member calls would need); instead it resolves each member by its symbol and calls it with
+// the object as the first argument, as the compiler would; static members take no object.
 #pragma once
 
 #include <cstddef>

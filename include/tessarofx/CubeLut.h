@@ -102,8 +102,9 @@ class TFX_API CubeLut {
   // Reads a ".CUBE" file as loadCubeFile does (the same keywords, line skipping, sticky missing
   // components, status codes and Stop lines, the domain's width as the scale) but up to
   // kMaxFileSize points per axis, into `points` rather than an object: point (i, j, k) = (red,
-  // green, blue index) at ((i * n + j) * n + k) * 3, and *size receives n (0 on failure). For
-  // tables too big for the lattice, which a caller resamples. Returns the status code.
+  // green, blue index) at ((i * n + j) * n + k) * 3, and *size receives n (on failure 0, and
+  // `points` is left empty). For tables too big for the lattice, which a caller resamples.
+  // Returns the status code.
   static int loadCubeLattice(std::ifstream& in, std::vector<float>* points, int* size, Stop* stop);
 
   // What a status code means, in words: "" for 0, "unknown status" for a code no reader gives.
