@@ -8,7 +8,7 @@
 #include <cstring>
 #include <opencv2/imgproc.hpp>
 
-#include "../tools/DemoScene.h"
+#include "media/DemoScene.h"
 #include "support/EffectHarness.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"

@@ -8,8 +8,8 @@
 #include <string>
 #include <thread>
 
-#include "../tools/DemoScene.h"
 #include "lut/CubeLutApply.h"
+#include "media/DemoScene.h"
 #include "support/EffectHarness.h"
 #include "support/ImageBuilders.h"
 #include "support/OpenCLHarness.h"

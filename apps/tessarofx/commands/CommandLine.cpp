@@ -1,7 +1,7 @@
 #include <cctype>
 #include <cstring>
 
-#include "Commands.h"
+#include "commands/Commands.h"
 
 namespace tfxtool {
 

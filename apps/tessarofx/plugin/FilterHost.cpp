@@ -1,12 +1,12 @@
-#include "FilterHost.h"
+#include "plugin/FilterHost.h"
 
 #include <sys/stat.h>
 
 #include <algorithm>
 #include <cctype>
 
-#include "OpenCLDevices.h"
-#include "Text.h"
+#include "media/Text.h"
+#include "plugin/OpenCLDevices.h"
 #include "tessarofx/NLECGFilter.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/NLEOpenCL.h"

@@ -1,4 +1,4 @@
-#include "FilterTable.h"
+#include "plugin/FilterTable.h"
 
 #include <cctype>
 

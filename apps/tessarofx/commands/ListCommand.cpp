@@ -1,9 +1,9 @@
 #include <cstdio>
 #include <string>
 
-#include "Commands.h"
-#include "FilterHost.h"
-#include "Text.h"
+#include "commands/Commands.h"
+#include "media/Text.h"
+#include "plugin/FilterHost.h"
 
 namespace tfxtool {
 namespace {

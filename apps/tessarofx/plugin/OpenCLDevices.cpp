@@ -1,4 +1,4 @@
-#include "OpenCLDevices.h"
+#include "plugin/OpenCLDevices.h"
 
 #include <fcntl.h>
 #include <sys/wait.h>
@@ -8,7 +8,7 @@
 #include <cstdlib>
 #include <cstring>
 
-#include "Text.h"
+#include "media/Text.h"
 
 namespace tfxtool {
 namespace {

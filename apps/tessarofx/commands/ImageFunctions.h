@@ -7,8 +7,8 @@
 #include <string>
 #include <vector>
 
-#include "PluginLibrary.h"
 #include "Status.h"
+#include "plugin/PluginLibrary.h"
 
 namespace tfxtool {
 

@@ -5,7 +5,7 @@
 #include <functional>
 #include <vector>
 
-#include "ImageFunctions.h"
+#include "commands/ImageFunctions.h"
 #include "tessarofx/CxImage.h"
 
 namespace tfxtool {

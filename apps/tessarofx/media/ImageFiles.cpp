@@ -1,4 +1,4 @@
-#include "ImageFiles.h"
+#include "media/ImageFiles.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>

@@ -1,11 +1,11 @@
 #include <cstdio>
 #include <limits>
 
-#include "Commands.h"
-#include "FilterHost.h"
-#include "ImageFiles.h"
-#include "OpenCLDevices.h"
-#include "Text.h"
+#include "commands/Commands.h"
+#include "media/ImageFiles.h"
+#include "media/Text.h"
+#include "plugin/FilterHost.h"
+#include "plugin/OpenCLDevices.h"
 
 namespace tfxtool {
 namespace {

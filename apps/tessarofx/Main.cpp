@@ -6,9 +6,9 @@
 #include <exception>
 #include <opencv2/core.hpp>
 
-#include "Commands.h"
-#include "FilterTable.h"
-#include "Text.h"
+#include "commands/Commands.h"
+#include "media/Text.h"
+#include "plugin/FilterTable.h"
 #include "tessarofx/NLEHost.h"
 
 namespace tfxtool {

@@ -11,7 +11,7 @@
 #include <opencv2/imgproc.hpp>
 #include <type_traits>
 
-#include "FxSupport.h"
+#include "commands/FxSupport.h"
 #include "tessarofx/Blur.h"
 #include "tessarofx/Compositing.h"
 #include "tessarofx/Denoise.h"

@@ -1,12 +1,12 @@
-#include "ImageFunctions.h"
+#include "commands/ImageFunctions.h"
 
 #include <new>
 #include <opencv2/imgproc.hpp>
 #include <type_traits>
 
-#include "FilterTable.h"
-#include "FxSupport.h"
-#include "Text.h"
+#include "commands/FxSupport.h"
+#include "media/Text.h"
+#include "plugin/FilterTable.h"
 #include "tessarofx/ColorAdjust.h"
 #include "tessarofx/CxImage.h"
 #include "tessarofx/HSLAdjust.h"

@@ -7,9 +7,9 @@
 #include <string>
 #include <vector>
 
-#include "FilterTable.h"
-#include "PluginLibrary.h"
 #include "Status.h"
+#include "plugin/FilterTable.h"
+#include "plugin/PluginLibrary.h"
 #include "tessarofx/NLEProperties.h"
 
 namespace tfxtool {

@@ -7,13 +7,13 @@
 #include <type_traits>
 #include <vector>
 
-#include "Commands.h"
-#include "FilterHost.h"
-#include "FilterTable.h"
-#include "ImageFiles.h"
-#include "LutFiles.h"
-#include "PluginCubeLut.h"
-#include "Text.h"
+#include "commands/Commands.h"
+#include "media/ImageFiles.h"
+#include "media/LutFiles.h"
+#include "media/Text.h"
+#include "plugin/FilterHost.h"
+#include "plugin/FilterTable.h"
+#include "plugin/PluginCubeLut.h"
 #include "tessarofx/CubeLut.h"
 #include "tessarofx/Lut3dAdjust.h"
 

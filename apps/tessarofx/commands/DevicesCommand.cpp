@@ -2,8 +2,8 @@
 #include <cstdio>
 #include <cstring>
 
-#include "Commands.h"
-#include "OpenCLDevices.h"
+#include "commands/Commands.h"
+#include "plugin/OpenCLDevices.h"
 
 namespace tfxtool {
 

@@ -5,13 +5,13 @@
 #include <cstring>
 #include <map>
 
-#include "Commands.h"
-#include "DemoScene.h"
-#include "FilterHost.h"
-#include "ImageFiles.h"
-#include "ImageFunctions.h"
-#include "OpenCLDevices.h"
-#include "Text.h"
+#include "commands/Commands.h"
+#include "commands/ImageFunctions.h"
+#include "media/DemoScene.h"
+#include "media/ImageFiles.h"
+#include "media/Text.h"
+#include "plugin/FilterHost.h"
+#include "plugin/OpenCLDevices.h"
 #include "tessarofx/NLEComBase.h"
 
 namespace tfxtool {

@@ -1,11 +1,11 @@
 #include <cstdio>
 #include <string>
 
-#include "Commands.h"
-#include "FilterTable.h"
-#include "ImageFiles.h"
-#include "ImageFunctions.h"
-#include "Text.h"
+#include "commands/Commands.h"
+#include "commands/ImageFunctions.h"
+#include "media/ImageFiles.h"
+#include "media/Text.h"
+#include "plugin/FilterTable.h"
 
 namespace tfxtool {
 namespace {

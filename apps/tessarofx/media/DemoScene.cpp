@@ -1,4 +1,4 @@
-#include "DemoScene.h"
+#include "media/DemoScene.h"
 
 #include <algorithm>
 #include <cmath>
