@@ -17,7 +17,8 @@ set_target_properties(TessaroFx TessaroFxHost PROPERTIES
 # loads the plug-in: the loader finds the kit beside it.
 set_target_properties(TessaroFx PROPERTIES INSTALL_RPATH "$ORIGIN")
 file(RELATIVE_PATH TFX_BIN_TO_LIB ${CMAKE_INSTALL_FULL_BINDIR} ${CMAKE_INSTALL_FULL_LIBDIR})
-# The same entry also serves the tool's dlopen of the plug-in by its SONAME.
+# The same entry finds the linked image functions and serves the tool's dlopen of the plug-in
+# by its SONAME.
 set_target_properties(tessarofx PROPERTIES INSTALL_RPATH "$ORIGIN/${TFX_BIN_TO_LIB}")
 
 install(TARGETS TessaroFx TessaroFxHost tessarofx)

@@ -41,7 +41,7 @@ Commands:
       OUTPUT; merge and wb-rates read a SECOND image; white-point and wb-rates print
       measurements instead of writing.
   fx --list
-      Those functions, their arguments and the symbols they are found by.
+      Those functions, their arguments and their ranges.
   lut info FILE
       Reads a .cube or .3dl file with the plug-in's reader and prints its size, title
       and domain, or the line where reading stopped and why.

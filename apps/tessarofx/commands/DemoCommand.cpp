@@ -282,7 +282,7 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
       if (!s.ok()) break;
       const cv::Mat* second = nullptr;
       if (stage.second == "input") second = &input;
-      s = CallImageFunction(plugin, call, &image, second);
+      s = CallImageFunction(call, &image, second);
       if (!s.ok()) break;
     }
     const std::string file = dir + "/" + step.label + ".png";

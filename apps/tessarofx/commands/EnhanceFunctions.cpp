@@ -9,7 +9,6 @@
 #include <cstring>
 #include <memory>
 #include <opencv2/imgproc.hpp>
-#include <type_traits>
 
 #include "commands/FxSupport.h"
 #include "tessarofx/Blur.h"
@@ -21,112 +20,36 @@
 namespace tfxtool {
 namespace {
 
-using ImageFloatFn = CxImage* (*)(CxImage*, float);
-using ImageFloat2Fn = CxImage* (*)(CxImage*, float, float);
-using BlurFn = void (*)(unsigned char*, int, int, int, int);
-using StackPassFn = void (*)(unsigned char*, unsigned, unsigned, int, unsigned, int);
-using WindowFn = void (*)(const unsigned char*, unsigned char*, int, int, int);
-using PercentileFn = void (*)(const unsigned char*, unsigned char*, int, int, int, float);
-using DctFn = void (*)(const unsigned char*, unsigned char*, int, int, int, float);
-using PlaneDenoiseFn = void (*)(unsigned char*, int, int, int, float);
-using DarkChannelFn = unsigned char* (*)(CxImage*, uint32_t*, uint32_t*);
-using VeilFn = unsigned char* (*)(const unsigned char*, const unsigned char*, int, int, float);
-using MeanFn = unsigned char (*)(const unsigned char*, int, int, int);
-using RgbToXyzFn = void (*)(unsigned char, unsigned char, unsigned char, float&, float&, float&);
-using XyzToXyFn = void (*)(float, float, float, float&, float&, float&);
-using CctFn = int64_t (*)(float, float);
-using TemperatureFn = int64_t (*)(int, int, int);
-using RateFn = double (*)(const unsigned char*, const unsigned char*, int, int);
-using CopyRowFn = unsigned char* (*)(unsigned char*, unsigned char*, int, int);
-using FrameFn = int (*)(unsigned char**, int*, int*, const unsigned char*, int, int, int, int,
-                        PIPNLERGB, int);
-using ScaleFn = int (*)(unsigned char**, int*, int*, const unsigned char*, int, int, int, PIPNLERGB,
-                        int);
-using MergeFn = bool (*)(unsigned char*, const unsigned char*, int, int, int, int, int, int, int,
-                         int, int, int, int, int, int);
-using ClipFn = bool (*)(const unsigned char*, unsigned char*, int, int, int, int, int, int);
-using PadBlurFn = int (*)(unsigned char**, int*, int*, const unsigned char*, int, int, int, int);
-static_assert(std::is_same_v<decltype(&deNoiseRGB), ImageFloatFn>);
-static_assert(std::is_same_v<decltype(&deNoiseLumiance), ImageFloatFn>);
-static_assert(std::is_same_v<decltype(&dehaze), ImageFloatFn>);
-static_assert(std::is_same_v<decltype(&sharpen), ImageFloatFn>);
-static_assert(std::is_same_v<decltype(&clarity), ImageFloatFn>);
-static_assert(std::is_same_v<decltype(&diffuse), ImageFloatFn>);
-static_assert(std::is_same_v<decltype(&addNoiseFilter), ImageFloat2Fn>);
-static_assert(std::is_same_v<decltype(&gaussianBlur), BlurFn>);
-static_assert(std::is_same_v<decltype(&fastAverageBlur), BlurFn>);
-static_assert(std::is_same_v<decltype(&stackblur), StackPassFn>);
-static_assert(std::is_same_v<decltype(&fastWindowAverageFilter), WindowFn>);
-static_assert(std::is_same_v<decltype(&fastWindowVarianceFilter), WindowFn>);
-static_assert(std::is_same_v<decltype(&fastFilter), PercentileFn>);
-static_assert(std::is_same_v<decltype(&dct_Denosing), DctFn>);
-static_assert(std::is_same_v<decltype(&channelDenoise), PlaneDenoiseFn>);
-static_assert(std::is_same_v<decltype(&getMinDarkChannel), DarkChannelFn>);
-static_assert(std::is_same_v<decltype(&calL), VeilFn>);
-static_assert(std::is_same_v<decltype(&channelMean), MeanFn>);
-static_assert(std::is_same_v<decltype(&rgb2xyz), RgbToXyzFn>);
-static_assert(std::is_same_v<decltype(&xyz2xy), XyzToXyFn>);
-static_assert(std::is_same_v<decltype(&xy_to_CCT_Hernandez1999), CctFn>);
-static_assert(std::is_same_v<decltype(&rgb2temperature), TemperatureFn>);
-static_assert(std::is_same_v<decltype(&getAutoWhiteBalanceCCTChangeRate), RateFn>);
-static_assert(std::is_same_v<decltype(&getAutoWhiteBalanceTintChangeRate), RateFn>);
-static_assert(std::is_same_v<decltype(&doAutoWhiteBalance), CopyRowFn>);
-static_assert(std::is_same_v<decltype(&makeImageFrame), FrameFn>);
-static_assert(std::is_same_v<decltype(&scaleImage), ScaleFn>);
-static_assert(std::is_same_v<decltype(&mergeImage), MergeFn>);
-static_assert(std::is_same_v<decltype(&clipOutBorder), ClipFn>);
-static_assert(std::is_same_v<decltype(&blurImage), PadBlurFn>);
-
-constexpr const char* kWindowMeanSymbol = "_Z23fastWindowAverageFilterPKhPhiii";
-constexpr const char* kDarkChannelSymbol = "_Z17getMinDarkChannelP7CxImagePjS1_";
-constexpr const char* kMeanSymbol = "_Z11channelMeanPKhiii";
-constexpr const char* kRgbToXyzSymbol = "_Z7rgb2xyzhhhRfS_S_";
-constexpr const char* kXyzToXySymbol = "_Z6xyz2xyfffRfS_S_";
-constexpr const char* kCctSymbol = "_Z23xy_to_CCT_Hernandez1999ff";
-constexpr const char* kTemperatureSymbol = "_Z15rgb2temperatureiii";
-constexpr const char* kTintRateSymbol = "_Z33getAutoWhiteBalanceTintChangeRatePKhS0_ii";
-constexpr const char* kMergeSymbol = "_Z10mergeImagePhPKhiiiiiiiiiiiii";
-
-template <class Fn>
-Status Resolve(const FxContext& fx, Fn* fn) {
-  return fx.plugin.Resolve(fx.function.symbol, fn);
-}
-
 // The buffer functions take packed rows; a Mat from the image reader is packed already.
 cv::Mat Packed(const cv::Mat& m) { return m.isContinuous() ? m : m.clone(); }
 
+template <CxImage* (*Fn)(CxImage*, float, float)>
 Status RunImageFloat2(const FxContext& fx) {
-  ImageFloat2Fn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
-  return WithPluginImage(fx.plugin, fx.image,
-                         [&](CxImage* image) { fn(image, ArgF(fx, 0), ArgF(fx, 1)); });
+  WrappedImage image(fx.image);
+  Fn(image.get(), ArgF(fx, 0), ArgF(fx, 1));
+  return Status::Ok();
 }
 
 // gaussianBlur on the BGRA rows themselves: 4 channels, colour held at or below alpha.
 Status RunBgraBlur(const FxContext& fx) {
-  BlurFn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
   *fx.image = Packed(*fx.image);
-  fn(fx.image->data, fx.image->cols, fx.image->rows, 4, ArgI(fx, 0));
+  gaussianBlur(fx.image->data, fx.image->cols, fx.image->rows, 4, ArgI(fx, 0));
   return Status::Ok();
 }
 
 Status RunStackPass(const FxContext& fx) {
-  StackPassFn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
   *fx.image = Packed(*fx.image);
-  fn(fx.image->data, static_cast<unsigned>(fx.image->cols), static_cast<unsigned>(fx.image->rows),
-     4, static_cast<unsigned>(ArgI(fx, 0)), ArgI(fx, 1));
+  stackblur(fx.image->data, static_cast<unsigned>(fx.image->cols),
+            static_cast<unsigned>(fx.image->rows), 4, static_cast<unsigned>(ArgI(fx, 0)),
+            ArgI(fx, 1));
   return Status::Ok();
 }
 
 // fastAverageBlur on three channels: with four it would blur blue alone.
 Status RunBgrBlur(const FxContext& fx) {
-  BlurFn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
   cv::Mat bgr;
   cv::cvtColor(*fx.image, bgr, cv::COLOR_BGRA2BGR);
-  fn(bgr.data, bgr.cols, bgr.rows, 3, ArgI(fx, 0));
+  fastAverageBlur(bgr.data, bgr.cols, bgr.rows, 3, ArgI(fx, 0));
   const int fromTo[] = {0, 0, 1, 1, 2, 2};
   cv::mixChannels(&bgr, 1, fx.image, 1, fromTo, 3);
   return Status::Ok();
@@ -145,44 +68,37 @@ void OnColourPlanes(cv::Mat* bgra, Each each) {
   }
 }
 
+template <void (*Fn)(const unsigned char*, unsigned char*, int, int, int)>
 Status RunWindow(const FxContext& fx) {
-  WindowFn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
   OnColourPlanes(fx.image, [&](const cv::Mat& in, cv::Mat& out) {
-    fn(in.data, out.data, in.cols, in.rows, ArgI(fx, 0));
+    Fn(in.data, out.data, in.cols, in.rows, ArgI(fx, 0));
   });
   return Status::Ok();
 }
 
 Status RunPercentile(const FxContext& fx) {
-  PercentileFn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
   OnColourPlanes(fx.image, [&](const cv::Mat& in, cv::Mat& out) {
-    fn(in.data, out.data, in.cols, in.rows, ArgI(fx, 0), ArgF(fx, 1));
+    fastFilter(in.data, out.data, in.cols, in.rows, ArgI(fx, 0), ArgF(fx, 1));
   });
   return Status::Ok();
 }
 
 Status RunDct(const FxContext& fx) {
-  DctFn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
   OnColourPlanes(fx.image, [&](const cv::Mat& in, cv::Mat& out) {
-    fn(in.data, out.data, in.cols, in.rows, in.cols, ArgF(fx, 0));
+    dct_Denosing(in.data, out.data, in.cols, in.rows, in.cols, ArgF(fx, 0));
   });
   return Status::Ok();
 }
 
 Status RunPlaneDenoise(const FxContext& fx) {
-  PlaneDenoiseFn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
   OnColourPlanes(fx.image, [&](const cv::Mat&, cv::Mat& out) {
-    fn(out.data, out.cols, out.rows, ArgI(fx, 0), ArgF(fx, 1));
+    channelDenoise(out.data, out.cols, out.rows, ArgI(fx, 0), ArgF(fx, 1));
   });
   return Status::Ok();
 }
 
-// A plane the plug-in allocated with array new; the tool frees it with delete[], as a host
-// that links the library does.
+// A plane the library allocated with array new; the tool frees it with delete[], as the
+// functions' headers ask.
 using PluginPlane = std::unique_ptr<unsigned char[]>;
 
 void ShowGrey(const unsigned char* plane, cv::Mat* bgra) {
@@ -191,12 +107,9 @@ void ShowGrey(const unsigned char* plane, cv::Mat* bgra) {
 }
 
 Status DarkChannel(const FxContext& fx, PluginPlane* dark) {
-  DarkChannelFn fn = nullptr;
-  if (Status s = fx.plugin.Resolve(kDarkChannelSymbol, &fn); !s.ok()) return s;
-  Status s = WithPluginImage(fx.plugin, fx.image,
-                             [&](CxImage* image) { dark->reset(fn(image, nullptr, nullptr)); });
-  if (s.ok() && !*dark) s = Status::Error("getMinDarkChannel made no plane");
-  return s;
+  WrappedImage image(fx.image);
+  dark->reset(getMinDarkChannel(image.get(), nullptr, nullptr));
+  return *dark ? Status::Ok() : Status::Error("getMinDarkChannel made no plane");
 }
 
 Status RunDarkChannel(const FxContext& fx) {
@@ -208,16 +121,12 @@ Status RunDarkChannel(const FxContext& fx) {
 
 // The veil dehaze subtracts: the dark channel against its 15 x 15 mean times FACTOR.
 Status RunHazeVeil(const FxContext& fx) {
-  VeilFn veil = nullptr;
-  WindowFn mean = nullptr;
-  if (Status s = Resolve(fx, &veil); !s.ok()) return s;
-  if (Status s = fx.plugin.Resolve(kWindowMeanSymbol, &mean); !s.ok()) return s;
   PluginPlane dark;
   if (Status s = DarkChannel(fx, &dark); !s.ok()) return s;
   const int w = fx.image->cols, h = fx.image->rows;
   std::vector<unsigned char> averaged(static_cast<size_t>(w) * h);
-  mean(dark.get(), averaged.data(), w, h, 7);
-  const PluginPlane result(veil(dark.get(), averaged.data(), w, h, ArgF(fx, 0)));
+  fastWindowAverageFilter(dark.get(), averaged.data(), w, h, 7);
+  const PluginPlane result(calL(dark.get(), averaged.data(), w, h, ArgF(fx, 0)));
   if (!result) return Status::Error("calL made no plane");
   ShowGrey(result.get(), fx.image);
   return Status::Ok();
@@ -231,58 +140,44 @@ std::string Line(const char* format, double a, double b = 0, double c = 0) {
 
 // The mean colour and what the colour-science steps make of it.
 Status RunWhitePoint(const FxContext& fx) {
-  MeanFn mean = nullptr;
-  RgbToXyzFn toXyz = nullptr;
-  XyzToXyFn toXy = nullptr;
-  CctFn cct = nullptr;
-  TemperatureFn temperature = nullptr;
-  for (Status s :
-       {fx.plugin.Resolve(kMeanSymbol, &mean), fx.plugin.Resolve(kRgbToXyzSymbol, &toXyz),
-        fx.plugin.Resolve(kXyzToXySymbol, &toXy), fx.plugin.Resolve(kCctSymbol, &cct),
-        fx.plugin.Resolve(kTemperatureSymbol, &temperature)}) {
-    if (!s.ok()) return s;
-  }
   const cv::Mat px = Packed(*fx.image);
   const int w = px.cols, h = px.rows;
-  const unsigned char r = mean(px.data, w, h, 2), g = mean(px.data, w, h, 1),
-                      b = mean(px.data, w, h, 0);
+  const unsigned char r = channelMean(px.data, w, h, 2), g = channelMean(px.data, w, h, 1),
+                      b = channelMean(px.data, w, h, 0);
   float X = 0, Y = 0, Z = 0, x = 0, y = 0, Yxy = 0;
-  toXyz(r, g, b, X, Y, Z);
-  toXy(X, Y, Z, x, y, Yxy);
-  const int64_t mireds = cct(x, y);
+  rgb2xyz(r, g, b, X, Y, Z);
+  xyz2xy(X, Y, Z, x, y, Yxy);
+  const int64_t mireds = xy_to_CCT_Hernandez1999(x, y);
   *fx.report += Line("mean colour (channelMean)      R %.0f G %.0f B %.0f\n", r, g, b);
   *fx.report += Line("XYZ (rgb2xyz)                  %.6f %.6f %.6f\n", X, Y, Z);
   *fx.report += Line("xy (xyz2xy)                    %.6f %.6f\n", x, y);
   *fx.report +=
       Line("reciprocal CCT (xy_to_CCT_Hernandez1999)  %.0f mired\n", static_cast<double>(mireds));
   *fx.report += Line("black-body match (rgb2temperature)        %.0f K\n",
-                     static_cast<double>(temperature(r, g, b)));
+                     static_cast<double>(rgb2temperature(r, g, b)));
   return Status::Ok();
 }
 
 // How far the second image moved from the first, in slider units.
 Status RunWhiteBalanceRates(const FxContext& fx) {
-  RateFn cctRate = nullptr, tintRate = nullptr;
-  if (Status s = Resolve(fx, &cctRate); !s.ok()) return s;
-  if (Status s = fx.plugin.Resolve(kTintRateSymbol, &tintRate); !s.ok()) return s;
   if (fx.second->size() != fx.image->size()) {
     return Status::Error("the corrected image must have the source's size");
   }
   const cv::Mat src = Packed(*fx.image), corrected = Packed(*fx.second);
-  *fx.report += Line("temperature change (getAutoWhiteBalanceCCTChangeRate)   %.2f\n",
-                     cctRate(src.data, corrected.data, src.cols, src.rows));
-  *fx.report += Line("tint change (getAutoWhiteBalanceTintChangeRate)         %.2f\n",
-                     tintRate(src.data, corrected.data, src.cols, src.rows));
+  *fx.report +=
+      Line("temperature change (getAutoWhiteBalanceCCTChangeRate)   %.2f\n",
+           getAutoWhiteBalanceCCTChangeRate(src.data, corrected.data, src.cols, src.rows));
+  *fx.report +=
+      Line("tint change (getAutoWhiteBalanceTintChangeRate)         %.2f\n",
+           getAutoWhiteBalanceTintChangeRate(src.data, corrected.data, src.cols, src.rows));
   return Status::Ok();
 }
 
 // The placeholder copies one row into a transparent black image.
 Status RunCopyRow(const FxContext& fx) {
-  CopyRowFn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
   cv::Mat src = Packed(*fx.image);
   cv::Mat dst = cv::Mat::zeros(src.size(), CV_8UC4);
-  fn(src.data, dst.data, src.cols, src.rows);
+  doAutoWhiteBalance(src.data, dst.data, src.cols, src.rows);
   *fx.image = dst;
   return Status::Ok();
 }
@@ -310,46 +205,40 @@ Status Adopt(const FxContext& fx, int ok, unsigned char* out, int w, int h) {
 }
 
 Status RunFrame(const FxContext& fx) {
-  FrameFn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
   const cv::Mat src = Packed(*fx.image);
   unsigned char* out = nullptr;
   int w = 0, h = 0;
-  const int ok = fn(&out, &w, &h, src.data, src.cols, src.rows, static_cast<int>(src.step[0]), 32,
-                    Colour(fx), ArgI(fx, 4));
+  const int ok = makeImageFrame(&out, &w, &h, src.data, src.cols, src.rows,
+                                static_cast<int>(src.step[0]), 32, Colour(fx), ArgI(fx, 4));
   return Adopt(fx, ok, out, w, h);
 }
 
 Status RunScaleAlpha(const FxContext& fx) {
-  ScaleFn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
   const cv::Mat src = Packed(*fx.image);
   unsigned char* out = nullptr;
   int w = 0, h = 0;
-  const int ok = fn(&out, &w, &h, src.data, src.cols, src.rows, 32, Colour(fx), ArgI(fx, 4));
+  const int ok =
+      scaleImage(&out, &w, &h, src.data, src.cols, src.rows, 32, Colour(fx), ArgI(fx, 4));
   return Adopt(fx, ok, out, w, h);
 }
 
 Status RunPadBlur(const FxContext& fx) {
-  PadBlurFn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
   const cv::Mat src = Packed(*fx.image);
   unsigned char* out = nullptr;
   int w = 0, h = 0;
-  const int ok = fn(&out, &w, &h, src.data, src.cols, src.rows, 32, ArgI(fx, 0));
+  const int ok = blurImage(&out, &w, &h, src.data, src.cols, src.rows, 32, ArgI(fx, 0));
   return Adopt(fx, ok, out, w, h);
 }
 
 // The second image over the first at (X, Y), top-down as images are read; the function itself
 // counts rows bottom-up, so both go in flipped.
 Status RunMerge(const FxContext& fx) {
-  MergeFn fn = nullptr;
-  if (Status s = fx.plugin.Resolve(kMergeSymbol, &fn); !s.ok()) return s;
   cv::Mat dst, src;
   cv::flip(*fx.image, dst, 0);
   cv::flip(*fx.second, src, 0);
-  if (!fn(dst.data, src.data, dst.cols, dst.rows, src.cols, src.rows, static_cast<int>(src.step[0]),
-          ArgI(fx, 0), ArgI(fx, 1), -1, -1, 0, 0, ArgI(fx, 2), ArgI(fx, 3))) {
+  if (!mergeImage(dst.data, src.data, dst.cols, dst.rows, src.cols, src.rows,
+                  static_cast<int>(src.step[0]), ArgI(fx, 0), ArgI(fx, 1), -1, -1, 0, 0,
+                  ArgI(fx, 2), ArgI(fx, 3))) {
     return Status::Error("mergeImage failed");
   }
   cv::flip(dst, *fx.image, 0);
@@ -357,8 +246,6 @@ Status RunMerge(const FxContext& fx) {
 }
 
 Status RunClip(const FxContext& fx) {
-  ClipFn fn = nullptr;
-  if (Status s = Resolve(fx, &fn); !s.ok()) return s;
   const cv::Mat src = Packed(*fx.image);
   const int w = ArgI(fx, 0), h = ArgI(fx, 1);
   if (w > src.cols || h > src.rows) {
@@ -367,8 +254,8 @@ Status RunClip(const FxContext& fx) {
                          std::to_string(src.rows));
   }
   cv::Mat dst(h, w, CV_8UC4);
-  if (!fn(src.data, dst.data, src.cols, src.rows, static_cast<int>(src.step[0]), w, h,
-          static_cast<int>(dst.step[0]))) {
+  if (!clipOutBorder(src.data, dst.data, src.cols, src.rows, static_cast<int>(src.step[0]), w, h,
+                     static_cast<int>(dst.step[0]))) {
     return Status::Error("clipOutBorder failed");
   }
   *fx.image = dst;
@@ -390,145 +277,122 @@ const std::vector<ImageFunction>& EnhanceFunctions() {
   static const std::vector<ImageFunction> kFunctions = {
       {"blur",
        "gaussianBlur",
-       "_Z12gaussianBlurPhiiii",
        RunBgraBlur,
        {{"RADIUS", 1, 254}},
        "Stack Blur, rows then columns; colour stays at or below alpha (premultiplied)"},
       {"stack-pass",
        "stackblur",
-       "_Z9stackblurPhjjiji",
        RunStackPass,
        {{"RADIUS", 0, 255}, {"PASS", 1, 2}},
        "one Stack Blur pass: 1 along rows, 2 along columns"},
       {"box-blur",
        "fastAverageBlur",
-       "_Z15fastAverageBlurPhiiii",
        RunBgrBlur,
        {{"RADIUS", 1, 1000}},
        "box blur of the colours (2r+1)^2; needs an image taller than the radius"},
       {"window-mean",
        "fastWindowAverageFilter",
-       kWindowMeanSymbol,
-       RunWindow,
+       RunWindow<&fastWindowAverageFilter>,
        {{"RADIUS", 0, 1000}},
        "each colour plane: mean of the window clipped to the image"},
       {"window-variance",
        "fastWindowVarianceFilter",
-       "_Z24fastWindowVarianceFilterPKhPhiii",
-       RunWindow,
+       RunWindow<&fastWindowVarianceFilter>,
        {{"RADIUS", 0, 1000}},
        "each colour plane: window variance, low byte (above 255 it wraps)"},
       {"percentile",
        "fastFilter",
-       "_Z10fastFilterPKhPhiiif",
        RunPercentile,
        {{"RADIUS", 0, 1000}, {"PERCENTILE", 0, 1}},
        "each colour plane: 0 minimum, 0.5 median, 1 maximum (its 8-bit counts wrap above radius "
        "7)"},
       {"denoise",
        "deNoiseRGB",
-       "_Z10deNoiseRGBP7CxImagef",
-       RunImageFloat,
+       RunImageFloat<&deNoiseRGB>,
        {{"STRENGTH", 0, 1000}},
        "8x8 DCT threshold denoise of R, G, B; sigma = 0.15 strength"},
       {"denoise-hsl",
        "deNoiseLumiance",
-       "_Z15deNoiseLumianceP7CxImagef",
-       RunImageFloat,
+       RunImageFloat<&deNoiseLumiance>,
        {{"STRENGTH", 0, 1000}},
        "the same on hue, saturation and lightness"},
       {"dct-denoise",
        "dct_Denosing",
-       "_Z12dct_DenosingPKhPhiiif",
        RunDct,
        {{"SIGMA", 0, 1000}},
        "each colour plane: DCT threshold 3 sigma; the last 8 rows and columns pass through"},
       {"local-denoise",
        "channelDenoise",
-       "_Z14channelDenoisePhiiif",
        RunPlaneDenoise,
        {{"WINDOW", 1, 1001}, {"NOISE", 0, 65025}},
        "each colour plane: local mean/variance (Lee) filter"},
       {"dehaze",
        "dehaze",
-       "_Z6dehazeP7CxImagef",
-       RunImageFloat,
+       RunImageFloat<&dehaze>,
        {{"STRENGTH", -100, 100}},
        "above 0 removes haze (dark channel), below 0 adds it"},
       {"dark-channel",
        "getMinDarkChannel",
-       kDarkChannelSymbol,
        RunDarkChannel,
        {},
        "grey: the smallest of each pixel's colour bytes"},
       {"haze-veil",
        "calL",
-       "_Z4calLPKhS0_iif",
        RunHazeVeil,
        {{"FACTOR", 0, 1}},
        "grey: min(dark channel, its 15x15 mean x FACTOR), the veil dehaze removes",
        1,
        true,
-       {kDarkChannelSymbol, kWindowMeanSymbol}},
+       {"getMinDarkChannel", "fastWindowAverageFilter"}},
       {"sharpen",
        "sharpen",
-       "_Z7sharpenP7CxImagef",
-       RunImageFloat,
+       RunImageFloat<&sharpen>,
        {{"AMOUNT", -1000, 1000}},
        "Laplacian by AMOUNT/255; the result sits one pixel to the right"},
       {"clarity",
        "clarity",
-       "_Z7clarityP7CxImagef",
-       RunImageFloat,
+       RunImageFloat<&clarity>,
        {{"AMOUNT", -300, 300}},
        "unsharp mask, radius AMOUNT/2; below 0 softens"},
       {"diffuse",
        "diffuse",
-       "_Z7diffuseP7CxImagef",
-       RunImageFloat,
+       RunImageFloat<&diffuse>,
        {{"AMOUNT", -1440, 1440}},
        "brightens by 1+|sin(pi a/1440)|; above 0 also a radius-1 blur"},
       {"grain",
        "addNoiseFilter",
-       "_Z14addNoiseFilterP7CxImageff",
-       RunImageFloat2,
+       RunImageFloat2<&addNoiseFilter>,
        {{"AMOUNT", -1000, 1000}, {"FACTOR", -1000, 1000}},
        "monochrome grain of AMOUNT% x FACTOR%, the same on every call"},
       {"white-point",
        "channelMean",
-       kMeanSymbol,
        RunWhitePoint,
        {},
        "prints the mean colour, its XYZ, xy, reciprocal CCT and black-body match (no OUTPUT)",
        1,
        false,
-       {kRgbToXyzSymbol, kXyzToXySymbol, kCctSymbol, kTemperatureSymbol}},
+       {"rgb2xyz", "xyz2xy", "xy_to_CCT_Hernandez1999", "rgb2temperature"}},
       {"wb-rates",
        "getAutoWhiteBalanceCCTChangeRate",
-       "_Z32getAutoWhiteBalanceCCTChangeRatePKhS0_ii",
        RunWhiteBalanceRates,
        {},
        "prints the temperature and tint change from INPUT to CORRECTED (no OUTPUT)",
        2,
        false,
-       {kTintRateSymbol},
+       {"getAutoWhiteBalanceTintChangeRate"},
        "CORRECTED"},
       {"first-row",
        "doAutoWhiteBalance",
-       "_Z18doAutoWhiteBalancePhS_ii",
        RunCopyRow,
        {},
        "the balance placeholder: copies the first row into a transparent image"},
-      {"frame", "makeImageFrame", "_Z14makeImageFramePPhPiS1_PKhiiii9PIPNLERGBi", RunFrame,
-       ColourAnd({"BORDER", 0, 200}),
+      {"frame", "makeImageFrame", RunFrame, ColourAnd({"BORDER", 0, 200}),
        "an outline BORDER wide around the opaque part (alpha > 50), on a canvas 2 BORDER larger; "
        "RED lands in byte 0 (blue in BGRA), BLUE in byte 2"},
-      {"scale-alpha", "scaleImage", "_Z10scaleImagePPhPiS1_PKhiii9PIPNLERGBi", RunScaleAlpha,
-       ColourAnd({"BORDER", 0, 1000}),
+      {"scale-alpha", "scaleImage", RunScaleAlpha, ColourAnd({"BORDER", 0, 1000}),
        "the colour with the image's alpha, on a canvas 2 BORDER larger"},
       {"merge",
        "mergeImage",
-       kMergeSymbol,
        RunMerge,
        {{"X", -100000, 100000}, {"Y", -100000, 100000}, {"OVER%", 0, 100}, {"UNDER%", 0, 100}},
        "OVERLAY over INPUT at (X, Y), each alpha scaled by its opacity",
@@ -538,13 +402,11 @@ const std::vector<ImageFunction>& EnhanceFunctions() {
        "OVERLAY"},
       {"clip",
        "clipOutBorder",
-       "_Z13clipOutBorderPKhPhiiiiii",
        RunClip,
        {{"WIDTH", 1, 100000}, {"HEIGHT", 1, 100000}},
        "the centred WIDTH x HEIGHT block"},
       {"pad-blur",
        "blurImage",
-       "_Z9blurImagePPhPiS1_PKhiiii",
        RunPadBlur,
        {{"RADIUS", 0, 500}},
        "pads by RADIUS with the edge pixels and box-blurs, fading out at the edge"},

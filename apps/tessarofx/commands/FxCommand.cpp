@@ -21,23 +21,19 @@ std::string FileWords(const ImageFunction& fn) {
 void PrintFunctions() {
   std::printf("Image functions (fx NAME ARG... INPUT OUTPUT, unless shown otherwise):\n");
   for (const ImageFunction& fn : ImageFunctions()) {
-    std::printf("  %-18s %-22s %s\n      %s\n", fn.name, fn.function, fn.symbol, fn.meaning);
+    std::printf("  %-18s %s\n      %s\n", fn.name, fn.function, fn.meaning);
     if (fn.inputs != 1 || !fn.writes) std::printf("      files: %s\n", FileWords(fn).c_str());
-    for (const char* symbol : fn.also) std::printf("      also calls %s\n", symbol);
+    for (const char* other : fn.also) std::printf("      also calls %s\n", other);
     for (const FxArg& arg : fn.args) {
       std::printf("      %-12s %s..%s\n", arg.name, FormatNumber(arg.min).c_str(),
                   FormatNumber(arg.max).c_str());
     }
   }
-  std::printf("Support symbols:\n");
-  for (const SupportSymbol& s : ImageSupportSymbols()) {
-    std::printf("  %-30s %s\n", s.what, s.symbol);
-  }
 }
 
 }  // namespace
 
-Status FxCommand(const GlobalOptions& options, const Args& args) {
+Status FxCommand(const GlobalOptions&, const Args& args) {
   Args positional;
   bool optionsEnded = false;
   for (const std::string& a : args) {
@@ -74,15 +70,13 @@ Status FxCommand(const GlobalOptions& options, const Args& args) {
     if (Status s = CheckWritableFormat(paths.back()); !s.ok()) return s;
   }
 
-  PluginLibrary plugin;
-  if (Status s = plugin.Load(options.pluginPath); !s.ok()) return s;
   cv::Mat image, second;
   if (Status s = ReadImage(paths[0], &image); !s.ok()) return s;
   if (fn->inputs > 1) {
     if (Status s = ReadImage(paths[1], &second); !s.ok()) return s;
   }
   std::string report;
-  if (Status s = CallImageFunction(plugin, call, &image, &second, &report); !s.ok()) return s;
+  if (Status s = CallImageFunction(call, &image, &second, &report); !s.ok()) return s;
   std::fputs(report.c_str(), stdout);
   return fn->writes ? WriteImage(paths.back(), image) : Status::Ok();
 }

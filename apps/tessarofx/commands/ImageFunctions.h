@@ -1,6 +1,5 @@
-// The plug-in's exported free image functions, as the fx command calls them. The tool does not
-// link the plug-in, so each function is found by its C++ symbol name in the loaded library and
-// called through a pointer of the matching type.
+// The library's exported free image functions, as the fx command calls them: linked and called
+// like any C++ function, so the compiler checks every call against the public declarations.
 #pragma once
 
 #include <opencv2/core.hpp>
@@ -8,7 +7,6 @@
 #include <vector>
 
 #include "Status.h"
-#include "plugin/PluginLibrary.h"
 
 namespace tfxtool {
 
@@ -26,7 +24,6 @@ struct ImageFunction;
 // (possibly of another size); `second` is the second input of functions that take two images.
 // Functions that measure rather than change an image write lines of text to `report`.
 struct FxContext {
-  const PluginLibrary& plugin;
   const ImageFunction& function;
   const std::vector<double>& values;  // one per argument, checked against its range
   cv::Mat* image;
@@ -40,27 +37,18 @@ using FxRunner = Status (*)(const FxContext& fx);
 struct ImageFunction {
   const char* name;      // what the user types
   const char* function;  // the exported function, also accepted on the command line
-  const char* symbol;    // its mangled name in the plug-in
   FxRunner run;
   std::vector<FxArg> args;  // in call order
   const char* meaning;
   int inputs = 1;                    // images read: INPUT, or INPUT and a second image
   bool writes = true;                // false: prints a measurement instead of writing OUTPUT
-  std::vector<const char*> also{};   // further exported functions it calls, mangled
+  std::vector<const char*> also{};   // further exported functions it calls
   const char* secondName = nullptr;  // what the second image is, for the usage text
 };
 
 // Every function, colour adjustments first, then the enhancement library.
 const std::vector<ImageFunction>& ImageFunctions();
 const ImageFunction* FindImageFunction(const std::string& name);
-
-// Symbols the tool needs besides the functions themselves: the image class's wrapping
-// constructor and its destructor.
-struct SupportSymbol {
-  const char* what;
-  const char* symbol;
-};
-const std::vector<SupportSymbol>& ImageSupportSymbols();
 
 // A function with its arguments parsed and checked, ready to call.
 struct ImageCall {
@@ -73,7 +61,7 @@ Status PrepareImageCall(const ImageFunction& fn, const std::vector<std::string>&
 
 // Runs the call on a BGRA image (and the second image where the function takes one). A
 // measuring function leaves the image alone and returns its text in *report.
-Status CallImageFunction(const PluginLibrary& plugin, const ImageCall& call, cv::Mat* bgra,
-                         const cv::Mat* second = nullptr, std::string* report = nullptr);
+Status CallImageFunction(const ImageCall& call, cv::Mat* bgra, const cv::Mat* second = nullptr,
+                         std::string* report = nullptr);
 
 }  // namespace tfxtool

@@ -4,7 +4,6 @@
 #include <cstring>
 #include <fstream>
 #include <memory>
-#include <type_traits>
 #include <vector>
 
 #include "commands/Commands.h"
@@ -202,43 +201,29 @@ Status ConvertCommand(const GlobalOptions& options, const Args& args) {
 
 // ---- bake ---------------------------------------------------------------------------------
 
-// The twins, reached like every other plug-in function by symbol; their pointer types are tied
-// to the public declarations.
 using TwinFn = CubeLut* (*)(CubeLut*, float);
-using BalanceTwinFn = CubeLut* (*)(CubeLut*, float, float);
-static_assert(std::is_same_v<decltype(&lut3d_exposureAdjustment), TwinFn>);
-static_assert(std::is_same_v<decltype(&lut3d_brightnessAdjustment), TwinFn>);
-static_assert(std::is_same_v<decltype(&lut3d_contrastAdjustment), TwinFn>);
-static_assert(std::is_same_v<decltype(&lut3d_vibranceAdjustment), TwinFn>);
-static_assert(std::is_same_v<decltype(&lut3d_saturationAdjustment), TwinFn>);
-static_assert(std::is_same_v<decltype(&lut3d_hdrHighlight), TwinFn>);
-static_assert(std::is_same_v<decltype(&lut3d_hdrShadow), TwinFn>);
-static_assert(std::is_same_v<decltype(&lut3d_hdrWhiteLevel), TwinFn>);
-static_assert(std::is_same_v<decltype(&lut3d_hdrBlackLevel), TwinFn>);
-static_assert(std::is_same_v<decltype(&lut3d_adjustWhiteBalance), BalanceTwinFn>);
-constexpr const char* kBalanceTwin = "_Z24lut3d_adjustWhiteBalanceP7CubeLutff";
 
 // A filter whose effect depends on colour alone, and so can be baked: its parameters in the
 // order its effect applies them, each with the twin it feeds (null for WhiteBalanceAdjust's,
 // which all feed the one balance twin).
 struct BakeableFilter {
   const char* name;
-  std::vector<std::pair<const char*, const char*>> steps;  // parameter, twin symbol
+  std::vector<std::pair<const char*, TwinFn>> steps;  // parameter, twin
 };
 
 const std::vector<BakeableFilter>& BakeableFilters() {
   static const std::vector<BakeableFilter> kFilters = {
       {"ColorAdjust",
-       {{"u_exposure", "_Z24lut3d_exposureAdjustmentP7CubeLutf"},
-        {"u_brightness", "_Z26lut3d_brightnessAdjustmentP7CubeLutf"},
-        {"u_contrast", "_Z24lut3d_contrastAdjustmentP7CubeLutf"},
-        {"u_vib", "_Z24lut3d_vibranceAdjustmentP7CubeLutf"},
-        {"u_sat", "_Z26lut3d_saturationAdjustmentP7CubeLutf"}}},
+       {{"u_exposure", &lut3d_exposureAdjustment},
+        {"u_brightness", &lut3d_brightnessAdjustment},
+        {"u_contrast", &lut3d_contrastAdjustment},
+        {"u_vib", &lut3d_vibranceAdjustment},
+        {"u_sat", &lut3d_saturationAdjustment}}},
       {"LightAdjust",
-       {{"u_highLight", "_Z18lut3d_hdrHighlightP7CubeLutf"},
-        {"u_shadow", "_Z15lut3d_hdrShadowP7CubeLutf"},
-        {"u_whiteLevel", "_Z19lut3d_hdrWhiteLevelP7CubeLutf"},
-        {"u_blackLevel", "_Z19lut3d_hdrBlackLevelP7CubeLutf"}}},
+       {{"u_highLight", &lut3d_hdrHighlight},
+        {"u_shadow", &lut3d_hdrShadow},
+        {"u_whiteLevel", &lut3d_hdrWhiteLevel},
+        {"u_blackLevel", &lut3d_hdrBlackLevel}}},
       // The effect reads the gains and does not apply them; so does the bake.
       {"WhiteBalanceAdjust",
        {{"u_temperature", nullptr},
@@ -311,17 +296,13 @@ Status SetStepParam(const std::string& text, BakeStep* step) {
 // conversions of the values.
 Status ApplyStep(const PluginCubeLut& lut, const BakeStep& step) {
   if (!step.filter->steps.front().second) {
-    BalanceTwinFn balance = nullptr;
-    if (Status s = lut.Resolve(kBalanceTwin, &balance); !s.ok()) return s;
     // a = temperature / 200 and b = tint / 200 in double, passed as float.
-    balance(lut.get(), static_cast<float>(step.values[0] / 200.0),
-            static_cast<float>(step.values[1] / 200.0));
+    lut3d_adjustWhiteBalance(lut.get(), static_cast<float>(step.values[0] / 200.0),
+                             static_cast<float>(step.values[1] / 200.0));
     return Status::Ok();
   }
   for (size_t i = 0; i < step.values.size(); ++i) {
-    TwinFn twin = nullptr;
-    if (Status s = lut.Resolve(step.filter->steps[i].second, &twin); !s.ok()) return s;
-    twin(lut.get(), static_cast<float>(step.values[i]));
+    step.filter->steps[i].second(lut.get(), static_cast<float>(step.values[i]));
   }
   return Status::Ok();
 }
