@@ -6,6 +6,7 @@
 #include <cctype>
 
 #include "media/Text.h"
+#include "plugin/FilterChain.h"
 #include "plugin/OpenCLDevices.h"
 #include "tessarofx/NLECGFilter.h"
 #include "tessarofx/NLEHost.h"
@@ -218,6 +219,8 @@ Status BuildProperties(const ResolvedFilter& filter, const std::vector<ParamSett
   return Status::Ok();
 }
 
+}  // namespace
+
 // A host frame over a matrix's pixels; the matrix must outlive it.
 Status WrapFrame(const cv::Mat& bgra, NLEComPtr<INLEMemoryFrame>& frame) {
   NLEComPtr<INLEMemoryFrame> f;
@@ -233,8 +236,6 @@ Status WrapFrame(const cv::Mat& bgra, NLEComPtr<INLEMemoryFrame>& frame) {
   frame = f;
   return Status::Ok();
 }
-
-}  // namespace
 
 Status ReadPublishedFilters(const PluginLibrary& plugin, std::vector<PublishedFilter>* filters) {
   filters->clear();
@@ -303,10 +304,6 @@ Status ParseParamSetting(const std::string& text, ParamSetting* setting) {
   return Status::Ok();
 }
 
-namespace {
-
-// The filter with the settings applied: its CPU class without a device, else its OpenCL class.
-// Both classes get the same property bag, so a setting means the same on either path.
 Status CreateFilter(const PluginLibrary& plugin, const ResolvedFilter& filter,
                     const std::vector<ParamSetting>& settings, const OpenCLTarget* target,
                     NLEComPtr<INLECGFilter>& fx) {
@@ -329,6 +326,8 @@ Status CreateFilter(const PluginLibrary& plugin, const ResolvedFilter& filter,
                            " or did not build (see the log above)",
                        hr);
 }
+
+namespace {
 
 // One frame through the filter, driven as an editor drives it.
 HRESULT RunOnce(INLECGFilter* fx, INLEFrame* foreground, INLEFrame* background, INLEFrame* dst,
@@ -364,24 +363,9 @@ std::string OpenCLRunFailure(HRESULT hr) {
 Status RunFilter(const PluginLibrary& plugin, const ResolvedFilter& filter,
                  const std::vector<ParamSetting>& settings, const cv::Mat& foreground,
                  const cv::Mat& background, cv::Mat* out) {
-  NLEComPtr<INLECGFilter> fx;
-  if (Status s = CreateFilter(plugin, filter, settings, nullptr, fx); !s.ok()) return s;
-
-  cv::Mat dst(foreground.size(), CV_8UC4, cv::Scalar::all(0));
-  NLEComPtr<INLEMemoryFrame> fgFrame, bgFrame, dstFrame;
-  if (Status s = WrapFrame(foreground, fgFrame); !s.ok()) return s;
-  if (Status s = WrapFrame(background, bgFrame); !s.ok()) return s;
-  if (Status s = WrapFrame(dst, dstFrame); !s.ok()) return s;
-
-  const HRESULT hr =
-      RunOnce(fx.get(), fgFrame.get(), bgFrame.get(), dstFrame.get(), foreground.size());
-  // The filter borrowed the frames; drop it before they go.
-  fx.Reset();
-  if (NLE_FAILED(hr)) {
-    return Status::Error(filter.name + " failed: " + DescribeResult(hr), hr);
-  }
-  *out = dst;
-  return Status::Ok();
+  FilterChain chain;
+  if (Status s = FilterChain::Create(plugin, {{filter, settings}}, &chain); !s.ok()) return s;
+  return chain.Run(foreground, out, &background);
 }
 
 Status OpenOpenCLTarget(const PluginLibrary& plugin, int index, const std::string& kernelDir,

@@ -10,6 +10,8 @@
 #include "Status.h"
 #include "plugin/FilterTable.h"
 #include "plugin/PluginLibrary.h"
+#include "tessarofx/NLECGFilter.h"
+#include "tessarofx/NLEHost.h"
 #include "tessarofx/NLEProperties.h"
 
 namespace tfxtool {
@@ -58,6 +60,18 @@ struct ParamSetting {
 
 // Splits "NAME=VALUE".
 Status ParseParamSetting(const std::string& text, ParamSetting* setting);
+
+// The filter with the settings applied: its CPU class when `target` is null, else its OpenCL
+// class on the target's device. Both classes get the same property bag, so a setting means the
+// same on either path. NLEComPtr's operator& serves out-parameters of interface calls, so the
+// result comes back through a reference.
+struct OpenCLTarget;
+Status CreateFilter(const PluginLibrary& plugin, const ResolvedFilter& filter,
+                    const std::vector<ParamSetting>& settings, const OpenCLTarget* target,
+                    NLEComPtr<INLECGFilter>& fx);
+
+// A host frame over a matrix's pixels; the matrix must outlive it.
+Status WrapFrame(const cv::Mat& bgra, NLEComPtr<INLEMemoryFrame>& frame);
 
 // Creates the filter's CPU class with the settings applied and runs it once: `foreground` is the
 // frame the effect adjusts, `background` the frame under it; `out` gets the foreground's size.

@@ -1,0 +1,89 @@
+#include "plugin/FilterChain.h"
+
+#include "media/Text.h"
+
+namespace tfxtool {
+namespace {
+
+bool Is(const ChainStep& step, const FilterInfo& filter) {
+  return EqualsNoCase(step.filter.guid, filter.guid);
+}
+
+}  // namespace
+
+Status FilterChain::Create(const PluginLibrary& plugin, std::vector<ChainStep> steps,
+                           FilterChain* chain) {
+  FilterChain made;
+  for (const ChainStep& step : steps) {
+    NLEComPtr<INLECGFilter> fx;
+    if (Status s = CreateFilter(plugin, step.filter, step.settings, nullptr, fx); !s.ok()) return s;
+    made.filters_.push_back(fx);
+  }
+  made.steps_ = std::move(steps);
+  *chain = std::move(made);
+  return Status::Ok();
+}
+
+void FilterChain::SetFrameTime(int32_t current, int32_t total) {
+  current_ = current;
+  total_ = total;
+}
+
+Status FilterChain::Run(const cv::Mat& bgraIn, cv::Mat* bgraOut, const cv::Mat* background) {
+  if (bgraIn.empty() || bgraIn.type() != CV_8UC4) {
+    return Status::Error("filters run on 8-bit BGRA frames");
+  }
+  const cv::Size size = bgraIn.size();
+  if (background && background->size() != size) {
+    return Status::Error("the background must have the frame's size");
+  }
+  // Filters are prepared for a run of frames of one size, as an editor prepares them when
+  // playback starts; a new size starts a new run.
+  const bool prepare = size != prepared_;
+  prepared_ = cv::Size();
+  cv::Mat input = bgraIn;
+  cv::Mat under = background ? *background : bgraIn;
+  for (size_t i = 0; i < filters_.size(); ++i) {
+    cv::Mat dst(size, CV_8UC4, cv::Scalar::all(0));
+    NLEComPtr<INLEMemoryFrame> fgFrame, bgFrame, dstFrame;
+    if (Status s = WrapFrame(input, fgFrame); !s.ok()) return s;
+    if (Status s = WrapFrame(under, bgFrame); !s.ok()) return s;
+    if (Status s = WrapFrame(dst, dstFrame); !s.ok()) return s;
+
+    INLECGFilter* fx = filters_[i].get();
+    fx->SetForeground(fgFrame.get());
+    fx->SetBackground(bgFrame.get());
+    fx->SetTotalTime(total_);
+    fx->SetCurrentTime(current_);
+    HRESULT hr = NLE_S_OK;
+    if (prepare) {
+      CGFilterParam param = {};
+      param.frameSize = {size.width, size.height};
+      param.quality = 1;
+      hr = fx->Prepare(param);
+    }
+    if (NLE_SUCCEEDED(hr)) hr = fx->Running(dstFrame.get());
+    // The filter only borrows its inputs, and these frames end with this step.
+    fx->SetForeground(nullptr);
+    fx->SetBackground(nullptr);
+    if (NLE_FAILED(hr)) {
+      return Status::Error(steps_[i].filter.name + " failed: " + DescribeResult(hr), hr);
+    }
+    input = under = dst;
+  }
+  prepared_ = size;
+  *bgraOut = filters_.empty() ? bgraIn.clone() : input;
+  return Status::Ok();
+}
+
+bool FilterChain::CarriesAlpha(bool inputAlpha) const {
+  namespace catalog = tfx::catalog;
+  bool alpha = inputAlpha;
+  for (const ChainStep& step : steps_) {
+    if (Is(step, catalog::kChromeKey) || Is(step, catalog::kChromeKeyCombine)) alpha = true;
+    if (Is(step, catalog::kAToWhite)) alpha = false;
+  }
+  return alpha;
+}
+
+}  // namespace tfxtool
