@@ -1,12 +1,14 @@
 // tessarofx: runs the TessaroFx plug-in on image files the way a video editor drives it, so that
 // its filters can be tried, scripted and checked without an editor.
+#include <CLI/CLI.hpp>
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
-#include <cstring>
 #include <exception>
 #include <opencv2/core.hpp>
 
 #include "commands/Commands.h"
+#include "media/Reporter.h"
 #include "media/Text.h"
 #include "plugin/FilterTable.h"
 #include "tessarofx/NLEHost.h"
@@ -14,62 +16,21 @@
 namespace tfxtool {
 namespace {
 
-constexpr const char* kUsage =
-    R"(usage: tessarofx [OPTIONS] COMMAND [ARGS]
+constexpr const char* kDescription =
+    "Runs the TessaroFx filter plug-in on image files, as a video editor would.";
 
-Runs the TessaroFx filter plug-in on image files, as a video editor would.
+constexpr const char* kFooter = R"(
+The plug-in is --plugin, else $TESSAROFX_PLUGIN, else the one beside the tool, else the one the
+loader finds. The log threshold is --log-level, else -v (32), else $TESSAROFX_LOG_LEVEL, else 48;
+$TESSAROFX_NO_OPENCL=1 works as --no-opencl.
 
-Commands:
-  list [--json]
-      Published filters in index order, with their support flags and parameters.
-  apply FILTER [-p NAME=VALUE]... [--background FILE] INPUT OUTPUT
-      Runs one filter on INPUT. FILTER is a GUID or a filter name in any letter case,
-      including registered names the list does not show (ColorLut3dAdjust,
-      ChromeKeyLut3d). INPUT is the foreground frame; the background is FILE (same size)
-      or INPUT itself.
-  apply --opencl [--device N] [--kernels DIR] FILTER [-p NAME=VALUE]... INPUT OUTPUT
-      Runs the filter's OpenCL class instead (filters whose list entry says OpenCL):
-      INPUT goes into a frame in the device's memory and the result comes back from it.
-      --device N picks a device from 'devices' (default -1: the default choice);
-      --kernels DIR holds the OpenCL programs (default: tessarofx/kernels beside the
-      plug-in). A program that does not build shows the compiler's log on stderr.
-  devices
-      OpenCL platforms and devices, with the index --device takes; * marks the
-      default choice. Says so when there is no OpenCL platform.
-  fx FUNCTION [ARG]... INPUT [SECOND] [OUTPUT]
-      Calls one of the plug-in's exported image functions on INPUT. Most write
-      OUTPUT; merge and wb-rates read a SECOND image; white-point and wb-rates print
-      measurements instead of writing.
-  fx --list
-      Those functions, their arguments and their ranges.
-  lut info FILE
-      Reads a .cube or .3dl file with the plug-in's reader and prints its size, title
-      and domain, or the line where reading stopped and why.
-  lut convert IN OUT.cube [--size N]
-      Rewrites a .cube (up to 256 points per axis) or .3dl table as a .cube file the
-      plug-in reads; --size N (2..64) resamples it by tetrahedral interpolation, which
-      tables above 64 points need.
-  lut bake [-f FILTER [-p NAME=VALUE]...]... [--size N] OUT.cube
-      Bakes ColorAdjust, LightAdjust and WhiteBalanceAdjust settings (the parameters
-      apply takes) into a .cube table of N points per axis (default 33), in the order
-      given; ColorLut3dAdjust then applies the whole chain in one pass.
-  demo [OUTDIR]
-      Renders a built-in test scene through every filter, writing one PNG per filter
-      and contact-sheet.png to OUTDIR (default: demo-out).
+Images: PNG, TIFF and WebP keep alpha; JPEG and BMP are written without it. Every image is
+processed as 8-bit BGRA. 'tessarofx COMMAND --help' describes a command.)";
 
-Options:
-  --plugin PATH      the plug-in to load (default: $TESSAROFX_PLUGIN, then beside the
-                     tool, then the loader's search path)
-  --log-level N|off  plug-in log threshold: 0 trace, 16 debug, 32 info, 48 warning,
-                     64 error (default: $TESSAROFX_LOG_LEVEL, else 48)
-  -v, --verbose      log level 32: show each filter as it is created
-  --no-opencl        never touch the OpenCL runtime (also $TESSAROFX_NO_OPENCL=1): the
-                     demo skips its OpenCL pictures, apply --opencl and devices refuse
-  -h, --help         this text
-
-Images: PNG, TIFF and WebP keep alpha; JPEG and BMP are written without it. Every image
-is processed as 8-bit BGRA.
-)";
+// Exit codes: 1 when a command fails, its arguments included; 2 when the line names no command
+// the tool can run or a global option is wrong, as the shell's own utilities do.
+constexpr int kFailed = 1;
+constexpr int kUsage = 2;
 
 void PrintError(const std::string& message) {
   std::fprintf(stderr, "tessarofx: error: %s\n", message.c_str());
@@ -88,49 +49,105 @@ Status ParseLogLevel(const std::string& text, int32_t* level) {
   return Status::Ok();
 }
 
+// CLI11 reads "-20" as a value but "-.5" as the option "-."; the old command line took both
+// as numbers, so the second is written the way the parser expects.
+std::string NumberWord(const std::string& word) {
+  if (word.size() > 2 && word[0] == '-' && word[1] == '.' &&
+      word.find_first_not_of("0123456789", 2) == std::string::npos) {
+    return "-0" + word.substr(1);
+  }
+  return word;
+}
+
 int Run(int argc, char** argv) {
   GlobalOptions options;
-  Args rest;
-  bool help = false;
   bool verbose = false;
   std::string logLevel;
-  Args all(argv + 1, argv + argc);
-  for (size_t i = 0; i < all.size(); ++i) {
-    Status error;
-    if (all[i] == "--") {
-      // After the command word, the command still needs to see it to stop reading options.
-      const size_t from = rest.empty() ? i + 1 : i;
-      rest.insert(rest.end(), all.begin() + static_cast<std::ptrdiff_t>(from), all.end());
-      break;
-    }
-    if (all[i] == "-h" || all[i] == "--help") {
-      help = true;
-    } else if (all[i] == "-v" || all[i] == "--verbose") {
-      verbose = true;
-    } else if (all[i] == "--no-opencl") {
-      options.noOpenCL = true;
-    } else if (!TakeOptionValue(all, &i, "--plugin", nullptr, &options.pluginPath, &error) &&
-               !TakeOptionValue(all, &i, "--log-level", nullptr, &logLevel, &error) && error.ok()) {
-      rest.push_back(all[i]);
-    }
-    if (!error.ok()) {
-      PrintError(error.message());
-      return 2;
+
+  CLI::App app(kDescription, "tessarofx");
+  app.get_formatter()->label("Usage", "usage");
+  app.get_formatter()->column_width(28);
+  // Global options may also follow the command, as they could before subcommands existed.
+  app.fallthrough();
+  app.require_subcommand(0, 1);
+  app.add_option("--plugin", options.pluginPath,
+                 "the plug-in that runs the filters (default: see below)")
+      ->type_name("PATH");
+  app.add_option("--log-level", logLevel,
+                 "plug-in log threshold: 0 trace, 16 debug, 32 info, 48 warning, 64 error")
+      ->type_name("N|off");
+  app.add_flag("-v,--verbose", verbose, "log level 32: show each filter as it is created");
+  app.add_flag("--no-opencl", options.noOpenCL,
+               "never touch the OpenCL runtime (apply --opencl and devices refuse)");
+  app.add_flag("-q,--quiet", options.quiet, "no progress display; messages still appear");
+
+  std::vector<Command> commands;
+  AddListCommand(app, options, &commands);
+  AddApplyCommand(app, options, &commands);
+  AddFxCommand(app, options, &commands);
+  AddLutCommand(app, options, &commands);
+  AddDemoCommand(app, options, &commands);
+  AddDevicesCommand(app, options, &commands);
+  // After the commands, which would otherwise inherit it.
+  app.footer(kFooter);
+
+  // Words after "--" are the command's arguments whatever they look like; the parser sees the
+  // words before it only.
+  std::vector<std::string> words, trailing;
+  bool ended = false;
+  for (int i = 1; i < argc; ++i) {
+    const std::string word = argv[i];
+    if (ended) {
+      trailing.push_back(word);
+    } else if (word == "--") {
+      ended = true;
+    } else {
+      words.push_back(NumberWord(word));
     }
   }
-  if (help || rest.empty()) {
-    std::fputs(kUsage, help ? stdout : stderr);
-    return help ? 0 : 2;
+  std::reverse(words.begin(), words.end());  // the parser takes them last first
+
+  // The innermost command given: "lut bake" rather than "lut".
+  const auto selected = [&]() -> const Command* {
+    const Command* found = nullptr;
+    for (const Command& c : commands) {
+      if (c.app->parsed()) found = &c;
+    }
+    return found;
+  };
+  try {
+    app.parse(words);
+  } catch (const CLI::CallForHelp&) {
+    std::fputs(app.help().c_str(), stdout);
+    return 0;
+  } catch (const CLI::ParseError& e) {
+    if (!selected() && !app.remaining().empty()) {
+      PrintError("unknown command '" + app.remaining().front() + "' (see tessarofx --help)");
+    } else {
+      PrintError(e.what());
+    }
+    return selected() ? kFailed : kUsage;
+  }
+  const Command* command = selected();
+  if (!command) {
+    std::fputs(app.help().c_str(), stderr);
+    return kUsage;
+  }
+  if (!trailing.empty()) {
+    if (!command->positional) {
+      PrintError("unexpected argument '" + trailing.front() + "'");
+      return kFailed;
+    }
+    command->positional->insert(command->positional->end(), trailing.begin(), trailing.end());
   }
 
   // Creation lines are informational: quiet unless asked for, here or in the environment.
-  INLELogger* logger = NLEGetDefaultLogger();
-  if (logger) {
+  if (INLELogger* logger = NLEGetDefaultLogger()) {
     int32_t level = kNLELogWarning;
     if (!logLevel.empty()) {
       if (Status s = ParseLogLevel(logLevel, &level); !s.ok()) {
         PrintError(s.message());
-        return 2;
+        return kUsage;
       }
       logger->SetLevel(level);
     } else if (verbose) {
@@ -140,28 +157,11 @@ int Run(int argc, char** argv) {
     }
   }
 
-  const std::string command = rest.front();
-  const Args args(rest.begin() + 1, rest.end());
-  Status result;
-  if (command == "list") {
-    result = ListCommand(options, args);
-  } else if (command == "apply") {
-    result = ApplyCommand(options, args);
-  } else if (command == "fx") {
-    result = FxCommand(options, args);
-  } else if (command == "demo") {
-    result = DemoCommand(options, args);
-  } else if (command == "lut") {
-    result = LutCommand(options, args);
-  } else if (command == "devices") {
-    result = DevicesCommand(options, args);
-  } else {
-    PrintError("unknown command '" + command + "' (see tessarofx --help)");
-    return 2;
-  }
-  if (!result.ok()) {
-    PrintError(result.message());
-    return 1;
+  Reporter reporter(options.quiet, Reporter::StderrIsTerminal());
+  options.reporter = &reporter;
+  if (Status s = command->run(); !s.ok()) {
+    reporter.Error(s.message());
+    return kFailed;
   }
   return 0;
 }

@@ -255,7 +255,11 @@ TEST_F(ToolTest, FailuresNameTheirCauseAndLeaveNoOutput) {
       {"apply ColorAdjust in.png out.xyz", "unknown image format"},
       {"apply ColorAdjust in.png no/such/dir/out.png", "No such file or directory"},
       {"apply ColorAdjust in.png in.png/out.png", "Not a directory"},
-      {"apply ColorAdjust -in.png out.png", "unknown option '-in.png'"},
+      {"apply ColorAdjust -in.png out.png", "not expected: -in.png"},
+      {"apply -p u_sat=1 -f ColorAdjust in.png out.png", "-p u_sat=1 needs a -f FILTER before it"},
+      {"apply -f ColorAdjust ColorAdjust in.png out.png", "unexpected argument 'out.png'"},
+      {"apply -f ColorAdjust -f HSLAdjust -b in.png in.png out.png", "one filter"},
+      {"apply -f ColorAdjust -f NoSuchFilter in.png out.png", "unknown filter 'NoSuchFilter'"},
       {"fx exposure bright in.png out.png", "not a number"},
       {"fx sharpness 3 in.png out.png", "unknown function"},
       {"fx merge in.png out.png", "needs INPUT OVERLAY OUTPUT"},
@@ -288,6 +292,22 @@ TEST_F(ToolTest, LogsFilterCreationOnlyWhenAsked) {
   EXPECT_NE(Run("--log-level 32" + apply).err.find(line), npos);
   EXPECT_NE(Run(apply, "TESSAROFX_LOG_LEVEL=0").err.find(line), npos);
   EXPECT_EQ(Run("-v --log-level=off" + apply).err, "");
+}
+
+// Each -f runs on the result of the one before, with its own settings; the chain's result is
+// the same as applying the filters one at a time.
+TEST_F(ToolTest, ApplyChainRunsItsFiltersInOrder) {
+  WriteInput("in.png", 17, 9);
+  const std::string first = "ColorAdjust -p u_exposure=30", second = "HSLAdjust -p u_red_sat=-50";
+  ASSERT_EQ(Run("apply " + first + " in.png a.png").exitCode, 0);
+  ASSERT_EQ(Run("apply " + second + " a.png ab.png").exitCode, 0);
+  ASSERT_EQ(Run("apply " + second + " in.png b.png").exitCode, 0);
+  ASSERT_EQ(Run("apply " + first + " b.png ba.png").exitCode, 0);
+  const Outcome r = Run("apply -f " + first + " -f " + second + " in.png chain.png");
+  ASSERT_EQ(r.exitCode, 0) << r.err;
+  EXPECT_EQ(r.err, "");
+  EXPECT_EQ(cv::norm(Read("chain.png"), Read("ab.png"), cv::NORM_INF), 0);
+  EXPECT_NE(cv::norm(Read("ab.png"), Read("ba.png"), cv::NORM_INF), 0) << "order proves nothing";
 }
 
 TEST_F(ToolTest, FxExposureMatchesTheFilterWithTheSameValue) {
@@ -769,9 +789,12 @@ TEST_F(ToolTest, ApplyOpenCLNamesTheDeviceOrProgramThatFailed) {
 }
 
 TEST_F(ToolTest, UsageGoesToStdoutOnRequestAndStderrOnMistakes) {
-  const Outcome help = Run("--help"), none = Run("");
+  const Outcome help = Run("--help"), none = Run(""), apply = Run("apply --help");
   EXPECT_EQ(help.exitCode, 0);
   EXPECT_NE(help.out.find("usage: tessarofx"), npos);
+  EXPECT_EQ(apply.exitCode, 0);
+  EXPECT_NE(apply.out.find("usage: tessarofx apply"), npos);
+  EXPECT_NE(apply.out.find("-f,--filter FILTER"), npos);
   EXPECT_NE(none.exitCode, 0);
   EXPECT_NE(none.err.find("usage: tessarofx"), npos);
 }

@@ -1,9 +1,12 @@
+#include <CLI/CLI.hpp>
 #include <cstdio>
 #include <limits>
+#include <memory>
 
 #include "commands/Commands.h"
 #include "media/ImageFiles.h"
 #include "media/Text.h"
+#include "plugin/FilterChain.h"
 #include "plugin/FilterHost.h"
 #include "plugin/OpenCLDevices.h"
 
@@ -25,42 +28,57 @@ Status RunOpenCL(const PluginLibrary& plugin, const ResolvedFilter& filter,
   return RunFilterOpenCL(plugin, filter, settings, target, input, result);
 }
 
-}  // namespace
-
-Status ApplyCommand(const GlobalOptions& options, const Args& args) {
-  std::vector<ParamSetting> settings;
-  std::string backgroundPath, deviceText, kernelDir;
-  bool opencl = false;
+struct ApplyOptions {
+  StepList steps;
   Args positional;
-  bool optionsEnded = false;
-  for (size_t i = 0; i < args.size(); ++i) {
-    Status error;
-    std::string value;
-    if (optionsEnded || !IsOptionWord(args[i])) {
-      positional.push_back(args[i]);
-    } else if (args[i] == "--") {
-      optionsEnded = true;
-    } else if (TakeOptionValue(args, &i, "--param", "-p", &value, &error)) {
-      ParamSetting setting;
-      if (Status s = ParseParamSetting(value, &setting); !s.ok()) return s;
-      settings.push_back(setting);
-    } else if (args[i] == "--opencl") {
-      opencl = true;
-    } else if (TakeOptionValue(args, &i, "--background", "-b", &backgroundPath, &error) ||
-               TakeOptionValue(args, &i, "--device", nullptr, &deviceText, &error) ||
-               TakeOptionValue(args, &i, "--kernels", nullptr, &kernelDir, &error)) {
-      // stored
-    } else if (error.ok()) {
-      return Status::Error("apply: unknown option '" + args[i] + "'");
+  std::string background, device, kernels;
+  bool opencl = false;
+};
+
+// The chain the command line asks for: the steps of -f, or the one FILTER before INPUT.
+Status ChainWords(const ApplyOptions& given, std::vector<StepWords>* steps, Args* files) {
+  const Args& positional = given.positional;
+  if (given.steps.steps.empty()) {
+    if (positional.empty()) return Status::Error("apply needs a FILTER (see tessarofx list)");
+    if (positional.size() < 3) {
+      return Status::Error("apply needs INPUT and OUTPUT (see tessarofx apply --help)");
     }
-    if (!error.ok()) return error;
+    if (positional.size() > 3) {
+      return Status::Error("apply: unexpected argument '" + positional[3] + "'");
+    }
+    *steps = {{positional[0], given.steps.leading}};
+    files->assign(positional.begin() + 1, positional.end());
+    return Status::Ok();
   }
-  if (positional.empty()) return Status::Error("apply needs a FILTER (see tessarofx list)");
-  if (positional.size() < 3) {
-    return Status::Error("apply needs INPUT and OUTPUT (see tessarofx --help)");
+  if (!given.steps.leading.empty()) {
+    return Status::Error("apply: -p " + given.steps.leading.front() +
+                         " needs a -f FILTER before it");
   }
-  if (positional.size() > 3) {
-    return Status::Error("apply: unexpected argument '" + positional[3] + "'");
+  if (positional.size() < 2) {
+    return Status::Error("apply needs INPUT and OUTPUT (see tessarofx apply --help)");
+  }
+  if (positional.size() > 2) {
+    return Status::Error("apply: unexpected argument '" + positional[2] +
+                         "' (with -f, every filter is given by -f)");
+  }
+  *steps = given.steps.steps;
+  *files = positional;
+  return Status::Ok();
+}
+
+Status ApplyFilters(const GlobalOptions& options, const ApplyOptions& given) {
+  std::vector<StepWords> words;
+  Args files;
+  if (Status s = ChainWords(given, &words, &files); !s.ok()) return s;
+  const std::string& backgroundPath = given.background;
+  const std::string& deviceText = given.device;
+  const std::string& kernelDir = given.kernels;
+  const bool opencl = given.opencl;
+  if (words.size() > 1 && !backgroundPath.empty()) {
+    return Status::Error("--background goes with one filter: it is ChromeKeyCombine's key mask");
+  }
+  if (words.size() > 1 && opencl) {
+    return Status::Error("--opencl runs one filter; give it without -f chains");
   }
   if (!opencl && (!deviceText.empty() || !kernelDir.empty())) {
     return Status::Error(std::string(deviceText.empty() ? "--kernels" : "--device") +
@@ -80,16 +98,24 @@ Status ApplyCommand(const GlobalOptions& options, const Args& args) {
     return Status::Error("bad --device '" + deviceText +
                          "': a device index (see tessarofx devices), or -1 for the default");
   }
-  const std::string& input = positional[1];
-  const std::string& output = positional[2];
+  const std::string& input = files[0];
+  const std::string& output = files[1];
   if (Status s = CheckWritableFormat(output); !s.ok()) return s;
 
   PluginLibrary plugin;
   if (Status s = plugin.Load(options.pluginPath); !s.ok()) return s;
   std::vector<PublishedFilter> published;
   if (Status s = ReadPublishedFilters(plugin, &published); !s.ok()) return s;
-  ResolvedFilter filter;
-  if (Status s = ResolveFilter(published, positional[0], &filter); !s.ok()) return s;
+  std::vector<ChainStep> steps;
+  for (const StepWords& step : words) {
+    ChainStep resolved;
+    if (Status s = ResolveFilter(published, step.filter, &resolved.filter); !s.ok()) return s;
+    for (const std::string& text : step.params) {
+      resolved.settings.emplace_back();
+      if (Status s = ParseParamSetting(text, &resolved.settings.back()); !s.ok()) return s;
+    }
+    steps.push_back(std::move(resolved));
+  }
 
   cv::Mat foreground, background;
   if (Status s = ReadImage(input, &foreground); !s.ok()) return s;
@@ -107,16 +133,57 @@ Status ApplyCommand(const GlobalOptions& options, const Args& args) {
 
   cv::Mat result;
   if (opencl) {
-    if (Status s = RunOpenCL(plugin, filter, settings, static_cast<int>(deviceIndex), kernelDir,
-                             foreground, &result);
+    if (Status s = RunOpenCL(plugin, steps[0].filter, steps[0].settings,
+                             static_cast<int>(deviceIndex), kernelDir, foreground, &result);
         !s.ok()) {
       return s;
     }
-  } else if (Status s = RunFilter(plugin, filter, settings, foreground, background, &result);
-             !s.ok()) {
-    return s;
+  } else {
+    FilterChain chain;
+    if (Status s = FilterChain::Create(plugin, std::move(steps), &chain); !s.ok()) return s;
+    if (Status s = chain.Run(foreground, &result, &background); !s.ok()) return s;
   }
   return WriteImage(output, result);
+}
+
+}  // namespace
+
+void AddApplyCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands) {
+  CLI::App* apply = app.add_subcommand("apply", "Runs one filter or a chain of them on an image.");
+  apply->footer(R"(
+  tessarofx apply FILTER [-p NAME=VALUE]... [-b FILE] INPUT OUTPUT
+  tessarofx apply -f FILTER [-p NAME=VALUE]... [-f FILTER [-p NAME=VALUE]...]... INPUT OUTPUT
+
+A filter is a GUID or a name in any letter case, including registered names the list does not
+show (ColorLut3dAdjust, ChromeKeyLut3d); 'tessarofx list' shows each filter's parameters and
+their ranges. Filters given by -f run in the order given, each on the result of the one before,
+with the -p settings that follow it. INPUT is the foreground frame; the background is -b FILE
+(same size) or INPUT itself.
+
+Examples:
+  tessarofx apply ColorAdjust -p u_exposure=20 -p u_sat=-30 in.png out.png
+  tessarofx apply -f ColorAdjust -p u_exposure=20 -f VignetteAdjust -p amount=-60 in.png out.png
+  tessarofx apply ChromeKeyCombine --background mask.png beauty.png keyed.png
+  tessarofx apply --opencl --device 0 WhiteBalanceAdjust -p u_temperature=40 in.png out.png)");
+  auto given = std::make_shared<ApplyOptions>();
+  AddStepOptions(apply, &given->steps);
+  apply
+      ->add_option("-b,--background", given->background,
+                   "the frame under a lone filter (ChromeKeyCombine's key mask)")
+      ->type_name("FILE");
+  apply->add_flag("--opencl", given->opencl,
+                  "run the filter's OpenCL class on a device (list: OpenCL)");
+  apply
+      ->add_option("--device", given->device,
+                   "with --opencl: a device from 'tessarofx devices' (default -1)")
+      ->type_name("N");
+  apply
+      ->add_option("--kernels", given->kernels,
+                   "with --opencl: the OpenCL programs (default: beside the plug-in)")
+      ->type_name("DIR");
+  apply->add_option("FILES", given->positional, "[FILTER] INPUT OUTPUT")->type_name("");
+  commands->push_back(
+      {apply, &given->positional, [&options, given] { return ApplyFilters(options, *given); }});
 }
 
 }  // namespace tfxtool

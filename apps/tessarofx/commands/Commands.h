@@ -1,37 +1,56 @@
-// The tool's commands. Each gets the words after its name, with the global options removed, and
-// reports failure through its Status; main prints it.
+// The tool's commands. Each declares its subcommand, options and arguments on the parser and
+// records what runs once the command line is parsed; failures come back as a Status that main
+// prints.
 #pragma once
 
+#include <functional>
 #include <string>
 #include <vector>
 
 #include "Status.h"
+#include "media/Reporter.h"
 #include "plugin/PluginLibrary.h"
+
+namespace CLI {
+class App;
+}
 
 namespace tfxtool {
 
 struct GlobalOptions {
   std::string pluginPath;  // --plugin; empty: the usual search
   bool noOpenCL = false;   // --no-opencl: nothing in this run touches the OpenCL runtime
+  bool quiet = false;      // --quiet: no progress display
+  Reporter* reporter = nullptr;
 };
 
 using Args = std::vector<std::string>;
 
-Status ListCommand(const GlobalOptions& options, const Args& args);
-Status ApplyCommand(const GlobalOptions& options, const Args& args);
-Status FxCommand(const GlobalOptions& options, const Args& args);
-Status DemoCommand(const GlobalOptions& options, const Args& args);
-Status LutCommand(const GlobalOptions& options, const Args& args);
-Status DevicesCommand(const GlobalOptions& options, const Args& args);
+// A subcommand as main runs it. `positional` collects the command's plain arguments; main adds
+// the words after "--" to it, so that file names that look like options get through.
+struct Command {
+  CLI::App* app = nullptr;
+  Args* positional = nullptr;
+  std::function<Status()> run;
+};
 
-// An option word, as opposed to a value: "-p", "--json", but not "-20" or "-.5", which are
-// negative numbers given as arguments.
-bool IsOptionWord(const std::string& word);
+void AddListCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands);
+void AddApplyCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands);
+void AddFxCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands);
+void AddDemoCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands);
+void AddLutCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands);
+void AddDevicesCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands);
 
-// If args[*i] is the option `name` (as "--name VALUE" or "--name=VALUE", or `shortName` followed by
-// a value), stores its value, moves *i to the option's last word and returns true. A missing
-// value sets *error instead.
-bool TakeOptionValue(const Args& args, size_t* i, const char* name, const char* shortName,
-                     std::string* value, Status* error);
+// "-f FILTER [-p NAME=VALUE]..." as apply and lut bake take them: each -p belongs to the -f
+// before it. -p options before any -f are kept apart, for the commands that take a lone FILTER.
+struct StepWords {
+  std::string filter;
+  std::vector<std::string> params;  // NAME=VALUE, in order
+};
+struct StepList {
+  std::vector<StepWords> steps;
+  std::vector<std::string> leading;  // -p before the first -f
+};
+void AddStepOptions(CLI::App* command, StepList* list);
 
 }  // namespace tfxtool

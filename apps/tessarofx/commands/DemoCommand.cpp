@@ -1,9 +1,12 @@
 #include <sys/stat.h>
 
+#include <CLI/CLI.hpp>
 #include <cerrno>
+#include <cmath>
 #include <cstdio>
 #include <cstring>
 #include <map>
+#include <memory>
 
 #include "commands/Commands.h"
 #include "commands/ImageFunctions.h"
@@ -154,52 +157,52 @@ struct OpenCLTwin {
 int RunOpenCLTwins(const GlobalOptions& options, const PluginLibrary& plugin,
                    const std::vector<OpenCLTwin>& twins, const std::string& dir) {
   if (twins.empty()) return 0;
+  Reporter& report = *options.reporter;
   if (Status s = CheckOpenCLUsable(options.noOpenCL); !s.ok()) {
-    std::printf("skipped the OpenCL classes: %s\n", s.message().c_str());
+    report.Note("skipped the OpenCL classes: " + s.message());
     return 0;
   }
   std::vector<NLEOpenCLDeviceInfo> devices;
   if (!ListDevices(&devices).ok() || devices.empty()) {
-    std::printf("skipped the OpenCL classes: no OpenCL device on this machine\n");
+    report.Note("skipped the OpenCL classes: no OpenCL device on this machine");
     return 0;
   }
   NLEComPtr<INLECGDevice> device;
   OpenCLTarget target;
   if (Status s = OpenOpenCLTarget(plugin, -1, "", device, &target); !s.ok()) {
-    std::fprintf(stderr, "tessarofx: error: %s\n", s.message().c_str());
+    report.Error(s.message());
     return 1;
   }
   int failures = 0;
+  report.Start("OpenCL pictures", twins.size());
   for (const OpenCLTwin& twin : twins) {
     cv::Mat result;
     const std::string file = dir + "/opencl-" + twin.label + ".png";
     Status s = RunFilterOpenCL(plugin, twin.filter, twin.params, target, twin.input, &result);
     if (s.ok()) s = WriteImage(file, result);
+    report.Advance();
     if (!s.ok()) {
-      std::fprintf(stderr, "tessarofx: error: %s on %s: %s\n", twin.label.c_str(),
-                   target.deviceName.c_str(), s.message().c_str());
+      report.Error(twin.label + " on " + target.deviceName + ": " + s.message());
       ++failures;
       continue;
     }
     const double apart = cv::norm(result, twin.cpu, cv::NORM_INF);
     if (apart == 0) {
-      std::printf("wrote %s (the CPU class's bytes)\n", file.c_str());
+      report.Note("wrote " + file + " (the CPU class's bytes)");
     } else {
-      std::printf("wrote %s (at most %.0f levels from the CPU class)\n", file.c_str(), apart);
+      report.Note("wrote " + file + " (at most " + FormatNumber(std::round(apart)) +
+                  " levels from the CPU class)");
     }
   }
+  report.Finish();
   return failures;
 }
 
-}  // namespace
-
-Status DemoCommand(const GlobalOptions& options, const Args& args) {
+Status RunDemo(const GlobalOptions& options, const Args& args) {
   if (args.size() > 1) return Status::Error("demo: unexpected argument '" + args[1] + "'");
-  if (!args.empty() && IsOptionWord(args[0])) {
-    return Status::Error("demo: unknown option '" + args[0] + "'");
-  }
   std::string dir = args.empty() ? "demo-out" : args[0];
   while (dir.size() > 1 && dir.back() == '/') dir.pop_back();
+  Reporter& report = *options.reporter;
 
   PluginLibrary plugin;
   if (Status s = plugin.Load(options.pluginPath); !s.ok()) return s;
@@ -216,11 +219,14 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
     return s;
   }
 
+  const std::vector<DemoStep> steps = DemoSteps(lutPath);
+  const std::vector<DemoFxStep> fxSteps = DemoFxSteps();
+  report.Start("demo pictures", steps.size() + fxSteps.size() + 1);  // and the contact sheet
   std::map<std::string, cv::Mat> results;
   std::vector<SheetTile> tiles = {{"Original", "before", scene}};
   std::vector<OpenCLTwin> twins;
   int failures = 0;
-  for (const DemoStep& step : DemoSteps(lutPath)) {
+  for (const DemoStep& step : steps) {
     auto input = [&](const std::string& name, const cv::Mat& fallback, cv::Mat* image) {
       if (name.empty()) {
         *image = fallback;
@@ -234,8 +240,9 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
     cv::Mat foreground, background;
     const bool haveForeground = input(step.foreground, scene, &foreground);
     if (!haveForeground || !input(step.background, foreground, &background)) {
-      std::printf("skipped %s: it needs the result of %s\n", step.Label().c_str(),
-                  (haveForeground ? step.background : step.foreground).c_str());
+      report.Note("skipped " + step.Label() + ": it needs the result of " +
+                  (haveForeground ? step.background : step.foreground));
+      report.Advance();
       continue;
     }
     ResolvedFilter filter;
@@ -243,17 +250,19 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
     Status s = ResolveFilter(published, step.filter, &filter);
     if (s.ok()) s = RunFilter(plugin, filter, step.params, foreground, background, &result);
     if (!s.ok() && s.code() == NLE_E_NOTIMPL) {
-      std::printf("skipped %s: not implemented yet\n", step.Label().c_str());
+      report.Note("skipped " + step.Label() + ": not implemented yet");
+      report.Advance();
       continue;
     }
     const std::string file = dir + "/" + step.Label() + ".png";
     if (s.ok()) s = WriteImage(file, result);
+    report.Advance();
     if (!s.ok()) {
-      std::fprintf(stderr, "tessarofx: error: %s\n", s.message().c_str());
+      report.Error(s.message());
       ++failures;
       continue;
     }
-    std::printf("wrote %s\n", file.c_str());
+    report.Note("wrote " + file);
     results[step.Label()] = result;
     tiles.push_back({step.Label(), Caption(step), result});
     if (filter.opencl && step.background.empty()) {
@@ -261,13 +270,13 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
     }
   }
 
-  for (const DemoFxStep& step : DemoFxSteps()) {
+  for (const DemoFxStep& step : fxSteps) {
     cv::Mat input = scene;
     if (!step.input.empty()) {
       auto it = results.find(step.input);
       if (it == results.end()) {
-        std::printf("skipped %s: it needs the result of %s\n", step.label.c_str(),
-                    step.input.c_str());
+        report.Note("skipped " + step.label + ": it needs the result of " + step.input);
+        report.Advance();
         continue;
       }
       input = it->second;
@@ -287,12 +296,13 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
     }
     const std::string file = dir + "/" + step.label + ".png";
     if (s.ok()) s = WriteImage(file, image);
+    report.Advance();
     if (!s.ok()) {
-      std::fprintf(stderr, "tessarofx: error: %s: %s\n", step.label.c_str(), s.message().c_str());
+      report.Error(step.label + ": " + s.message());
       ++failures;
       continue;
     }
-    std::printf("wrote %s\n", file.c_str());
+    report.Note("wrote " + file);
     results[step.label] = image;
     tiles.push_back({step.label, step.caption, image});
   }
@@ -300,11 +310,27 @@ Status DemoCommand(const GlobalOptions& options, const Args& args) {
   const cv::Mat sheet = MakeContactSheet("TessaroFx demo: before and after", tiles);
   const std::string sheetFile = dir + "/contact-sheet.png";
   if (Status s = WriteImage(sheetFile, sheet); !s.ok()) return s;
-  std::printf("wrote %s\n", sheetFile.c_str());
+  report.Advance();
+  report.Finish();
+  report.Note("wrote " + sheetFile);
   // Last, so that an OpenCL runtime that fails in any way cannot cost a CPU picture.
   failures += RunOpenCLTwins(options, plugin, twins, dir);
   if (failures) return Status::Error(std::to_string(failures) + " demo step(s) failed");
   return Status::Ok();
+}
+
+}  // namespace
+
+void AddDemoCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands) {
+  CLI::App* demo = app.add_subcommand("demo", "Renders a test scene through every filter.");
+  demo->footer(R"(
+Writes the scene, one PNG per filter and contact-sheet.png to OUTDIR, then the filters with an
+OpenCL class again on the default device.)");
+  auto dir = std::make_shared<Args>();
+  demo->add_option("OUTDIR", *dir, "where the pictures go (default: demo-out)")
+      ->type_name("")
+      ->expected(0, 1);
+  commands->push_back({demo, dir.get(), [&options, dir] { return RunDemo(options, *dir); }});
 }
 
 }  // namespace tfxtool

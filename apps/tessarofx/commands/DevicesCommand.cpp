@@ -1,3 +1,4 @@
+#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cstdio>
 #include <cstring>
@@ -7,8 +8,9 @@
 
 namespace tfxtool {
 
-Status DevicesCommand(const GlobalOptions& options, const Args& args) {
-  if (!args.empty()) return Status::Error("devices: unexpected argument '" + args[0] + "'");
+namespace {
+
+Status ListOpenCLDevices(const GlobalOptions& options) {
   if (Status s = CheckOpenCLUsable(options.noOpenCL); !s.ok()) return s;
   std::vector<NLEOpenCLDeviceInfo> devices;
   if (Status s = ListDevices(&devices); !s.ok()) return s;
@@ -39,6 +41,18 @@ Status DevicesCommand(const GlobalOptions& options, const Args& args) {
         "GPU, else the first CPU, else the first device.");
   }
   return Status::Ok();
+}
+
+}  // namespace
+
+void AddDevicesCommand(CLI::App& app, const GlobalOptions& options,
+                       std::vector<Command>* commands) {
+  CLI::App* devices =
+      app.add_subcommand("devices", "OpenCL devices, as apply --device numbers them.");
+  devices->footer(R"(
+Lists the OpenCL platforms and devices with the index --device takes; * marks the default
+choice. Says so when there is no OpenCL platform.)");
+  commands->push_back({devices, nullptr, [&options] { return ListOpenCLDevices(options); }});
 }
 
 }  // namespace tfxtool

@@ -1,4 +1,6 @@
+#include <CLI/CLI.hpp>
 #include <cstdio>
+#include <memory>
 #include <string>
 
 #include "commands/Commands.h"
@@ -31,24 +33,17 @@ void PrintFunctions() {
   }
 }
 
-}  // namespace
-
-Status FxCommand(const GlobalOptions&, const Args& args) {
+struct FxOptions {
+  bool list = false;
   Args positional;
-  bool optionsEnded = false;
-  for (const std::string& a : args) {
-    if (a == "--list" && !optionsEnded) {
-      PrintFunctions();
-      return Status::Ok();
-    }
-    if (a == "--" && !optionsEnded) {
-      optionsEnded = true;
-    } else if (!optionsEnded && IsOptionWord(a)) {
-      return Status::Error("fx: unknown option '" + a + "'");
-    } else {
-      positional.push_back(a);
-    }
+};
+
+Status CallFunction(const FxOptions& options) {
+  if (options.list) {
+    PrintFunctions();
+    return Status::Ok();
   }
+  const Args& positional = options.positional;
   if (positional.empty()) return Status::Error("fx needs a FUNCTION (see tessarofx fx --list)");
   const ImageFunction* fn = FindImageFunction(positional[0]);
   if (!fn) {
@@ -79,6 +74,23 @@ Status FxCommand(const GlobalOptions&, const Args& args) {
   if (Status s = CallImageFunction(call, &image, &second, &report); !s.ok()) return s;
   std::fputs(report.c_str(), stdout);
   return fn->writes ? WriteImage(paths.back(), image) : Status::Ok();
+}
+
+}  // namespace
+
+void AddFxCommand(CLI::App& app, const GlobalOptions&, std::vector<Command>* commands) {
+  CLI::App* fx =
+      app.add_subcommand("fx", "Calls one of the library's image functions on an image.");
+  fx->footer(R"(
+  tessarofx fx FUNCTION [ARG]... INPUT [SECOND] [OUTPUT]
+
+Most functions write OUTPUT; merge and wb-rates read a SECOND image; white-point and wb-rates
+print measurements instead of writing. 'tessarofx fx --list' shows every function.)");
+  auto options = std::make_shared<FxOptions>();
+  fx->add_flag("--list", options->list, "the functions, their arguments and their ranges");
+  fx->add_option("WORDS", options->positional, "FUNCTION [ARG]... INPUT [SECOND] [OUTPUT]")
+      ->type_name("");
+  commands->push_back({fx, &options->positional, [options] { return CallFunction(*options); }});
 }
 
 }  // namespace tfxtool

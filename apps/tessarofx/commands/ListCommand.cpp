@@ -1,4 +1,6 @@
+#include <CLI/CLI.hpp>
 #include <cstdio>
+#include <memory>
 #include <string>
 
 #include "commands/Commands.h"
@@ -96,17 +98,7 @@ void PrintText(const std::vector<PublishedFilter>& filters) {
   }
 }
 
-}  // namespace
-
-Status ListCommand(const GlobalOptions& options, const Args& args) {
-  bool json = false;
-  for (const std::string& a : args) {
-    if (a == "--json") {
-      json = true;
-    } else {
-      return Status::Error("list: unexpected argument '" + a + "'");
-    }
-  }
+Status ListFilters(const GlobalOptions& options, bool json) {
   PluginLibrary plugin;
   if (Status s = plugin.Load(options.pluginPath); !s.ok()) return s;
   std::vector<PublishedFilter> filters;
@@ -117,6 +109,16 @@ Status ListCommand(const GlobalOptions& options, const Args& args) {
     PrintText(filters);
   }
   return Status::Ok();
+}
+
+}  // namespace
+
+void AddListCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands) {
+  CLI::App* list =
+      app.add_subcommand("list", "Published filters with their support flags and parameters.");
+  auto json = std::make_shared<bool>(false);
+  list->add_flag("--json", *json, "the same as one JSON document");
+  commands->push_back({list, nullptr, [&options, json] { return ListFilters(options, *json); }});
 }
 
 }  // namespace tfxtool

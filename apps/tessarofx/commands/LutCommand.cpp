@@ -1,5 +1,6 @@
 // tessarofx lut: looks into 3D LUT files with the plug-in's own reader, converts and resamples
 // them to tables the plug-in takes, and bakes adjustments into new ones.
+#include <CLI/CLI.hpp>
 #include <cstdio>
 #include <cstring>
 #include <fstream>
@@ -24,24 +25,12 @@ constexpr int kPluginMaxSize = CubeLut::kMaxSize;  // points per axis the plug-i
 // 36k points.
 constexpr int kDefaultBakeSize = 33;
 
-// A subcommand's words: its positional arguments and, where it takes one, the --size value
-// ("" when absent). "--" ends the options.
-Status SplitArgs(const std::string& command, const Args& args, std::string* size,
-                 Args* positional) {
-  bool optionsEnded = false;
-  for (size_t i = 0; i < args.size(); ++i) {
-    Status error;
-    if (optionsEnded || !IsOptionWord(args[i])) {
-      positional->push_back(args[i]);
-    } else if (args[i] == "--") {
-      optionsEnded = true;
-    } else if (!size || !TakeOptionValue(args, &i, "--size", nullptr, size, &error)) {
-      if (!error.ok()) return error;
-      return Status::Error(command + ": unknown option '" + args[i] + "'");
-    }
-  }
-  return Status::Ok();
-}
+// What the lut subcommands are given.
+struct LutOptions {
+  Args positional;
+  std::string size;  // --size, "" when absent
+  StepList steps;    // bake's -f and -p
+};
 
 // The value of a "LUT_3D_SIZE N" line, 0 when the line is not one.
 int SizeOnLine(const std::string& text) {
@@ -73,9 +62,8 @@ Status LoadThroughPlugin(const std::string& path, const PluginCubeLut& lut) {
   return Status::Error(reason);
 }
 
-Status InfoCommand(const GlobalOptions& options, const Args& words) {
-  Args args;
-  if (Status s = SplitArgs("lut info", words, nullptr, &args); !s.ok()) return s;
+Status InfoCommand(const GlobalOptions& options, const LutOptions& given) {
+  const Args& args = given.positional;
   if (args.size() != 1) return Status::Error("lut info takes one FILE");
   PluginLibrary plugin;
   if (Status s = plugin.Load(options.pluginPath); !s.ok()) return s;
@@ -137,10 +125,9 @@ Status WriteThroughPlugin(const PluginCubeLut& lut, const std::string& path) {
   });
 }
 
-Status ConvertCommand(const GlobalOptions& options, const Args& args) {
-  std::string sizeText;
-  Args positional;
-  if (Status s = SplitArgs("lut convert", args, &sizeText, &positional); !s.ok()) return s;
+Status ConvertCommand(const GlobalOptions& options, const LutOptions& given) {
+  const std::string& sizeText = given.size;
+  const Args& positional = given.positional;
   if (positional.size() != 2) {
     return Status::Error("lut convert takes IN and OUT (see tessarofx --help)");
   }
@@ -159,6 +146,9 @@ Status ConvertCommand(const GlobalOptions& options, const Args& args) {
   std::unique_ptr<PluginCubeLut> lut;
   if (Status s = PluginCubeLut::Create(plugin, &lut); !s.ok()) return s;
 
+  // Reading and resampling a 256-point table take seconds.
+  Reporter& report = *options.reporter;
+  report.Start("lut convert", 3);
   LutTable table;
   switch (LutFormatOf(input)) {
     case LutFormat::kCube:
@@ -183,6 +173,7 @@ Status ConvertCommand(const GlobalOptions& options, const Args& args) {
       return Status::Error(LutFileMessage(input, "not a .cube or .3dl file"));
   }
 
+  report.Advance();
   if (size == 0) {
     if (table.size > kPluginMaxSize) {
       return Status::Error(LutFileMessage(
@@ -193,9 +184,12 @@ Status ConvertCommand(const GlobalOptions& options, const Args& args) {
   } else if (size != table.size) {
     table = ResampleTable(*lut, table, size);
   }
+  report.Advance();
   if (Status s = FillLattice(*lut, table); !s.ok()) return s;
   if (Status s = WriteThroughPlugin(*lut, output); !s.ok()) return s;
-  std::printf("wrote %s (%d points per axis)\n", output.c_str(), table.size);
+  report.Advance();
+  report.Finish();
+  report.Note("wrote " + output + " (" + std::to_string(table.size) + " points per axis)");
   return Status::Ok();
 }
 
@@ -326,32 +320,21 @@ LutTable IdentityTable(int n) {
   return table;
 }
 
-Status BakeCommand(const GlobalOptions& options, const Args& args) {
-  std::vector<BakeStep> steps;
-  std::string sizeText;
-  Args positional;
-  bool optionsEnded = false;
-  for (size_t i = 0; i < args.size(); ++i) {
-    Status error;
-    std::string value;
-    if (optionsEnded || !IsOptionWord(args[i])) {
-      positional.push_back(args[i]);
-    } else if (args[i] == "--") {
-      optionsEnded = true;
-    } else if (TakeOptionValue(args, &i, "--filter", "-f", &value, &error)) {
-      steps.emplace_back();
-      if (Status s = StartStep(value, &steps.back()); !s.ok()) return s;
-    } else if (error.ok() && TakeOptionValue(args, &i, "--param", "-p", &value, &error)) {
-      if (steps.empty()) {
-        return Status::Error("lut bake: -p " + value + " needs a -f FILTER before it");
-      }
-      if (Status s = SetStepParam(value, &steps.back()); !s.ok()) return s;
-    } else if (error.ok() && !TakeOptionValue(args, &i, "--size", nullptr, &sizeText, &error) &&
-               error.ok()) {
-      return Status::Error("lut bake: unknown option '" + args[i] + "'");
-    }
-    if (!error.ok()) return error;
+Status BakeCommand(const GlobalOptions& options, const LutOptions& given) {
+  if (!given.steps.leading.empty()) {
+    return Status::Error("lut bake: -p " + given.steps.leading.front() +
+                         " needs a -f FILTER before it");
   }
+  std::vector<BakeStep> steps;
+  for (const StepWords& words : given.steps.steps) {
+    steps.emplace_back();
+    if (Status s = StartStep(words.filter, &steps.back()); !s.ok()) return s;
+    for (const std::string& param : words.params) {
+      if (Status s = SetStepParam(param, &steps.back()); !s.ok()) return s;
+    }
+  }
+  const std::string& sizeText = given.size;
+  const Args& positional = given.positional;
   if (positional.size() != 1) {
     return Status::Error("lut bake takes one OUT.cube (see tessarofx --help)");
   }
@@ -369,25 +352,67 @@ Status BakeCommand(const GlobalOptions& options, const Args& args) {
   std::unique_ptr<PluginCubeLut> lut;
   if (Status s = PluginCubeLut::Create(plugin, &lut); !s.ok()) return s;
   if (Status s = FillLattice(*lut, IdentityTable(size)); !s.ok()) return s;
+  Reporter& report = *options.reporter;
+  report.Start("lut bake", steps.size());
   for (const BakeStep& step : steps) {
     if (Status s = ApplyStep(*lut, step); !s.ok()) return s;
+    report.Advance();
   }
+  report.Finish();
   if (Status s = WriteThroughPlugin(*lut, output); !s.ok()) return s;
-  std::printf("wrote %s (%d points per axis)\n", output.c_str(), size);
+  report.Note("wrote " + output + " (" + std::to_string(size) + " points per axis)");
   return Status::Ok();
 }
 
 }  // namespace
 
-Status LutCommand(const GlobalOptions& options, const Args& args) {
-  if (args.empty()) {
-    return Status::Error("lut needs a subcommand: info, convert, bake (see tessarofx --help)");
-  }
-  const Args rest(args.begin() + 1, args.end());
-  if (args[0] == "info") return InfoCommand(options, rest);
-  if (args[0] == "convert") return ConvertCommand(options, rest);
-  if (args[0] == "bake") return BakeCommand(options, rest);
-  return Status::Error("unknown lut subcommand '" + args[0] + "' (known: info, convert, bake)");
+void AddLutCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands) {
+  CLI::App* lut = app.add_subcommand("lut", "Looks into, converts and bakes 3D LUT files.");
+  lut->require_subcommand(0, 1);
+  // A word that names no subcommand lands here, for a message that lists the known ones.
+  auto unknown = std::make_shared<Args>();
+  lut->add_option("SUBCOMMAND", *unknown, "info, convert or bake")->type_name("");
+  commands->push_back({lut, unknown.get(), [unknown]() {
+                         if (unknown->empty()) {
+                           return Status::Error(
+                               "lut needs a subcommand: info, convert, bake (see tessarofx lut "
+                               "--help)");
+                         }
+                         return Status::Error("unknown lut subcommand '" + unknown->front() +
+                                              "' (known: info, convert, bake)");
+                       }});
+
+  using Run = Status (*)(const GlobalOptions&, const LutOptions&);
+  const auto add = [&](const char* name, const char* about, const char* words, Run run) {
+    CLI::App* sub = lut->add_subcommand(name, about);
+    auto given = std::make_shared<LutOptions>();
+    sub->add_option("FILES", given->positional, words)->type_name("");
+    commands->push_back(
+        {sub, &given->positional, [&options, given, run] { return run(options, *given); }});
+    return std::make_pair(sub, given);
+  };
+  add("info", "Prints a .cube or .3dl file's size, title and domain.", "FILE", InfoCommand)
+      .first->footer(R"(
+Reads the file with the plug-in's own reader; a file it refuses is shown with the line where
+reading stopped and why.)");
+  const auto [convert, convertOptions] =
+      add("convert", "Rewrites a .cube or .3dl table as a .cube file the plug-in reads.",
+          "IN OUT.cube", ConvertCommand);
+  convert->footer(R"(
+IN may be a .cube file of up to 256 points per axis or a .3dl file; tables above the plug-in's
+64 points need --size, which resamples by tetrahedral interpolation.)");
+  convert->add_option("--size", convertOptions->size, "resample to N points per axis (2..64)")
+      ->type_name("N");
+  const auto [bake, bakeOptions] =
+      add("bake", "Bakes colour filter settings into a .cube table.", "OUT.cube", BakeCommand);
+  bake->footer(R"(
+  tessarofx lut bake [-f FILTER [-p NAME=VALUE]...]... [--size N] OUT.cube
+
+Bakes ColorAdjust, LightAdjust and WhiteBalanceAdjust settings (the parameters apply takes), in
+the order given; ColorLut3dAdjust then applies the whole chain in one pass.)");
+  AddStepOptions(bake, &bakeOptions->steps);
+  bake->add_option("--size", bakeOptions->size, "points per axis, 2..64 (default 33)")
+      ->type_name("N");
 }
 
 }  // namespace tfxtool
