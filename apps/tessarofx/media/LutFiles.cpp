@@ -1,4 +1,4 @@
-#include "LutFiles.h"
+#include "media/LutFiles.h"
 
 #include <cctype>
 #include <fstream>

@@ -5,8 +5,8 @@
 #include <string>
 #include <vector>
 
-#include "PluginCubeLut.h"
 #include "Status.h"
+#include "plugin/PluginCubeLut.h"
 
 namespace tfxtool {
 

@@ -1,4 +1,4 @@
-#include "PluginCubeLut.h"
+#include "plugin/PluginCubeLut.h"
 
 #include <new>
 #include <type_traits>

@@ -11,8 +11,8 @@
 #include <string>
 #include <vector>
 
-#include "PluginLibrary.h"
 #include "Status.h"
+#include "plugin/PluginLibrary.h"
 #include "tessarofx/CubeLut.h"
 
 namespace tfxtool {
