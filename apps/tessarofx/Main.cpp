@@ -31,6 +31,7 @@ processed as 8-bit BGRA. 'tessarofx COMMAND --help' describes a command.)";
 // the tool can run or a global option is wrong, as the shell's own utilities do.
 constexpr int kFailed = 1;
 constexpr int kUsage = 2;
+constexpr int kIncomplete = 3;  // the output stands, but the input could not all be read
 
 void PrintError(const std::string& message) {
   std::fprintf(stderr, "tessarofx: error: %s\n", message.c_str());
@@ -76,7 +77,8 @@ int Run(int argc, char** argv) {
   app.add_option("--log-level", logLevel,
                  "plug-in log threshold: 0 trace, 16 debug, 32 info, 48 warning, 64 error")
       ->type_name("N|off");
-  app.add_flag("-v,--verbose", verbose, "log level 32: show each filter as it is created");
+  app.add_flag("-v,--verbose", verbose,
+               "log level 32: show each filter as it is created; for clips, where the time went");
   app.add_flag("--no-opencl", options.noOpenCL,
                "never touch the OpenCL runtime (apply --opencl and devices refuse)");
   app.add_flag("-q,--quiet", options.quiet, "no progress display; messages still appear");
@@ -157,9 +159,14 @@ int Run(int argc, char** argv) {
     }
   }
 
+  options.verbose = verbose;
   Reporter reporter(options.quiet, Reporter::StderrIsTerminal());
   options.reporter = &reporter;
   if (Status s = command->run(); !s.ok()) {
+    if (s.incomplete()) {
+      reporter.Warn(s.message());
+      return kIncomplete;
+    }
     reporter.Error(s.message());
     return kFailed;
   }

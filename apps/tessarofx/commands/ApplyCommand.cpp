@@ -1,4 +1,6 @@
 #include <CLI/CLI.hpp>
+#include <algorithm>
+#include <climits>
 #include <cstdio>
 #include <limits>
 #include <memory>
@@ -6,6 +8,7 @@
 #include "commands/Commands.h"
 #include "media/ImageFiles.h"
 #include "media/Text.h"
+#include "media/VideoJob.h"
 #include "plugin/FilterChain.h"
 #include "plugin/FilterHost.h"
 #include "plugin/OpenCLDevices.h"
@@ -33,7 +36,82 @@ struct ApplyOptions {
   Args positional;
   std::string background, device, kernels;
   bool opencl = false;
+  VideoOptions video;
 };
+
+// A worker of a clip: a chain of its own, or the one filter's OpenCL class on a device of its
+// own.
+class ChainWorker final : public FrameWorker {
+ public:
+  FilterChain chain;
+  Status Process(cv::Mat& bgra, const cv::Mat* background, int64_t index, int64_t total) override {
+    chain.SetFrameTime(static_cast<int32_t>(std::min<int64_t>(index, INT32_MAX)),
+                       static_cast<int32_t>(std::min<int64_t>(total, INT32_MAX)));
+    return chain.Run(bgra, &bgra, background);
+  }
+};
+
+class OpenCLWorker final : public FrameWorker {
+ public:
+  const PluginLibrary* plugin = nullptr;
+  ChainStep step;
+  NLEComPtr<INLECGDevice> device;
+  OpenCLTarget target;
+  Status Process(cv::Mat& bgra, const cv::Mat*, int64_t, int64_t) override {
+    cv::Mat result;
+    if (Status s = RunFilterOpenCL(*plugin, step.filter, step.settings, target, bgra, &result);
+        !s.ok()) {
+      return s;
+    }
+    bgra = result;
+    return Status::Ok();
+  }
+};
+
+Status ApplyToClip(const GlobalOptions& options, const ApplyOptions& given,
+                   const PluginLibrary& plugin, const std::vector<ChainStep>& steps,
+                   const std::string& input, const std::string& output, int deviceIndex) {
+  if (IsStillImagePath(output)) {
+    return Status::Error(output + " is a picture, but " + input +
+                         " is a clip: write a clip, or a sequence such as out_%04d.png");
+  }
+  // Settings are checked once, before any frame is read.
+  FilterChain probe;
+  if (Status s = FilterChain::Create(plugin, steps, &probe); !s.ok()) return s;
+  VideoJob job;
+  job.input = input;
+  job.output = output;
+  job.background = given.background;
+  job.codec = given.video.codec;
+  job.quality = given.video.quality;
+  job.threads = given.video.Threads();
+  job.timings = options.verbose;
+  job.alpha = [chain = std::make_shared<FilterChain>(std::move(probe))](bool inputAlpha) {
+    return chain->CarriesAlpha(inputAlpha);
+  };
+  if (given.opencl) {
+    job.makeWorker = [&](std::unique_ptr<FrameWorker>* out) {
+      auto worker = std::make_unique<OpenCLWorker>();
+      worker->plugin = &plugin;
+      worker->step = steps[0];
+      if (Status s =
+              OpenOpenCLTarget(plugin, deviceIndex, given.kernels, worker->device, &worker->target);
+          !s.ok()) {
+        return s;
+      }
+      *out = std::move(worker);
+      return Status::Ok();
+    };
+  } else {
+    job.makeWorker = [&](std::unique_ptr<FrameWorker>* out) {
+      auto worker = std::make_unique<ChainWorker>();
+      if (Status s = FilterChain::Create(plugin, steps, &worker->chain); !s.ok()) return s;
+      *out = std::move(worker);
+      return Status::Ok();
+    };
+  }
+  return RunVideoJob(job, *options.reporter);
+}
 
 // The chain the command line asks for: the steps of -f, or the one FILTER before INPUT.
 Status ChainWords(const ApplyOptions& given, std::vector<StepWords>* steps, Args* files) {
@@ -100,7 +178,15 @@ Status ApplyFilters(const GlobalOptions& options, const ApplyOptions& given) {
   }
   const std::string& input = files[0];
   const std::string& output = files[1];
-  if (Status s = CheckWritableFormat(output); !s.ok()) return s;
+  const bool clip = !IsStillImagePath(input);
+  if (opencl && !clip && !backgroundPath.empty()) {
+    return Status::Error(
+        "--background does not go with --opencl: the OpenCL filters adjust one "
+        "frame");
+  }
+  if (!clip) {
+    if (Status s = CheckWritableFormat(output); !s.ok()) return s;
+  }
 
   PluginLibrary plugin;
   if (Status s = plugin.Load(options.pluginPath); !s.ok()) return s;
@@ -115,6 +201,12 @@ Status ApplyFilters(const GlobalOptions& options, const ApplyOptions& given) {
       if (Status s = ParseParamSetting(text, &resolved.settings.back()); !s.ok()) return s;
     }
     steps.push_back(std::move(resolved));
+  }
+  if (clip) {
+    if (opencl && !steps[0].filter.opencl) {
+      return Status::Error(steps[0].filter.name + " has no OpenCL class; see tessarofx list");
+    }
+    return ApplyToClip(options, given, plugin, steps, input, output, static_cast<int>(deviceIndex));
   }
 
   cv::Mat foreground, background;
@@ -149,7 +241,8 @@ Status ApplyFilters(const GlobalOptions& options, const ApplyOptions& given) {
 }  // namespace
 
 void AddApplyCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands) {
-  CLI::App* apply = app.add_subcommand("apply", "Runs one filter or a chain of them on an image.");
+  CLI::App* apply =
+      app.add_subcommand("apply", "Runs one filter or a chain of them on an image or a clip.");
   apply->footer(R"(
   tessarofx apply FILTER [-p NAME=VALUE]... [-b FILE] INPUT OUTPUT
   tessarofx apply -f FILTER [-p NAME=VALUE]... [-f FILTER [-p NAME=VALUE]...]... INPUT OUTPUT
@@ -160,11 +253,20 @@ their ranges. Filters given by -f run in the order given, each on the result of 
 with the -p settings that follow it. INPUT is the foreground frame; the background is -b FILE
 (same size) or INPUT itself.
 
+INPUT may be a clip in any format FFmpeg reads, or a picture sequence such as shot_%04d.png; the
+output is then a clip (H.264 for .mp4/.mkv/.mov unless --codec says otherwise; with alpha when
+the chain keys: ProRes 4444 in .mov, VP9 in .webm, FFV1 in .mkv, PNG sequences) with the input's
+sound, subtitles, timing, rotation and colour tags. It is written beside OUTPUT and moved there
+once complete: a failure or Ctrl-C leaves nothing at OUTPUT. Exit status 3: the input was
+damaged, and OUTPUT holds the frames that could be decoded.
+
 Examples:
   tessarofx apply ColorAdjust -p u_exposure=20 -p u_sat=-30 in.png out.png
   tessarofx apply -f ColorAdjust -p u_exposure=20 -f VignetteAdjust -p amount=-60 in.png out.png
   tessarofx apply ChromeKeyCombine --background mask.png beauty.png keyed.png
-  tessarofx apply --opencl --device 0 WhiteBalanceAdjust -p u_temperature=40 in.png out.png)");
+  tessarofx apply --opencl --device 0 WhiteBalanceAdjust -p u_temperature=40 in.png out.png
+  tessarofx apply -f ColorAdjust -p u_exposure=20 -f Lut -p lut3dPath=look.cube in.mp4 out.mp4
+  tessarofx apply --threads 4 --codec ffv1 LightAdjust -p u_shadow=30 shot_%04d.png graded.mkv)");
   auto given = std::make_shared<ApplyOptions>();
   AddStepOptions(apply, &given->steps);
   apply
@@ -181,6 +283,7 @@ Examples:
       ->add_option("--kernels", given->kernels,
                    "with --opencl: the OpenCL programs (default: beside the plug-in)")
       ->type_name("DIR");
+  AddVideoOptions(apply, &given->video);
   apply->add_option("FILES", given->positional, "[FILTER] INPUT OUTPUT")->type_name("");
   commands->push_back(
       {apply, &given->positional, [&options, given] { return ApplyFilters(options, *given); }});

@@ -21,6 +21,7 @@ struct GlobalOptions {
   std::string pluginPath;  // --plugin; empty: the usual search
   bool noOpenCL = false;   // --no-opencl: nothing in this run touches the OpenCL runtime
   bool quiet = false;      // --quiet: no progress display
+  bool verbose = false;    // -v: creation lines, and for clips where the time went
   Reporter* reporter = nullptr;
 };
 
@@ -52,5 +53,14 @@ struct StepList {
   std::vector<std::string> leading;  // -p before the first -f
 };
 void AddStepOptions(CLI::App* command, StepList* list);
+
+// How a command writes clips: --codec, --quality, --threads.
+struct VideoOptions {
+  std::string codec;
+  std::string quality;
+  int threads = 0;  // 0: every core
+  int Threads() const;
+};
+void AddVideoOptions(CLI::App* command, VideoOptions* options);
 
 }  // namespace tfxtool

@@ -1,4 +1,5 @@
 #include <CLI/CLI.hpp>
+#include <thread>
 
 #include "commands/Commands.h"
 
@@ -26,6 +27,35 @@ void AddStepOptions(CLI::App* command, StepList* list) {
       ->type_name("NAME=VALUE")
       ->trigger_on_parse()
       ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
+}
+
+}  // namespace tfxtool
+
+namespace tfxtool {
+
+int VideoOptions::Threads() const {
+  if (threads > 0) return threads;
+  const unsigned cores = std::thread::hardware_concurrency();
+  return cores > 0 ? static_cast<int>(cores) : 1;
+}
+
+void AddVideoOptions(CLI::App* command, VideoOptions* options) {
+  command
+      ->add_option("--codec", options->codec,
+                   "for clips: an FFmpeg encoder (libx264, ffv1, prores_ks, libvpx-vp9, png, ...); "
+                   "default by the output's container")
+      ->type_name("NAME");
+  command
+      ->add_option("--quality", options->quality,
+                   "for clips: the encoder's constant quality (x264's crf; lower is better; "
+                   "default 17, visually lossless)")
+      ->type_name("Q");
+  command
+      ->add_option("--threads", options->threads,
+                   "for clips: frames filtered at once, each by filters of its own (default: "
+                   "every core); the result is the same for any number")
+      ->type_name("N")
+      ->check(CLI::NonNegativeNumber);
 }
 
 }  // namespace tfxtool
