@@ -86,6 +86,7 @@ int Run(int argc, char** argv) {
   std::vector<Command> commands;
   AddListCommand(app, options, &commands);
   AddApplyCommand(app, options, &commands);
+  AddKeyCommand(app, options, &commands);
   AddFxCommand(app, options, &commands);
   AddLutCommand(app, options, &commands);
   AddDemoCommand(app, options, &commands);

@@ -41,6 +41,7 @@ void AddFxCommand(CLI::App& app, const GlobalOptions& options, std::vector<Comma
 void AddDemoCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands);
 void AddLutCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands);
 void AddDevicesCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands);
+void AddKeyCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands);
 
 // "-f FILTER [-p NAME=VALUE]..." as apply and lut bake take them: each -p belongs to the -f
 // before it. -p options before any -f are kept apart, for the commands that take a lone FILTER.
