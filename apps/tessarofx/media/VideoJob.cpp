@@ -153,8 +153,20 @@ Status RunVideoJob(const VideoJob& job, Reporter& reporter) {
   media::WriterOptions options;
   options.codec = job.codec;
   options.quality = job.quality;
+  // Alpha the chain makes must reach the output; alpha that only passes through from the input
+  // is kept where the output can hold it and dropped, with a word, where it cannot.
+  const bool makesAlpha = job.alpha && job.alpha(false);
   options.alpha = job.alpha && job.alpha(info.hasAlpha);
-  if (Status s = FromMedia(writer.Open(job.output, reader, options)); !s.ok()) return s;
+  Status opened = FromMedia(writer.Open(job.output, reader, options));
+  if (!opened.ok() && options.alpha && !makesAlpha) {
+    options.alpha = false;
+    opened = FromMedia(writer.Open(job.output, reader, options));
+    if (opened.ok()) {
+      reporter.Warn(job.input + " has alpha, which " + job.output +
+                    " cannot hold with its codec: written without it");
+    }
+  }
+  if (!opened.ok()) return opened;
 
   InterruptGuard interrupt;
   const int64_t estimate = info.frameCountEstimate;
