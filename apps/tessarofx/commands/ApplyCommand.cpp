@@ -68,9 +68,12 @@ class OpenCLWorker final : public FrameWorker {
   }
 };
 
-Status ApplyToClip(const GlobalOptions& options, const ApplyOptions& given,
-                   const PluginLibrary& plugin, const std::vector<ChainStep>& steps,
-                   const std::string& input, const std::string& output, int deviceIndex) {
+}  // namespace
+
+Status ApplyChainToClip(const GlobalOptions& options, const PluginLibrary& plugin,
+                        const std::vector<ChainStep>& steps, const ClipRequest& request) {
+  const std::string& input = request.input;
+  const std::string& output = request.output;
   if (IsStillImagePath(output)) {
     return Status::Error(output + " is a picture, but " + input +
                          " is a clip: write a clip, or a sequence such as out_%04d.png");
@@ -81,21 +84,21 @@ Status ApplyToClip(const GlobalOptions& options, const ApplyOptions& given,
   VideoJob job;
   job.input = input;
   job.output = output;
-  job.background = given.background;
-  job.codec = given.video.codec;
-  job.quality = given.video.quality;
-  job.threads = given.video.Threads();
+  job.background = request.background;
+  job.codec = request.video.codec;
+  job.quality = request.video.quality;
+  job.threads = request.video.Threads();
   job.timings = options.verbose;
   job.alpha = [chain = std::make_shared<FilterChain>(std::move(probe))](bool inputAlpha) {
     return chain->CarriesAlpha(inputAlpha);
   };
-  if (given.opencl) {
+  if (request.opencl) {
     job.makeWorker = [&](std::unique_ptr<FrameWorker>* out) {
       auto worker = std::make_unique<OpenCLWorker>();
       worker->plugin = &plugin;
       worker->step = steps[0];
-      if (Status s =
-              OpenOpenCLTarget(plugin, deviceIndex, given.kernels, worker->device, &worker->target);
+      if (Status s = OpenOpenCLTarget(plugin, request.deviceIndex, request.kernels, worker->device,
+                                      &worker->target);
           !s.ok()) {
         return s;
       }
@@ -112,6 +115,8 @@ Status ApplyToClip(const GlobalOptions& options, const ApplyOptions& given,
   }
   return RunVideoJob(job, *options.reporter);
 }
+
+namespace {
 
 // The chain the command line asks for: the steps of -f, or the one FILTER before INPUT.
 Status ChainWords(const ApplyOptions& given, std::vector<StepWords>* steps, Args* files) {
@@ -206,7 +211,10 @@ Status ApplyFilters(const GlobalOptions& options, const ApplyOptions& given) {
     if (opencl && !steps[0].filter.opencl) {
       return Status::Error(steps[0].filter.name + " has no OpenCL class; see tessarofx list");
     }
-    return ApplyToClip(options, given, plugin, steps, input, output, static_cast<int>(deviceIndex));
+    ClipRequest request{input,       output, backgroundPath,
+                        given.video, opencl, static_cast<int>(deviceIndex),
+                        kernelDir};
+    return ApplyChainToClip(options, plugin, steps, request);
   }
 
   cv::Mat foreground, background;

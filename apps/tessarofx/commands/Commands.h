@@ -9,6 +9,7 @@
 
 #include "Status.h"
 #include "media/Reporter.h"
+#include "plugin/FilterChain.h"
 #include "plugin/PluginLibrary.h"
 
 namespace CLI {
@@ -63,5 +64,29 @@ struct VideoOptions {
   int Threads() const;
 };
 void AddVideoOptions(CLI::App* command, VideoOptions* options);
+
+// A clip to run through filters: its input, its output, the background clip or picture beside
+// it (empty: none), how to write it and, for one filter, whether to run its OpenCL class.
+struct ClipRequest {
+  std::string input, output, background;
+  VideoOptions video;
+  bool opencl = false;
+  int deviceIndex = -1;
+  std::string kernels;
+};
+// A chain of filters over a clip, frame-parallel (apply's clip path).
+Status ApplyChainToClip(const GlobalOptions& options, const PluginLibrary& plugin,
+                        const std::vector<ChainStep>& steps, const ClipRequest& request);
+
+// The chroma key: the screen's colour and the keyer's edge settings (as text, checked against
+// the keyer's ranges); `request.background` is what the keyed picture is laid over, if anything.
+struct KeySettings {
+  int rgb[3] = {0, 0, 0};
+  std::string contrast = "50";
+  std::string offset = "0";
+};
+Status KeyClipOrPicture(const GlobalOptions& options, const PluginLibrary& plugin,
+                        const std::vector<PublishedFilter>& published, const KeySettings& key,
+                        const ClipRequest& request);
 
 }  // namespace tfxtool

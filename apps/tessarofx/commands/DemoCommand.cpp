@@ -5,8 +5,11 @@
 #include <cmath>
 #include <cstdio>
 #include <cstring>
+#include <filesystem>
 #include <map>
 #include <memory>
+#include <opencv2/imgcodecs.hpp>
+#include <opencv2/imgproc.hpp>
 
 #include "commands/Commands.h"
 #include "commands/ImageFunctions.h"
@@ -198,6 +201,79 @@ int RunOpenCLTwins(const GlobalOptions& options, const PluginLibrary& plugin,
   return failures;
 }
 
+// A few seconds of the scene with a ball crossing it and the green screen, graded and keyed over
+// a sunset, through the same clip path as apply and key. Returns the number of failures.
+int WriteDemoClips(const GlobalOptions& options, const PluginLibrary& plugin,
+                   const std::vector<PublishedFilter>& published, const std::string& dir,
+                   const std::string& lutPath) {
+  Reporter& report = *options.reporter;
+  constexpr int kFrames = 50;  // two seconds at the sequence's 25 frames a second
+  const std::string frames = dir + "/.clip-frames";
+  std::error_code ignored;
+  std::filesystem::remove_all(frames, ignored);
+  if (Status s = MakeDirectories(frames); !s.ok()) {
+    report.Error(s.message());
+    return 1;
+  }
+  const cv::Mat scene = MakeDemoScene(640, 360);
+  for (int i = 0; i < kFrames; ++i) {
+    cv::Mat frame = scene.clone();
+    const cv::Point centre(60 + i * 11, 210 + static_cast<int>(50 * std::sin(i / 7.0)));
+    cv::circle(frame, centre, 30, cv::Scalar(30, 140, 240, 255), cv::FILLED, cv::LINE_AA);
+    char name[32];
+    std::snprintf(name, sizeof name, "/frame_%03d.png", i + 1);
+    // Opaque frames are stored without alpha, so that the clips need none.
+    cv::Mat opaque;
+    cv::cvtColor(frame, opaque, cv::COLOR_BGRA2BGR);
+    if (!cv::imwrite(frames + name, opaque)) {
+      report.Error("cannot write " + frames + name);
+      return 1;
+    }
+  }
+  cv::Mat sunset(360, 640, CV_8UC4);
+  for (int y = 0; y < sunset.rows; ++y) {
+    const double t = y / 359.0;
+    sunset.row(y).setTo(cv::Scalar(90 + 60 * t, 80 + 90 * t, 250 - 40 * t, 255));
+  }
+  const std::string sunsetPath = dir + "/clip-background.png";
+  int failures = 0;
+  Status s = WriteImage(sunsetPath, sunset);
+
+  ClipRequest graded;
+  graded.input = frames + "/frame_%03d.png";
+  graded.output = dir + "/clip-graded.mp4";
+  std::vector<ChainStep> steps(2);
+  if (s.ok()) s = ResolveFilter(published, "ColorAdjust", &steps[0].filter);
+  if (s.ok()) s = ResolveFilter(published, "Lut", &steps[1].filter);
+  steps[0].settings = {{"u_exposure", "20"}, {"u_contrast", "30"}, {"u_vib", "40"}};
+  steps[1].settings = {{"lut3dPath", lutPath}};
+  if (s.ok()) s = ApplyChainToClip(options, plugin, steps, graded);
+  if (s.ok()) {
+    report.Note("wrote " + graded.output);
+  } else {
+    report.Error(s.message());
+    ++failures;
+  }
+
+  ClipRequest keyed = graded;
+  keyed.output = dir + "/clip-keyed.mp4";
+  keyed.background = sunsetPath;
+  KeySettings key;
+  const Rgb screen = DemoScreenColour();
+  key.rgb[0] = screen.r;
+  key.rgb[1] = screen.g;
+  key.rgb[2] = screen.b;
+  s = KeyClipOrPicture(options, plugin, published, key, keyed);
+  if (s.ok()) {
+    report.Note("wrote " + keyed.output);
+  } else {
+    report.Error(s.message());
+    ++failures;
+  }
+  std::filesystem::remove_all(frames, ignored);
+  return failures;
+}
+
 Status RunDemo(const GlobalOptions& options, const Args& args) {
   if (args.size() > 1) return Status::Error("demo: unexpected argument '" + args[1] + "'");
   std::string dir = args.empty() ? "demo-out" : args[0];
@@ -313,6 +389,7 @@ Status RunDemo(const GlobalOptions& options, const Args& args) {
   report.Advance();
   report.Finish();
   report.Note("wrote " + sheetFile);
+  failures += WriteDemoClips(options, plugin, published, dir, lutPath);
   // Last, so that an OpenCL runtime that fails in any way cannot cost a CPU picture.
   failures += RunOpenCLTwins(options, plugin, twins, dir);
   if (failures) return Status::Error(std::to_string(failures) + " demo step(s) failed");
@@ -324,8 +401,9 @@ Status RunDemo(const GlobalOptions& options, const Args& args) {
 void AddDemoCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands) {
   CLI::App* demo = app.add_subcommand("demo", "Renders a test scene through every filter.");
   demo->footer(R"(
-Writes the scene, one PNG per filter and contact-sheet.png to OUTDIR, then the filters with an
-OpenCL class again on the default device.)");
+Writes the scene, one PNG per filter and contact-sheet.png to OUTDIR, two seconds of the scene
+with a moving ball graded (clip-graded.mp4) and keyed over a sunset (clip-keyed.mp4), then the
+filters with an OpenCL class again on the default device.)");
   auto dir = std::make_shared<Args>();
   demo->add_option("OUTDIR", *dir, "where the pictures go (default: demo-out)")
       ->type_name("")

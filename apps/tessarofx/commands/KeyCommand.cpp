@@ -19,8 +19,7 @@ namespace {
 
 struct KeyOptions {
   std::string screen;
-  std::string contrast = "50";
-  std::string offset = "0";
+  KeySettings key;
   std::string over;
   VideoOptions video;
   Args positional;
@@ -32,13 +31,14 @@ struct KeySteps {
 
 // The keyer in one mode; its settings are checked against the catalogue's ranges when the chains
 // are created.
-Status KeyerStep(const std::vector<PublishedFilter>& published, const KeyOptions& given,
-                 const int rgb[3], int mode, std::vector<ChainStep>* chain) {
+Status KeyerStep(const std::vector<PublishedFilter>& published, const KeySettings& key, int mode,
+                 std::vector<ChainStep>* chain) {
+  const int* rgb = key.rgb;
   ChainStep step;
   if (Status s = ResolveFilter(published, "ChromeKeyLut3d", &step.filter); !s.ok()) return s;
   step.settings = {{"red", std::to_string(rgb[0])},  {"green", std::to_string(rgb[1])},
-                   {"blue", std::to_string(rgb[2])}, {"contrast", given.contrast},
-                   {"offset", given.offset},         {"mode", std::to_string(mode)}};
+                   {"blue", std::to_string(rgb[2])}, {"contrast", key.contrast},
+                   {"offset", key.offset},           {"mode", std::to_string(mode)}};
   chain->push_back(std::move(step));
   return Status::Ok();
 }
@@ -95,22 +95,33 @@ Status MakeKeyWorker(const PluginLibrary& plugin, const KeySteps& steps,
   return Status::Ok();
 }
 
-Status Key(const GlobalOptions& options, const KeyOptions& given) {
+Status Key(const GlobalOptions& options, KeyOptions given) {
   if (given.positional.size() != 2) {
     return Status::Error("key needs IN and OUT (see tessarofx key --help)");
   }
-  const std::string& input = given.positional[0];
-  const std::string& output = given.positional[1];
-  int rgb[3];
-  if (Status s = ParseScreen(given.screen, rgb); !s.ok()) return s;
-
+  if (Status s = ParseScreen(given.screen, given.key.rgb); !s.ok()) return s;
   PluginLibrary plugin;
   if (Status s = plugin.Load(options.pluginPath); !s.ok()) return s;
   std::vector<PublishedFilter> published;
   if (Status s = ReadPublishedFilters(plugin, &published); !s.ok()) return s;
+  ClipRequest request;
+  request.input = given.positional[0];
+  request.output = given.positional[1];
+  request.background = given.over;
+  request.video = given.video;
+  return KeyClipOrPicture(options, plugin, published, given.key, request);
+}
+
+}  // namespace
+
+Status KeyClipOrPicture(const GlobalOptions& options, const PluginLibrary& plugin,
+                        const std::vector<PublishedFilter>& published, const KeySettings& key,
+                        const ClipRequest& request) {
+  const std::string& input = request.input;
+  const std::string& output = request.output;
   KeySteps steps;
-  if (Status s = KeyerStep(published, given, rgb, 0, &steps.mask); !s.ok()) return s;
-  if (Status s = KeyerStep(published, given, rgb, 1, &steps.colours); !s.ok()) return s;
+  if (Status s = KeyerStep(published, key, 0, &steps.mask); !s.ok()) return s;
+  if (Status s = KeyerStep(published, key, 1, &steps.colours); !s.ok()) return s;
   steps.combine.emplace_back();
   if (Status s = ResolveFilter(published, "ChromeKeyCombine", &steps.combine[0].filter); !s.ok()) {
     return s;
@@ -125,9 +136,9 @@ Status Key(const GlobalOptions& options, const KeyOptions& given) {
     if (Status s = CheckWritableFormat(output); !s.ok()) return s;
     cv::Mat frame, under;
     if (Status s = ReadImage(input, &frame); !s.ok()) return s;
-    if (!given.over.empty()) {
+    if (!request.background.empty()) {
       cv::Mat picture;
-      if (Status s = ReadImage(given.over, &picture); !s.ok()) return s;
+      if (Status s = ReadImage(request.background, &picture); !s.ok()) return s;
       cv::resize(picture, under, frame.size(), 0, 0, cv::INTER_AREA);
     }
     if (Status s = first->Process(frame, under.empty() ? nullptr : &under, 0, 1); !s.ok()) {
@@ -139,12 +150,12 @@ Status Key(const GlobalOptions& options, const KeyOptions& given) {
   VideoJob job;
   job.input = input;
   job.output = output;
-  job.background = given.over;
-  job.codec = given.video.codec;
-  job.quality = given.video.quality;
-  job.threads = given.video.Threads();
+  job.background = request.background;
+  job.codec = request.video.codec;
+  job.quality = request.video.quality;
+  job.threads = request.video.Threads();
   job.timings = options.verbose;
-  const bool keepAlpha = given.over.empty();
+  const bool keepAlpha = request.background.empty();
   job.alpha = [keepAlpha](bool) { return keepAlpha; };
   job.makeWorker = [&](std::unique_ptr<FrameWorker>* out) {
     if (first) {
@@ -158,8 +169,6 @@ Status Key(const GlobalOptions& options, const KeyOptions& given) {
   };
   return RunVideoJob(job, *options.reporter);
 }
-
-}  // namespace
 
 void AddKeyCommand(CLI::App& app, const GlobalOptions& options, std::vector<Command>* commands) {
   CLI::App* key = app.add_subcommand(
@@ -181,9 +190,10 @@ Examples:
   key->add_option("--screen", given->screen, "the screen's colour, R,G,B in 0..255")
       ->type_name("R,G,B")
       ->required();
-  key->add_option("--contrast", given->contrast, "hardness of the key's edge, 0..100 (default 50)")
+  key->add_option("--contrast", given->key.contrast,
+                  "hardness of the key's edge, 0..100 (default 50)")
       ->type_name("C");
-  key->add_option("--offset", given->offset, "moves the key threshold, -100..100 (default 0)")
+  key->add_option("--offset", given->key.offset, "moves the key threshold, -100..100 (default 0)")
       ->type_name("O");
   key->add_option("--over", given->over, "a picture or clip to lay the keyed picture over")
       ->type_name("BACKGROUND");
