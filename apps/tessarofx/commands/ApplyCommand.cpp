@@ -81,14 +81,7 @@ Status ApplyChainToClip(const GlobalOptions& options, const PluginLibrary& plugi
   // Settings are checked once, before any frame is read.
   FilterChain probe;
   if (Status s = FilterChain::Create(plugin, steps, &probe); !s.ok()) return s;
-  VideoJob job;
-  job.input = input;
-  job.output = output;
-  job.background = request.background;
-  job.codec = request.video.codec;
-  job.quality = request.video.quality;
-  job.threads = request.video.Threads();
-  job.timings = options.verbose;
+  VideoJob job = ClipJob(options, request);
   job.alpha = [chain = std::make_shared<FilterChain>(std::move(probe))](bool inputAlpha) {
     return chain->CarriesAlpha(inputAlpha);
   };

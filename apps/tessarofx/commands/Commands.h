@@ -9,6 +9,7 @@
 
 #include "Status.h"
 #include "media/Reporter.h"
+#include "media/VideoJob.h"
 #include "plugin/FilterChain.h"
 #include "plugin/PluginLibrary.h"
 
@@ -74,6 +75,9 @@ struct ClipRequest {
   int deviceIndex = -1;
   std::string kernels;
 };
+// The job a clip request describes, without its workers and alpha rule.
+VideoJob ClipJob(const GlobalOptions& options, const ClipRequest& request);
+
 // A chain of filters over a clip, frame-parallel (apply's clip path).
 Status ApplyChainToClip(const GlobalOptions& options, const PluginLibrary& plugin,
                         const std::vector<ChainStep>& steps, const ClipRequest& request);

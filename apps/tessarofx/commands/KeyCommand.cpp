@@ -147,14 +147,7 @@ Status KeyClipOrPicture(const GlobalOptions& options, const PluginLibrary& plugi
     return WriteImage(output, frame);
   }
 
-  VideoJob job;
-  job.input = input;
-  job.output = output;
-  job.background = request.background;
-  job.codec = request.video.codec;
-  job.quality = request.video.quality;
-  job.threads = request.video.Threads();
-  job.timings = options.verbose;
+  VideoJob job = ClipJob(options, request);
   const bool keepAlpha = request.background.empty();
   job.alpha = [keepAlpha](bool) { return keepAlpha; };
   job.makeWorker = [&](std::unique_ptr<FrameWorker>* out) {

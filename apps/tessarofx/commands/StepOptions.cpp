@@ -39,6 +39,18 @@ int VideoOptions::Threads() const {
   return cores > 0 ? static_cast<int>(cores) : 1;
 }
 
+VideoJob ClipJob(const GlobalOptions& options, const ClipRequest& request) {
+  VideoJob job;
+  job.input = request.input;
+  job.output = request.output;
+  job.background = request.background;
+  job.codec = request.video.codec;
+  job.quality = request.video.quality;
+  job.threads = request.video.Threads();
+  job.timings = options.verbose;
+  return job;
+}
+
 void AddVideoOptions(CLI::App* command, VideoOptions* options) {
   command
       ->add_option("--codec", options->codec,
