@@ -23,7 +23,7 @@ TESSAROFX_LOG_LEVEL=off "$tool" apply --quiet -v -f ColorAdjust -p u_exposure=10
   -f VignetteAdjust -p amount=-30 --codec libx264 --quality 17 in.mp4 ours.mp4 >ours.log 2>&1
 t1=$(now)
 ffmpeg -nostdin -v error -i in.mp4 \
-  -vf "eq=contrast=1.15:saturation=1.1:gamma=1.08,vibrance=intensity=0.25,colorlevels=rimax=0.9:gimax=0.9:bimax=0.9:romin=0.05:gomin=0.05:bomin=0.05,colortemperature=temperature=5600,vignette=angle=PI/5" \
+  -vf "eq=contrast=1.15:brightness=0.03:saturation=1.15,vibrance=intensity=0.25,colorlevels=rimin=0.03:gimin=0.03:bimin=0.03:rimax=0.97:gimax=0.97:bimax=0.97,colortemperature=temperature=5800,vignette=angle=PI/8" \
   -c:v libx264 -preset medium -crf 17 -c:a copy theirs.mp4
 t2=$(now)
 
