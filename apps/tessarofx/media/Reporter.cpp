@@ -89,15 +89,26 @@ void Reporter::Message(std::FILE* to, const std::string& line) {
   if (active_ && terminal_ && !quiet_) Draw(false);
 }
 
+// A task of unknown size (total 0) shows what is done so far, or only the time while nothing
+// countable happens.
 std::string Reporter::ProgressText(bool final) const {
   const double elapsed = Seconds(Clock::now() - started_).count();
   const double rate = elapsed > 0 ? static_cast<double>(done_) / elapsed : 0;
-  char counts[64];
-  std::snprintf(counts, sizeof counts, "%llu/%llu", static_cast<unsigned long long>(done_),
-                static_cast<unsigned long long>(total_));
-  std::string text = label_ + "  " + counts;
+  std::string text = label_;
+  char counts[64] = "";
+  if (total_ > 0) {
+    std::snprintf(counts, sizeof counts, "  %llu/%llu", static_cast<unsigned long long>(done_),
+                  static_cast<unsigned long long>(total_));
+  } else if (done_ > 0) {
+    std::snprintf(counts, sizeof counts, "  %llu", static_cast<unsigned long long>(done_));
+  }
+  text += counts;
   char numbers[96];
-  std::snprintf(numbers, sizeof numbers, "  %.1f/s  %s elapsed", rate, Duration(elapsed).c_str());
+  if (done_ > 0) {
+    std::snprintf(numbers, sizeof numbers, "  %.1f/s  %s elapsed", rate, Duration(elapsed).c_str());
+  } else {
+    std::snprintf(numbers, sizeof numbers, "  %s elapsed", Duration(elapsed).c_str());
+  }
   text += numbers;
   if (!final && done_ > 0 && done_ < total_ && rate > 0) {
     text += "  " + Duration(static_cast<double>(total_ - done_) / rate) + " left";
@@ -106,12 +117,16 @@ std::string Reporter::ProgressText(bool final) const {
 }
 
 void Reporter::Draw(bool final) {
-  const uint64_t filled = total_ ? done_ * kBarWidth / total_ : 0;
-  std::string bar(kBarWidth, '-');
-  std::fill(bar.begin(), bar.begin() + static_cast<long>(filled), '#');
   // \r returns to the line's start and \033[K clears what a longer line before left behind.
-  std::fprintf(err_, "\r%s [%s] %s\033[K", label_.c_str(), bar.c_str(),
-               ProgressText(final).substr(label_.size() + 2).c_str());
+  if (total_ == 0) {
+    std::fprintf(err_, "\r%s\033[K", ProgressText(final).c_str());
+  } else {
+    const uint64_t filled = done_ * kBarWidth / total_;
+    std::string bar(kBarWidth, '-');
+    std::fill(bar.begin(), bar.begin() + static_cast<long>(filled), '#');
+    std::fprintf(err_, "\r%s [%s] %s\033[K", label_.c_str(), bar.c_str(),
+                 ProgressText(final).substr(label_.size() + 2).c_str());
+  }
   std::fflush(err_);
   drawn_ = true;
   lastShown_ = Clock::now();

@@ -211,6 +211,8 @@ Status RunVideoJob(const VideoJob& job, Reporter& reporter) {
     reporter.Finish();
     return run;
   }
+  // The encoder holds frames back to look ahead; draining them can take seconds.
+  reporter.Start("finishing " + job.output, 0);
   const auto t = Stopwatch::Clock::now();
   if (Status s = FromMedia(writer.Finish()); !s.ok()) {
     reporter.Finish();
