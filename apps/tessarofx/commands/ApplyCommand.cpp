@@ -53,18 +53,11 @@ class ChainWorker final : public FrameWorker {
 
 class OpenCLWorker final : public FrameWorker {
  public:
-  const PluginLibrary* plugin = nullptr;
-  ChainStep step;
   NLEComPtr<INLECGDevice> device;
   OpenCLTarget target;
+  OpenCLFilterRun run;
   Status Process(cv::Mat& bgra, const cv::Mat*, int64_t, int64_t) override {
-    cv::Mat result;
-    if (Status s = RunFilterOpenCL(*plugin, step.filter, step.settings, target, bgra, &result);
-        !s.ok()) {
-      return s;
-    }
-    bgra = result;
-    return Status::Ok();
+    return run.Run(bgra, &bgra);
   }
 };
 
@@ -88,10 +81,13 @@ Status ApplyChainToClip(const GlobalOptions& options, const PluginLibrary& plugi
   if (request.opencl) {
     job.makeWorker = [&](std::unique_ptr<FrameWorker>* out) {
       auto worker = std::make_unique<OpenCLWorker>();
-      worker->plugin = &plugin;
-      worker->step = steps[0];
       if (Status s = OpenOpenCLTarget(plugin, request.deviceIndex, request.kernels, worker->device,
                                       &worker->target);
+          !s.ok()) {
+        return s;
+      }
+      if (Status s = OpenCLFilterRun::Create(plugin, steps[0].filter, steps[0].settings,
+                                             worker->target, &worker->run);
           !s.ok()) {
         return s;
       }

@@ -382,47 +382,68 @@ Status OpenOpenCLTarget(const PluginLibrary& plugin, int index, const std::strin
   return Status::Ok();
 }
 
-Status RunFilterOpenCL(const PluginLibrary& plugin, const ResolvedFilter& filter,
-                       const std::vector<ParamSetting>& settings, const OpenCLTarget& target,
-                       const cv::Mat& input, cv::Mat* out) {
-  NLEComPtr<INLECGFilter> fx;
-  if (Status s = CreateFilter(plugin, filter, settings, &target, fx); !s.ok()) return s;
+Status OpenCLFilterRun::Create(const PluginLibrary& plugin, const ResolvedFilter& filter,
+                               const std::vector<ParamSetting>& settings,
+                               const OpenCLTarget& target, OpenCLFilterRun* run) {
+  run->name_ = filter.name;
+  run->target_ = target;
+  return CreateFilter(plugin, filter, settings, &target, run->fx_);
+}
 
-  // The shipped kernels take packed BGRA buffers; image-kind frames are refused.
-  NLEComPtr<INLEOpenCLFrame> src, dst;
-  HRESULT hr = NLECommon::CreateOpenCLFrame(target.device, input.cols, input.rows,
-                                            OPENCL::kMemoryFrameBuffer, &src);
-  if (NLE_SUCCEEDED(hr)) {
-    hr = NLECommon::CreateOpenCLFrame(target.device, input.cols, input.rows,
-                                      OPENCL::kMemoryFrameBuffer, &dst);
+Status OpenCLFilterRun::Run(const cv::Mat& input, cv::Mat* out) {
+  const OpenCLTarget& target = target_;
+  // The shipped kernels take packed BGRA buffers; image-kind frames are refused. The frames stay
+  // on the device from one picture to the next of the same size.
+  if (input.size() != size_ || !src_ || !dst_) {
+    src_.Reset();
+    dst_.Reset();
+    HRESULT hr = NLECommon::CreateOpenCLFrame(target.device, input.cols, input.rows,
+                                              OPENCL::kMemoryFrameBuffer, &src_);
+    if (NLE_SUCCEEDED(hr)) {
+      hr = NLECommon::CreateOpenCLFrame(target.device, input.cols, input.rows,
+                                        OPENCL::kMemoryFrameBuffer, &dst_);
+    }
+    if (NLE_FAILED(hr) || !src_ || !dst_) {
+      src_.Reset();
+      dst_.Reset();
+      return Status::Error("cannot create a " + std::to_string(input.cols) + "x" +
+                               std::to_string(input.rows) + " frame on " + target.deviceName +
+                               ": " + DescribeResult(hr),
+                           hr);
+    }
+    size_ = input.size();
   }
-  if (NLE_FAILED(hr) || !src || !dst) {
-    return Status::Error("cannot create a " + std::to_string(input.cols) + "x" +
-                             std::to_string(input.rows) + " frame on " + target.deviceName + ": " +
-                             DescribeResult(hr),
-                         hr);
-  }
-  hr = src->Upload(input.ptr<uint8_t>(), static_cast<int32_t>(input.step[0]));
+  HRESULT hr = src_->Upload(input.ptr<uint8_t>(), static_cast<int32_t>(input.step[0]));
   if (NLE_FAILED(hr)) {
     return Status::Error(
         "cannot upload the input to " + target.deviceName + ": " + DescribeResult(hr), hr);
   }
-
-  hr = RunOnce(fx.get(), src.get(), nullptr, dst.get(), input.size());
-  fx.Reset();
+  hr = RunOnce(fx_.get(), src_.get(), nullptr, dst_.get(), input.size());
+  // The filter borrows the frames only for the run.
+  fx_->SetForeground(nullptr);
   if (NLE_FAILED(hr)) {
-    return Status::Error(filter.name + " failed on " + target.deviceName + ": " +
-                             DescribeResult(hr) + OpenCLRunFailure(hr),
+    return Status::Error(name_ + " failed on " + target.deviceName + ": " + DescribeResult(hr) +
+                             OpenCLRunFailure(hr),
                          hr);
   }
   cv::Mat result(input.size(), CV_8UC4);
-  hr = dst->Download(result.ptr<uint8_t>(), static_cast<int32_t>(result.step[0]));
+  hr = dst_->Download(result.ptr<uint8_t>(), static_cast<int32_t>(result.step[0]));
   if (NLE_FAILED(hr)) {
     return Status::Error(
         "cannot download the result from " + target.deviceName + ": " + DescribeResult(hr), hr);
   }
   *out = result;
   return Status::Ok();
+}
+
+Status RunFilterOpenCL(const PluginLibrary& plugin, const ResolvedFilter& filter,
+                       const std::vector<ParamSetting>& settings, const OpenCLTarget& target,
+                       const cv::Mat& input, cv::Mat* out) {
+  OpenCLFilterRun run;
+  if (Status s = OpenCLFilterRun::Create(plugin, filter, settings, target, &run); !s.ok()) {
+    return s;
+  }
+  return run.Run(input, out);
 }
 
 }  // namespace tfxtool

@@ -12,6 +12,7 @@
 #include "plugin/PluginLibrary.h"
 #include "tessarofx/NLECGFilter.h"
 #include "tessarofx/NLEHost.h"
+#include "tessarofx/NLEOpenCL.h"
 #include "tessarofx/NLEProperties.h"
 
 namespace tfxtool {
@@ -93,6 +94,24 @@ struct OpenCLTarget {
 // is used.
 Status OpenOpenCLTarget(const PluginLibrary& plugin, int index, const std::string& kernelDir,
                         NLEComPtr<INLECGDevice>& device, OpenCLTarget* target);
+
+// The filter's OpenCL class on a device, kept with its device frames from one picture to the
+// next, as a clip needs it. The target's device must outlive it.
+class OpenCLFilterRun {
+ public:
+  static Status Create(const PluginLibrary& plugin, const ResolvedFilter& filter,
+                       const std::vector<ParamSetting>& settings, const OpenCLTarget& target,
+                       OpenCLFilterRun* run);
+  // `input` uploaded into a device frame, the filter run, the result downloaded into `out`.
+  Status Run(const cv::Mat& input, cv::Mat* out);
+
+ private:
+  std::string name_;
+  OpenCLTarget target_;
+  NLEComPtr<INLECGFilter> fx_;
+  NLEComPtr<INLEOpenCLFrame> src_, dst_;
+  cv::Size size_;
+};
 
 // RunFilter for the filter's OpenCL class: the same settings, with `input` uploaded into a frame
 // in the device's memory and the result downloaded into `out`. The OpenCL classes adjust one
