@@ -1,5 +1,5 @@
-// tessarofx: runs the TessaroFx plug-in on image files the way a video editor drives it, so that
-// its filters can be tried, scripted and checked without an editor.
+// tessarofx: runs the TessaroFx plug-in on pictures and clips the way a video editor drives it, so
+// that its filters can be tried, scripted and checked without an editor.
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cstdio>
@@ -17,7 +17,7 @@ namespace tfxtool {
 namespace {
 
 constexpr const char* kDescription =
-    "Runs the TessaroFx filter plug-in on image files, as a video editor would.";
+    "Runs the TessaroFx filter plug-in on pictures and clips, as a video editor would.";
 
 constexpr const char* kFooter = R"(
 The plug-in is --plugin, else $TESSAROFX_PLUGIN, else the one beside the tool, else the one the
