@@ -14,7 +14,7 @@ key) on 8-bit BGRA frames, each with a CPU class and, for some, an OpenCL class.
 This package holds the plug-in (libTessaroFx.so.0) with its OpenCL programs, the host kit
 (libTessaroFxHost.so.0), the tessarofx command-line tool, and the headers, CMake package and
 pkg-config files for writing hosts.")
-set(TFX_PACKAGE_MAINTAINER "TessaroFx maintainers <maintainers@users.noreply.c-seed-cd5c18d6.example>"
+set(TFX_PACKAGE_MAINTAINER "TessaroFx maintainers <maintainers@tessarofx.example>"
   CACHE STRING "Maintainer field of the Debian package")
 set(CPACK_PACKAGE_CONTACT "${TFX_PACKAGE_MAINTAINER}")
 set(CPACK_DEBIAN_PACKAGE_MAINTAINER "${TFX_PACKAGE_MAINTAINER}")
