@@ -71,12 +71,15 @@ Status ApplyChainToClip(const GlobalOptions& options, const PluginLibrary& plugi
     return Status::Error(output + " is a picture, but " + input +
                          " is a clip: write a clip, or a sequence such as out_%04d.png");
   }
-  // Settings are checked once, before any frame is read.
-  FilterChain probe;
-  if (Status s = FilterChain::Create(plugin, steps, &probe); !s.ok()) return s;
+  // Settings are checked once, before any frame is read; the chain that checked them becomes
+  // the first worker's.
+  auto first = std::make_unique<ChainWorker>();
+  if (Status s = FilterChain::Create(plugin, steps, &first->chain); !s.ok()) return s;
   VideoJob job = ClipJob(options, request);
-  job.alpha = [chain = std::make_shared<FilterChain>(std::move(probe))](bool inputAlpha) {
-    return chain->CarriesAlpha(inputAlpha);
+  const bool makesAlpha = first->chain.CarriesAlpha(false);
+  const bool keepsAlpha = first->chain.CarriesAlpha(true);
+  job.alpha = [makesAlpha, keepsAlpha](bool inputAlpha) {
+    return inputAlpha ? keepsAlpha : makesAlpha;
   };
   if (request.opencl) {
     job.makeWorker = [&](std::unique_ptr<FrameWorker>* out) {
@@ -96,6 +99,10 @@ Status ApplyChainToClip(const GlobalOptions& options, const PluginLibrary& plugi
     };
   } else {
     job.makeWorker = [&](std::unique_ptr<FrameWorker>* out) {
+      if (first) {
+        *out = std::move(first);
+        return Status::Ok();
+      }
       auto worker = std::make_unique<ChainWorker>();
       if (Status s = FilterChain::Create(plugin, steps, &worker->chain); !s.ok()) return s;
       *out = std::move(worker);
