@@ -18,6 +18,8 @@ packages=(
   dpkg-dev file
   libavformat-dev libavcodec-dev libswscale-dev libavutil-dev
   libcli11-dev libutfcpp-dev
+  python3-dev pybind11-dev python3-numpy python3-pytest
+  util-linux
 )
 
 missing=()
