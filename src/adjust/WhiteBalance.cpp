@@ -16,6 +16,7 @@
 
 #include "adjust/ImageWalk.h"
 #include "adjust/WhiteBalanceFormulas.h"
+#include "simd/color_adjust_rows.h"
 
 namespace {
 
@@ -220,23 +221,21 @@ bool AdjustWhiteBalance::Process(cv::Mat& src, cv::Mat& dst, ColorGain gain, flo
     return true;
   }
   const tfx::BalanceFactors f = tfx::DeriveBalance(a, b);
+  const float gains[3] = {f.blue, f.green, f.red};
+  const tfx::ColorAdjustRows& kernels = tfx::BestColorAdjustRows();
+  // Pixels wider than four bytes go through tables of the same products.
   uint8_t blue[256], green[256], red[256];
-  for (int v = 0; v < 256; ++v) {
-    blue[v] = FloatToByte(static_cast<float>(v) * f.blue);
-    green[v] = FloatToByte(static_cast<float>(v) * f.green);
-    red[v] = FloatToByte(static_cast<float>(v) * f.red);
+  if (channels != 4) {
+    for (int v = 0; v < 256; ++v) {
+      blue[v] = FloatToByte(static_cast<float>(v) * f.blue);
+      green[v] = FloatToByte(static_cast<float>(v) * f.green);
+      red[v] = FloatToByte(static_cast<float>(v) * f.red);
+    }
   }
-
   const auto run = [&](const uint8_t* s, uint8_t* d, size_t bytes) {
     const size_t pixels = bytes / static_cast<size_t>(channels);
     if (channels == 4) {
-      for (size_t i = 0; i < pixels; ++i) {
-        uint32_t in;
-        std::memcpy(&in, s + 4 * i, 4);
-        const uint32_t out = blue[in & 255] | uint32_t{green[(in >> 8) & 255]} << 8 |
-                             uint32_t{red[(in >> 16) & 255]} << 16 | (in & 0xff000000u);
-        std::memcpy(d + 4 * i, &out, 4);
-      }
+      kernels.scaleChannels(d, s, pixels, gains);
       return;
     }
     for (size_t i = 0; i < pixels; ++i, s += channels, d += channels) {

@@ -19,6 +19,9 @@ struct ColorAdjustRows {
   void (*vibrance)(uint8_t* pixels, size_t count, float strength);
   // sigma = s / 100, not 0
   void (*saturation)(uint8_t* pixels, size_t count, float sigma);
+  // Byte i of each pixel (i < 3) becomes 0 below 0, else trunc(min(255, byte * gain[i])), in
+  // float; alpha is copied. `dst` may be `src`.
+  void (*scaleChannels)(uint8_t* dst, const uint8_t* src, size_t count, const float gain[3]);
 };
 
 // The set Highway's dispatch picks for this CPU, chosen on the first call.

@@ -259,6 +259,20 @@ struct SaturationVector {
   }
 };
 
+// Each channel times its own gain, limited as the per-pixel forms limit a float.
+struct ScaleVector {
+  float gain0, gain1, gain2;
+
+  HWY_INLINE VU operator()(VU p) const {
+    const DF df;
+    const auto scaled = [&](VI c, float gain) {
+      return ByteBits(ClampToByteRange<true>(hn::Mul(hn::ConvertTo(df, c), hn::Set(df, gain))));
+    };
+    return PackByteBits(p, scaled(Channel0(p), gain0), scaled(Channel1(p), gain1),
+                        scaled(Channel2(p), gain2));
+  }
+};
+
 // ---- Rows --------------------------------------------------------------------------------------
 
 // Rows are walked in whole vectors of `d`'s lanes; the last partial vector goes through a
@@ -278,6 +292,26 @@ HWY_INLINE void ForEachVector(D d, uint8_t* pixels, size_t count, const Kernel& 
     std::memcpy(tail, pixels + i, bytes - i);
     hn::Store(kernel(hn::Load(d, tail)), d, tail);
     std::memcpy(pixels + i, tail, bytes - i);
+  }
+}
+
+// ForEachVector from `src` to `dst`.
+template <class D, class Kernel>
+HWY_INLINE void ForEachVectorInto(D d, uint8_t* dst, const uint8_t* src, size_t count,
+                                  const Kernel& kernel) {
+  using T = hn::TFromD<D>;
+  const size_t step = hn::Lanes(d) * sizeof(T);
+  const size_t bytes = count * 4;
+  size_t i = 0;
+  for (; i + step <= bytes; i += step) {
+    hn::StoreU(kernel(hn::LoadU(d, reinterpret_cast<const T*>(src + i))), d,
+               reinterpret_cast<T*>(dst + i));
+  }
+  if (i < bytes) {
+    HWY_ALIGN T tail[HWY_MAX_BYTES / sizeof(T)] = {};
+    std::memcpy(tail, src + i, bytes - i);
+    hn::Store(kernel(hn::Load(d, tail)), d, tail);
+    std::memcpy(dst + i, tail, bytes - i);
   }
 }
 
@@ -317,9 +351,13 @@ void SaturationRow(uint8_t* pixels, size_t count, float sigma) {
   }
 }
 
+void ScaleChannelsRow(uint8_t* dst, const uint8_t* src, size_t count, const float gain[3]) {
+  ForEachVectorInto(DU(), dst, src, count, ScaleVector{gain[0], gain[1], gain[2]});
+}
+
 const ColorAdjustRows* RowsOfThisTarget() {
   static const ColorAdjustRows rows = {hwy::TargetName(HWY_TARGET), &ApplyTableRow, &VibranceRow,
-                                       &SaturationRow};
+                                       &SaturationRow, &ScaleChannelsRow};
   return &rows;
 }
 

@@ -145,6 +145,36 @@ TEST(ColorAdjustRows, MatchThePerPixelFormsAtExtremeStrengths) {
   }
 }
 
+TEST(ColorAdjustRows, ScaleChannelsLimitsEachProductLikeTheByteForm) {
+  // Gains of every sign and size, NaN included, each on its own channel; src and dst apart and
+  // the same buffer; counts that leave tails.
+  constexpr float kNan = std::numeric_limits<float>::quiet_NaN();
+  const float gains[][3] = {{0.5f, 1.5f, 1.0f},
+                            {2.0f, 0.0f, -0.25f},
+                            {1.2345f, 0.9876f, 3e9f},
+                            {kNan, -kNan, std::numeric_limits<float>::infinity()}};
+  const auto byte = [](float v) -> uint8_t {
+    if (v < 0.0f) return 0;
+    return static_cast<uint8_t>(static_cast<int>(v < 255.0f ? v : 255.0f));
+  };
+  for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
+    for (const auto& gain : gains) {
+      for (size_t count : {1, 17, 4099}) {
+        SCOPED_TRACE(testing::Message() << rows->name << " gain " << gain[0] << " count " << count);
+        std::vector<uint8_t> src = NoiseBytes(count * 4, 5), expected = src;
+        for (size_t i = 0; i < expected.size(); ++i) {
+          if (i % 4 != 3) expected[i] = byte(static_cast<float>(expected[i]) * gain[i % 4]);
+        }
+        std::vector<uint8_t> dst(src.size());
+        rows->scaleChannels(dst.data(), src.data(), count, gain);
+        ASSERT_EQ(dst, expected);
+        rows->scaleChannels(src.data(), src.data(), count, gain);
+        ASSERT_EQ(src, expected);
+      }
+    }
+  }
+}
+
 TEST(ColorAdjustRows, TableKernelsMapColourBytesOnly) {
   // Random tables, unlike the monotonic curves of the operations, catch a lookup that only
   // works for ordered entries.
