@@ -14,6 +14,7 @@
 #include "adjust/ImageWalk.h"
 #include "adjust/LightAdjustFormulas.h"
 #include "adjust/LightAdjustTables.h"
+#include "simd/color_adjust_rows.h"
 
 namespace tfx {
 namespace {
@@ -87,30 +88,12 @@ std::vector<Step> Steps(float h, float s, float w, float k0) {
   return steps;
 }
 
-// M and the curve treat red, green and blue alike, so both packed orders qualify.
-void ApplyRow(uint8_t* pixels, size_t count, const uint8_t* table) {
-  for (size_t i = 0; i < count; ++i, pixels += 4) {
-    uint32_t p;
-    std::memcpy(&p, pixels, 4);
-    const uint32_t c0 = p & 255u, c1 = (p >> 8) & 255u, c2 = (p >> 16) & 255u;
-    const uint32_t c01 = c0 > c1 ? c0 : c1;
-    const uint8_t* row = table + 256 * (c01 > c2 ? c01 : c2);
-    p = (p & 0xff000000u) | row[c0] | (uint32_t{row[c1]} << 8) | (uint32_t{row[c2]} << 16);
-    std::memcpy(pixels, &p, 4);
-  }
-}
-
 void ApplyTable(CxImage* image, const uint8_t* table) {
   if (HasPackedColour(*image)) {
-    uint8_t* bits = image->GetBits();
-    const size_t width = image->GetWidth();
-    const size_t height = image->GetHeight();
-    const size_t stride = image->GetEffWidth();
-    if (stride == width * 4) {
-      ApplyRow(bits, width * height, table);
-    } else {
-      for (size_t y = 0; y < height; ++y) ApplyRow(bits + y * stride, width, table);
-    }
+    // M and the curve treat red, green and blue alike, so both packed orders qualify.
+    const ColorAdjustRows& rows = BestColorAdjustRows();
+    ForEachRow(image,
+               [&](uint8_t* pixels, size_t count) { rows.brightestTable(pixels, count, table); });
     return;
   }
   for (unsigned long y = 0; y < image->GetHeight(); ++y) {
@@ -126,7 +109,7 @@ void ApplyTable(CxImage* image, const uint8_t* table) {
 }
 
 CxImage* ApplyStep(CxImage* image, const Step& step) {
-  std::vector<uint8_t> table(kLightTableSize);
+  std::vector<uint8_t> table(kBrightestTableBytes);
   step.build(step.a, table.data());
   ApplyTable(image, table.data());
   return image;
@@ -158,20 +141,42 @@ bool FoldLightAdjust(float h, float s, float w, float k0, uint8_t* table) {
   return true;
 }
 
-CxImage* LightAdjust(CxImage* image, float h, float s, float w, float k0) {
-  if (!IsSoundImage(image)) return image;
+LightAdjustPlan::LightAdjustPlan(float h, float s, float w, float k0)
+    : rows_(&BestColorAdjustRows()) {
   const std::vector<Step> steps = Steps(h, s, w, k0);
-  if (steps.empty()) return image;
-  // Formats read through the accessors may lose bits on every write (16-bit pixels), so only
-  // packed ones fold.
-  if (steps.size() > 1 && HasPackedColour(*image)) {
-    std::vector<uint8_t> table(kLightTableSize);
-    if (FoldLightAdjust(h, s, w, k0, table.data())) {
-      ApplyTable(image, table.data());
-      return image;
+  if (steps.empty()) return;
+  if (steps.size() > 1) {
+    tables_.resize(kBrightestTableBytes);
+    if (FoldLightAdjust(h, s, w, k0, tables_.data())) {
+      count_ = 1;
+      return;
     }
   }
-  for (const Step& step : steps) ApplyStep(image, step);
+  tables_.assign(steps.size() * kBrightestTableBytes, 0);
+  for (size_t j = 0; j < steps.size(); ++j) {
+    steps[j].build(steps[j].a, tables_.data() + j * kBrightestTableBytes);
+  }
+  count_ = steps.size();
+}
+
+void LightAdjustPlan::Apply(uint8_t* pixels, size_t count) const {
+  for (size_t j = 0; j < count_; ++j) {
+    rows_->brightestTable(pixels, count, tables_.data() + j * kBrightestTableBytes);
+  }
+}
+
+CxImage* LightAdjust(CxImage* image, float h, float s, float w, float k0) {
+  if (!IsSoundImage(image)) return image;
+  // Formats read through the accessors may lose bits on every write (16-bit pixels), so only
+  // packed ones fold.
+  if (HasPackedColour(*image)) {
+    const LightAdjustPlan plan(h, s, w, k0);
+    if (!plan.Empty()) {
+      ForEachRow(image, [&](uint8_t* pixels, size_t count) { plan.Apply(pixels, count); });
+    }
+    return image;
+  }
+  for (const Step& step : Steps(h, s, w, k0)) ApplyStep(image, step);
   return image;
 }
 

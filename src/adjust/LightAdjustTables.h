@@ -4,10 +4,13 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <vector>
 
 #include "tessarofx/CxImage.h"
 
 namespace tfx {
+
+struct ColorAdjustRows;
 
 // A light table maps a channel c of a pixel whose brightest channel is M to table[M * 256 + c];
 // only the entries with c <= M are meaningful.
@@ -21,5 +24,19 @@ CxImage* LightAdjust(CxImage* image, float h, float s, float w, float k0);
 // a darker channel overtake the brightest; otherwise this returns false and LightAdjust runs the
 // operations one by one.
 bool FoldLightAdjust(float h, float s, float w, float k0, uint8_t* table);
+
+// The four operations made ready for any number of packed 4-byte rows: one folded table where
+// FoldLightAdjust allows, else one table per operation, applied in turn to each row given.
+class LightAdjustPlan {
+ public:
+  LightAdjustPlan(float h, float s, float w, float k0);
+  bool Empty() const { return count_ == 0; }
+  void Apply(uint8_t* pixels, size_t count) const;
+
+ private:
+  const ColorAdjustRows* rows_;
+  std::vector<uint8_t> tables_;
+  size_t count_ = 0;
+};
 
 }  // namespace tfx

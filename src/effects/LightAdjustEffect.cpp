@@ -1,4 +1,7 @@
 // LightAdjust: highlights, shadows, white and black levels, in that order.
+#include <cstring>
+#include <memory>
+
 #include "adjust/LightAdjustTables.h"
 #include "plugin/NLEDynamicEffect.h"
 #include "tessarofx/CxImage.h"
@@ -13,18 +16,36 @@ class NLELightAdjustEffect final : public NLEDynamicEffect {
                 int, const uint8_t* src, int srcWidth, int srcHeight, int srcStride) override {
     if (!dst || !src) return NLE_E_INVALIDARG;
     // Parameters go to the operations as floats, unscaled; an absent one is a no-op.
-    const float highlight = static_cast<float>(ParamDouble(tfx::catalog::light::kHighlight));
-    const float shadow = static_cast<float>(ParamDouble(tfx::catalog::light::kShadow));
-    const float whiteLevel = static_cast<float>(ParamDouble(tfx::catalog::light::kWhiteLevel));
-    const float blackLevel = static_cast<float>(ParamDouble(tfx::catalog::light::kBlackLevel));
+    const float strengths[4] = {static_cast<float>(ParamDouble(tfx::catalog::light::kHighlight)),
+                                static_cast<float>(ParamDouble(tfx::catalog::light::kShadow)),
+                                static_cast<float>(ParamDouble(tfx::catalog::light::kWhiteLevel)),
+                                static_cast<float>(ParamDouble(tfx::catalog::light::kBlackLevel))};
 
+    // The tables take longer to build than a small frame takes to run, and settings seldom
+    // change from frame to frame.
+    if (!plan_ || std::memcmp(strengths, planned_, sizeof strengths) != 0) {
+      plan_ = std::make_unique<tfx::LightAdjustPlan>(strengths[0], strengths[1], strengths[2],
+                                                     strengths[3]);
+      std::memcpy(planned_, strengths, sizeof strengths);
+    }
+    const tfx::LightAdjustPlan& plan = *plan_;
+    if (CopyInBands(dst, dstWidth, dstHeight, dstStride, src, srcHeight, srcStride,
+                    [&](uint8_t* pixels, int, int rows) {
+                      plan.Apply(pixels, static_cast<size_t>(rows) * dstWidth);
+                    })) {
+      return 0;
+    }
     // Never more rows than both frames hold: a foreground larger than the output is cut.
     myCopy(src, dst, srcWidth, srcHeight < dstHeight ? srcHeight : dstHeight, srcStride, dstStride);
     CxImage image(&dst, static_cast<unsigned>(dstWidth), static_cast<unsigned>(dstHeight), 32,
                   static_cast<unsigned>(dstStride), IPF_BGRA);
-    tfx::LightAdjust(&image, highlight, shadow, whiteLevel, blackLevel);
+    tfx::LightAdjust(&image, strengths[0], strengths[1], strengths[2], strengths[3]);
     return 0;
   }
+
+ private:
+  std::unique_ptr<tfx::LightAdjustPlan> plan_;
+  float planned_[4] = {};
 };
 
 const NLELightAdjustEffect::_auto_register s_register(tfx::catalog::kLightAdjust.wideGuid,

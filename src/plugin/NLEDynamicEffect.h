@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <cstring>
 #include <map>
 #include <string>
 #include <utility>
@@ -54,6 +55,29 @@ class NLEDynamicEffect : public NLEBasicFilter {
 // every row is copied with the smaller pitch and BOTH buffers step by that smaller pitch;
 // callers rely on that addressing, so it stays. `width` is not used.
 bool myCopy(const uint8_t* src, uint8_t* dst, int width, int rows, int srcPitch, int dstPitch);
+
+// What myCopy(src, dst, .., min(srcHeight, dstHeight), srcStride, dstStride) does, in bands of
+// rows, each handed to band(pixels, firstRow, rows) right after its copy so that an effect working
+// in place finds it still in cache. Only for two frames of packed rows of dstWidth pixels where
+// src has at least dst's rows; otherwise returns false and touches nothing.
+template <class Band>
+bool CopyInBands(uint8_t* dst, int dstWidth, int dstHeight, int dstStride, const uint8_t* src,
+                 int srcHeight, int srcStride, Band band) {
+  if (dstWidth <= 0 || dstHeight <= 0 || srcStride != dstStride ||
+      static_cast<int64_t>(dstStride) != int64_t{dstWidth} * 4 || srcHeight < dstHeight) {
+    return false;
+  }
+  const size_t rowBytes = static_cast<size_t>(dstStride);
+  constexpr size_t kBandBytes = 32 * 1024;
+  const int bandRows = rowBytes >= kBandBytes ? 1 : static_cast<int>(kBandBytes / rowBytes);
+  for (int y = 0; y < dstHeight; y += bandRows) {
+    const int rows = bandRows < dstHeight - y ? bandRows : dstHeight - y;
+    uint8_t* pixels = dst + static_cast<size_t>(y) * rowBytes;
+    if (src != dst) std::memcpy(pixels, src + static_cast<size_t>(y) * rowBytes, rows * rowBytes);
+    band(pixels, y, rows);
+  }
+  return true;
+}
 
 template <class Base>
 NLEAutoRegister<Base>::NLEAutoRegister(const wchar_t* guid, const wchar_t* friendName,

@@ -22,7 +22,12 @@ struct ColorAdjustRows {
   // Byte i of each pixel (i < 3) becomes 0 below 0, else trunc(min(255, byte * gain[i])), in
   // float; alpha is copied. `dst` may be `src`.
   void (*scaleChannels)(uint8_t* dst, const uint8_t* src, size_t count, const float gain[3]);
+  // Each colour byte c of a pixel whose largest colour byte is m becomes table[m * 256 + c]. The
+  // table is read four bytes at a time, so it holds kBrightestTableBytes.
+  void (*brightestTable)(uint8_t* pixels, size_t count, const uint8_t* table);
 };
+
+inline constexpr size_t kBrightestTableBytes = 256 * 256 + 3;
 
 // The set Highway's dispatch picks for this CPU, chosen on the first call.
 const ColorAdjustRows& BestColorAdjustRows();

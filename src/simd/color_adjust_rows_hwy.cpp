@@ -273,6 +273,28 @@ struct ScaleVector {
   }
 };
 
+// A lookup per channel in the row of the brightest channel; the gathers read four bytes from the
+// entry on, of which the first counts.
+struct BrightestTableVector {
+  const uint8_t* table;
+
+  HWY_INLINE VU operator()(VU p) const {
+    const DU du;
+    const DI di;
+    const VU byte = hn::Set(du, 255u);
+    const VU c0 = hn::And(p, byte), c1 = hn::And(hn::ShiftRight<8>(p), byte),
+             c2 = hn::And(hn::ShiftRight<16>(p), byte);
+    const VU row = hn::ShiftLeft<8>(hn::Max(hn::Max(c0, c1), c2));
+    const auto* base = reinterpret_cast<const int32_t*>(table);
+    const auto look = [&](VU c) {
+      return hn::And(hn::BitCast(du, hn::GatherOffset(di, base, hn::BitCast(di, hn::Or(row, c)))),
+                     byte);
+    };
+    return hn::Or3(hn::Or(Alpha(p), look(c0)), hn::ShiftLeft<8>(look(c1)),
+                   hn::ShiftLeft<16>(look(c2)));
+  }
+};
+
 // ---- Rows --------------------------------------------------------------------------------------
 
 // Rows are walked in whole vectors of `d`'s lanes; the last partial vector goes through a
@@ -355,9 +377,14 @@ void ScaleChannelsRow(uint8_t* dst, const uint8_t* src, size_t count, const floa
   ForEachVectorInto(DU(), dst, src, count, ScaleVector{gain[0], gain[1], gain[2]});
 }
 
+void BrightestTableRow(uint8_t* pixels, size_t count, const uint8_t* table) {
+  ForEachVector(DU(), pixels, count, BrightestTableVector{table});
+}
+
 const ColorAdjustRows* RowsOfThisTarget() {
-  static const ColorAdjustRows rows = {hwy::TargetName(HWY_TARGET), &ApplyTableRow, &VibranceRow,
-                                       &SaturationRow, &ScaleChannelsRow};
+  static const ColorAdjustRows rows = {
+      hwy::TargetName(HWY_TARGET), &ApplyTableRow,    &VibranceRow, &SaturationRow,
+      &ScaleChannelsRow,           &BrightestTableRow};
   return &rows;
 }
 

@@ -175,6 +175,23 @@ TEST(ColorAdjustRows, ScaleChannelsLimitsEachProductLikeTheByteForm) {
   }
 }
 
+TEST(ColorAdjustRows, BrightestTableLooksUpInTheRowOfTheLargestChannel) {
+  const std::vector<uint8_t> table = NoiseBytes(tfx::kBrightestTableBytes, 3);
+  for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
+    for (size_t count : {1, 17, 4099}) {
+      SCOPED_TRACE(testing::Message() << rows->name << " count " << count);
+      std::vector<uint8_t> pixels = NoiseBytes(count * 4, 9), expected = pixels;
+      for (size_t i = 0; i < expected.size(); i += 4) {
+        const uint8_t* row =
+            &table[256 * std::max({expected[i], expected[i + 1], expected[i + 2]})];
+        for (size_t c = 0; c < 3; ++c) expected[i + c] = row[expected[i + c]];
+      }
+      rows->brightestTable(pixels.data(), count, table.data());
+      ASSERT_EQ(pixels, expected);
+    }
+  }
+}
+
 TEST(ColorAdjustRows, TableKernelsMapColourBytesOnly) {
   // Random tables, unlike the monotonic curves of the operations, catch a lookup that only
   // works for ordered entries.
