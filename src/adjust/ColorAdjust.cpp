@@ -6,6 +6,7 @@
 // path gives the same bytes.
 #include "tessarofx/ColorAdjust.h"
 
+#include <cmath>
 #include <cstddef>
 #include <cstdint>
 
@@ -155,6 +156,75 @@ CxImage* ToneAdjust(CxImage* image, float e, float b, float c, const ColorAdjust
   compose(c, ContrastTable);
   if (e != 0.0f || b != 0.0f || c != 0.0f) ApplyTable(image, table, rows);
   return image;
+}
+
+ColorAdjustPlan::ColorAdjustPlan(float e, float b, float c, float v, float s,
+                                 const ColorAdjustRows& rows)
+    : rows_(&rows),
+      hasVibrance_(v != 0.0f),
+      hasSaturation_(s != 0.0f),
+      vibrance_(hasVibrance_ ? VibranceStrength(v) : 0.0f),
+      sigma_(s / 100.0f) {
+  for (int i = 0; i < 256; ++i) tone_[i] = static_cast<uint8_t>(i);
+  uint8_t step[256];
+  const auto compose = [&](float strength, void (*build)(float, uint8_t*)) {
+    if (strength == 0.0f) return;
+    build(strength, step);
+    for (uint8_t& t : tone_) t = step[t];
+    hasTone_ = true;
+  };
+  compose(e, ExposureTable);
+  compose(b, BrightnessTable);
+  compose(c, ContrastTable);
+  if ((hasVibrance_ || hasSaturation_) && !Fuse()) {
+    gain_.clear();
+  }
+}
+
+// Saturation's gain per pair of largest and smallest channel after vibrance, as the per-pixel
+// form derives it; false where one pass could not give the operations' bytes.
+bool ColorAdjustPlan::Fuse() {
+  for (int i = 0; i < 255; ++i) {
+    if (tone_[i] > tone_[i + 1]) return false;
+  }
+  // Beyond this the kernels' products may wrap, which the fused pass does not follow.
+  if (!(std::fabs(255.0f * vibrance_) < 4194304.0f) || !std::isfinite(sigma_)) return false;
+  // Below -256 vibrance would turn a channel's order round.
+  for (int weight = 0; weight < 256; ++weight) {
+    if (TruncToInt(static_cast<float>(weight) * vibrance_) < -256) return false;
+  }
+  const bool increase = sigma_ >= 0.0f;
+  if (hasSaturation_ && increase) {
+    gain_.assign(256 * 256, 0.0f);
+    for (int mx = 1; mx < 256; ++mx) {
+      for (int mn = 0; mn < mx; ++mn) {
+        const SaturationSpread spread = SpreadOf(static_cast<float>(mx), static_cast<float>(mn));
+        const float sat =
+            spread.l < 0.5f ? spread.delta / spread.sum : spread.delta / (2.0f - spread.sum);
+        const float a = sat + sigma_ >= 1.0f ? 1.0f / sat - 1.0f : 1.0f / (1.0f - sigma_) - 1.0f;
+        if (!std::isfinite(a)) return false;
+        gain_[static_cast<size_t>(mx) * 256 + mn] = a;
+      }
+    }
+  }
+  tables_ = {hasTone_ ? tone_ : nullptr,
+             vibrance_,
+             hasSaturation_,
+             increase,
+             gain_.empty() ? nullptr : gain_.data(),
+             1.0f + sigma_};
+  fused_ = true;
+  return true;
+}
+
+void ColorAdjustPlan::Apply(uint8_t* pixels, size_t count) const {
+  if (Fused()) {
+    rows_->fusedColour(pixels, count, tables_);
+    return;
+  }
+  if (hasTone_) rows_->applyTable(pixels, count, tone_);
+  if (hasVibrance_) rows_->vibrance(pixels, count, vibrance_);
+  if (hasSaturation_) rows_->saturation(pixels, count, sigma_);
 }
 
 CxImage* VibranceAdjust(CxImage* image, float v, const ColorAdjustRows& rows) {

@@ -2,6 +2,10 @@
 // the machine supports against the same reference.
 #pragma once
 
+#include <cstddef>
+#include <cstdint>
+#include <vector>
+
 #include "simd/color_adjust_rows.h"
 #include "tessarofx/CxImage.h"
 
@@ -15,5 +19,32 @@ CxImage* ContrastAdjust(CxImage* image, float c, const ColorAdjustRows& rows);
 CxImage* ToneAdjust(CxImage* image, float e, float b, float c, const ColorAdjustRows& rows);
 CxImage* VibranceAdjust(CxImage* image, float v, const ColorAdjustRows& rows);
 CxImage* SaturationAdjust(CxImage* image, float s, const ColorAdjustRows& rows);
+
+// The five operations, in the effect's order, made ready for any number of packed 4-byte rows
+// (padding is not skipped: brightness would not skip it either). Where the tone curve and
+// vibrance keep each pixel's channels in order, one pass does all five; otherwise the curves,
+// vibrance and saturation run one after the other on each row given.
+class ColorAdjustPlan {
+ public:
+  ColorAdjustPlan(float e, float b, float c, float v, float s, const ColorAdjustRows& rows);
+  ColorAdjustPlan(const ColorAdjustPlan&) = delete;
+  ColorAdjustPlan& operator=(const ColorAdjustPlan&) = delete;
+  bool Empty() const { return !hasTone_ && !hasVibrance_ && !hasSaturation_; }
+  bool Fused() const { return fused_; }
+  void Apply(uint8_t* pixels, size_t count) const;
+
+ private:
+  bool Fuse();
+
+  const ColorAdjustRows* rows_;
+  uint8_t tone_[256];
+  bool hasTone_ = false;
+  bool hasVibrance_, hasSaturation_;
+  float vibrance_;  // the kernels' strength
+  float sigma_;
+  std::vector<float> gain_;
+  FusedColourTables tables_ = {};
+  bool fused_ = false;
+};
 
 }  // namespace tfx

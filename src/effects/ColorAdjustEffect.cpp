@@ -1,4 +1,7 @@
 // ColorAdjust: exposure, brightness, contrast, vibrance and saturation, in that order.
+#include <cstring>
+#include <memory>
+
 #include "adjust/ColorAdjustRows.h"
 #include "plugin/NLEDynamicEffect.h"
 #include "tessarofx/ColorAdjust.h"
@@ -12,25 +15,42 @@ class NLEColorAdjustEffect final : public NLEDynamicEffect {
 
   int Transform(uint8_t* dst, int dstWidth, int dstHeight, int dstStride, const uint8_t*, int, int,
                 int, const uint8_t* src, int srcWidth, int srcHeight, int srcStride) override {
-    (void)srcWidth;
     if (!dst || !src) return NLE_E_INVALIDARG;
     // Parameters go to the operations as floats, unscaled; an absent one is a no-op.
     using namespace tfx::catalog::color_adjust;
-    const float exposure = static_cast<float>(ParamDouble(kExposure));
-    const float brightness = static_cast<float>(ParamDouble(kBrightness));
-    const float contrast = static_cast<float>(ParamDouble(kContrast));
-    const float vibrance = static_cast<float>(ParamDouble(kVibrance));
-    const float saturation = static_cast<float>(ParamDouble(kSaturation));
+    const float settings[5] = {
+        static_cast<float>(ParamDouble(kExposure)), static_cast<float>(ParamDouble(kBrightness)),
+        static_cast<float>(ParamDouble(kContrast)), static_cast<float>(ParamDouble(kVibrance)),
+        static_cast<float>(ParamDouble(kSaturation))};
+
+    // Building the tables costs about a 1080p pass, and settings seldom change between frames.
+    if (!plan_ || std::memcmp(settings, planned_, sizeof settings) != 0) {
+      plan_ =
+          std::make_unique<tfx::ColorAdjustPlan>(settings[0], settings[1], settings[2], settings[3],
+                                                 settings[4], tfx::BestColorAdjustRows());
+      std::memcpy(planned_, settings, sizeof settings);
+    }
+    const tfx::ColorAdjustPlan& plan = *plan_;
+    if (CopyInBands(dst, dstWidth, dstHeight, dstStride, src, srcHeight, srcStride,
+                    [&](uint8_t* pixels, int, int rows) {
+                      if (!plan.Empty()) plan.Apply(pixels, static_cast<size_t>(rows) * dstWidth);
+                    })) {
+      return 0;
+    }
 
     // Never more rows than both frames hold: a foreground larger than the output is cut.
     myCopy(src, dst, srcWidth, srcHeight < dstHeight ? srcHeight : dstHeight, srcStride, dstStride);
     CxImage image(&dst, static_cast<unsigned>(dstWidth), static_cast<unsigned>(dstHeight), 32,
                   static_cast<unsigned>(dstStride), IPF_BGRA);
-    tfx::ToneAdjust(&image, exposure, brightness, contrast, tfx::BestColorAdjustRows());
-    vibranceAdjustment(&image, vibrance);
-    saturationAdjustment(&image, saturation);
+    tfx::ToneAdjust(&image, settings[0], settings[1], settings[2], tfx::BestColorAdjustRows());
+    vibranceAdjustment(&image, settings[3]);
+    saturationAdjustment(&image, settings[4]);
     return 0;
   }
+
+ private:
+  std::unique_ptr<tfx::ColorAdjustPlan> plan_;
+  float planned_[5] = {};
 };
 
 const NLEColorAdjustEffect::_auto_register s_register(tfx::catalog::kColorAdjust.wideGuid,

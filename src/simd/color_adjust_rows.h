@@ -9,6 +9,20 @@
 
 namespace tfx {
 
+// Exposure, brightness, contrast, vibrance and saturation in one pass, for settings where the tone
+// curve and vibrance keep the order of a pixel's channels: then saturation's gain depends on the
+// largest and smallest channel after vibrance alone, and comes from a table.
+struct FusedColourTables {
+  const uint8_t* tone;  // 256 entries, or null for none
+  float strength;       // vibrance's, with 255 * |strength| below 2^22 (0: none)
+  bool saturate;
+  bool increase;  // sigma >= 0
+  // Saturation's a at largest * 256 + smallest, for smallest <= largest (0 for a grey), when
+  // increasing; 1 + sigma when decreasing.
+  const float* gain;
+  float fixedGain;
+};
+
 // Each kernel rewrites `count` consecutive 4-byte pixels in place: bytes 0..2 are colour (in
 // either order: every operation treats the three channels alike), byte 3 is alpha and is kept.
 // Rows need no particular alignment.
@@ -25,6 +39,7 @@ struct ColorAdjustRows {
   // Each colour byte c of a pixel whose largest colour byte is m becomes table[m * 256 + c]. The
   // table is read four bytes at a time, so it holds kBrightestTableBytes.
   void (*brightestTable)(uint8_t* pixels, size_t count, const uint8_t* table);
+  void (*fusedColour)(uint8_t* pixels, size_t count, const FusedColourTables& tables);
 };
 
 inline constexpr size_t kBrightestTableBytes = 256 * 256 + 3;

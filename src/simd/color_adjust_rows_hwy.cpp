@@ -7,6 +7,7 @@
 // AVX2 and AVX-512 targets enable FMA instructions.
 #include <cmath>
 #include <cstring>
+#include <type_traits>
 
 #include "simd/color_adjust_rows.h"
 
@@ -76,6 +77,24 @@ HWY_INLINE V8 ShuffleIndex(V8 x, int i) {
   return hn::Sub(x, hn::Set(D8(), static_cast<uint8_t>(16 * i)));
 }
 
+#if HWY_TARGET == HWY_AVX3_DL
+// Bytes 0..2 of each pixel from the table, byte 3 (alpha) kept: two 128-entry permutes, the
+// byte's top bit picking between them.
+struct TableVector {
+  const uint8_t* table;
+
+  HWY_INLINE V8 operator()(V8 x) const {
+    const __m512i t0 = _mm512_loadu_si512(table), t1 = _mm512_loadu_si512(table + 64);
+    const __m512i t2 = _mm512_loadu_si512(table + 128), t3 = _mm512_loadu_si512(table + 192);
+    const __m512i low = _mm512_permutex2var_epi8(t0, x.raw, t1);
+    const __m512i high = _mm512_permutex2var_epi8(t2, x.raw, t3);
+    const __m512i mapped = _mm512_mask_blend_epi8(_mm512_movepi8_mask(x.raw), low, high);
+    return V8{_mm512_mask_blend_epi8(0x8888888888888888ull, mapped, x.raw)};
+  }
+};
+
+HWY_INLINE TableVector MakeTableVector(const uint8_t table[256], uint8_t*) { return {table}; }
+#else
 // Bytes 0..2 of each pixel from the table, byte 3 (alpha) kept.
 struct TableVector {
   const uint8_t* chunks;  // from MakeChunks
@@ -101,6 +120,13 @@ struct TableVector {
     return hn::IfThenElse(AlphaBytes(), x, hn::IfThenElse(upper, high, low));
   }
 };
+
+// `chunks` holds 256 bytes for MakeChunks.
+HWY_INLINE TableVector MakeTableVector(const uint8_t table[256], uint8_t* chunks) {
+  MakeChunks(table, chunks);
+  return {chunks};
+}
+#endif  // HWY_TARGET == HWY_AVX3_DL
 
 #endif  // HWY_TARGET != HWY_SCALAR
 
@@ -295,6 +321,49 @@ struct BrightestTableVector {
   }
 };
 
+// The tone curve through `tone` (TableVector, or a direct read in scalar code), vibrance as
+// VibranceVector<true>, then saturation with its gain looked up by the pixel's largest and
+// smallest channel; the per-pixel forms' expressions throughout.
+template <bool kTone, bool kSaturate, bool kIncrease, class Tone>
+struct FusedColourVector {
+  Tone tone;
+  const FusedColourTables* t;
+
+  HWY_INLINE VU operator()(VU raw) const {
+    const DU du;
+    const DI di;
+    const DF df;
+    const VU p = kTone ? tone(raw) : raw;
+    VI c0 = Channel0(p), c1 = Channel1(p), c2 = Channel2(p);
+    if (t->strength != 0.0f) {
+      const VI mx = hn::Max(c0, hn::Max(c1, c2));
+      const VI mn = hn::Min(c0, hn::Min(c1, c2));
+      const VI luma = hn::ShiftRight<1>(hn::Add(mx, mn));
+      const VI weight = hn::And(hn::Neg(hn::ShiftRight<1>(hn::Sub(mx, luma))), hn::Set(di, 255));
+      const VI k = SmallToInt(hn::Mul(hn::ConvertTo(df, weight), hn::Set(df, t->strength)));
+      c0 = MixChannelSmall(c0, luma, k);
+      c1 = MixChannelSmall(c1, luma, k);
+      c2 = MixChannelSmall(c2, luma, k);
+    }
+    if (!kSaturate) return Pack(p, c0, c1, c2);
+    const VI mx = hn::Max(c0, hn::Max(c1, c2));
+    const VI mn = hn::Min(c0, hn::Min(c1, c2));
+    const VF sum = hn::Div(hn::ConvertTo(df, hn::Add(mx, mn)), hn::Set(df, 255.0f));
+    const VF lv = hn::Mul(sum, hn::Set(df, 127.5f));  // as in SaturationVector
+    const VF gain = kIncrease ? hn::GatherIndex(df, t->gain, hn::Or(hn::ShiftLeft<8>(mx), mn))
+                              : hn::Set(df, t->fixedGain);
+    const auto channel = [&](VI c) {
+      const VF f = hn::ConvertTo(df, c);
+      const VF o = kIncrease ? hn::Add(f, hn::Mul(hn::Sub(f, lv), gain))
+                             : hn::Add(lv, hn::Mul(hn::Sub(f, lv), gain));
+      return ByteBits(ClampToByteRange<false>(o));
+    };
+    const VU adjusted = PackByteBits(p, channel(c0), channel(c1), channel(c2));
+    if (kIncrease) return adjusted;  // a grey's gain is 0
+    return hn::IfThenElse(hn::RebindMask(du, hn::Eq(mx, mn)), Pack(p, c0, c1, c2), adjusted);
+  }
+};
+
 // ---- Rows --------------------------------------------------------------------------------------
 
 // Rows are walked in whole vectors of `d`'s lanes; the last partial vector goes through a
@@ -349,8 +418,7 @@ void ApplyTableRow(uint8_t* pixels, size_t count, const uint8_t table[256]) {
 #else
 void ApplyTableRow(uint8_t* pixels, size_t count, const uint8_t table[256]) {
   HWY_ALIGN uint8_t chunks[256];
-  MakeChunks(table, chunks);
-  ForEachVector(D8(), pixels, count, TableVector{chunks});
+  ForEachVector(D8(), pixels, count, MakeTableVector(table, chunks));
 }
 #endif
 
@@ -381,10 +449,55 @@ void BrightestTableRow(uint8_t* pixels, size_t count, const uint8_t* table) {
   ForEachVector(DU(), pixels, count, BrightestTableVector{table});
 }
 
+#if HWY_TARGET == HWY_SCALAR
+struct ToneVector {
+  const uint8_t* table;
+  HWY_INLINE VU operator()(VU p) const {
+    uint32_t v = hn::GetLane(p);
+    v = (v & 0xff000000u) | table[v & 255u] | uint32_t{table[(v >> 8) & 255u]} << 8 |
+        uint32_t{table[(v >> 16) & 255u]} << 16;
+    return hn::Set(DU(), v);
+  }
+};
+#else
+struct ToneVector {
+  TableVector bytes;
+  HWY_INLINE VU operator()(VU p) const { return hn::BitCast(DU(), bytes(hn::BitCast(D8(), p))); }
+};
+#endif
+
+void FusedColourRow(uint8_t* pixels, size_t count, const FusedColourTables& tables) {
+#if HWY_TARGET == HWY_SCALAR
+  const ToneVector tone{tables.tone};
+#else
+  HWY_ALIGN uint8_t chunks[256] = {};
+  const uint8_t identity[256] = {};  // never read: without a tone the kernels skip the lookup
+  const ToneVector tone{MakeTableVector(tables.tone ? tables.tone : identity, chunks)};
+#endif
+  const auto run = [&](auto tone_flag) {
+    constexpr bool kTone = decltype(tone_flag)::value;
+    if (!tables.saturate) {
+      ForEachVector(DU(), pixels, count,
+                    FusedColourVector<kTone, false, true, ToneVector>{tone, &tables});
+    } else if (tables.increase) {
+      ForEachVector(DU(), pixels, count,
+                    FusedColourVector<kTone, true, true, ToneVector>{tone, &tables});
+    } else {
+      ForEachVector(DU(), pixels, count,
+                    FusedColourVector<kTone, true, false, ToneVector>{tone, &tables});
+    }
+  };
+  if (tables.tone) {
+    run(std::true_type());
+  } else {
+    run(std::false_type());
+  }
+}
+
 const ColorAdjustRows* RowsOfThisTarget() {
   static const ColorAdjustRows rows = {
-      hwy::TargetName(HWY_TARGET), &ApplyTableRow,    &VibranceRow, &SaturationRow,
-      &ScaleChannelsRow,           &BrightestTableRow};
+      hwy::TargetName(HWY_TARGET), &ApplyTableRow,     &VibranceRow,   &SaturationRow,
+      &ScaleChannelsRow,           &BrightestTableRow, &FusedColourRow};
   return &rows;
 }
 

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <cmath>
 #include <cstdint>
 #include <cstring>
 #include <iostream>
@@ -74,6 +75,35 @@ INSTANTIATE_TEST_SUITE_P(ColorAdjust, AllColours, testing::ValuesIn(kOperations)
                          [](const testing::TestParamInfo<const Operation*>& p) {
                            return std::string(p.param->name);
                          });
+
+TEST(ColorAdjustPlan, OnePassEqualsTheFiveOperationsInTurn) {
+  // Every colour, on every kernel set. The settings cover both saturation forms, a vibrance that
+  // lowers, the clamped contrast ramp, and two that must not fuse: a vibrance whose products
+  // wrap, and a NaN saturation.
+  const struct {
+    float e, b, c, v, s;
+    bool fused;
+  } cases[] = {{20, 15, 30, 40, 25, true},     {0, 0, 0, -100, -60, true},
+               {-40, -3, 184, 100, 100, true}, {0, 0, 0, 0, -100, true},
+               {10, 0, -60, 1e9f, 10, false},  {0, 0, 0, 30, std::nanf(""), false}};
+  for (const auto& c : cases) {
+    const Image expected = Clone(EveryColour());
+    tfx_test::ReferenceExposure(expected.get(), c.e);
+    tfx_test::ReferenceBrightness(expected.get(), c.b);
+    tfx_test::ReferenceContrast(expected.get(), c.c);
+    tfx_test::ReferenceVibrance(expected.get(), c.v);
+    tfx_test::ReferenceSaturation(expected.get(), c.s);
+    for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
+      SCOPED_TRACE(testing::Message() << rows->name << ' ' << c.e << ' ' << c.b << ' ' << c.c << ' '
+                                      << c.v << ' ' << c.s);
+      const tfx::ColorAdjustPlan plan(c.e, c.b, c.c, c.v, c.s, *rows);
+      EXPECT_EQ(plan.Fused(), c.fused);
+      const Image actual = Clone(EveryColour());
+      plan.Apply(actual->GetBits(), size_t{actual->GetWidth()} * actual->GetHeight());
+      ASSERT_TRUE(SameBuffer(*expected, *actual));
+    }
+  }
+}
 
 TEST(ColorAdjustRows, OneSetPerTargetCompiledAndSupported) {
   // Every test that loops over the sets then covers every Highway target this machine runs.
