@@ -1,9 +1,9 @@
 // Vignette: a centred elliptical mask with a raised-cosine edge, then a per-pixel blend.
 //
 // The mask depends only on |x - cx| and |y - cy|, so one quadrant of it serves the whole frame.
-// The blend runs in blocks of channel arrays so that the compiler can vectorise it; where the
-// mask is exactly 1 (and, with a zero tone-curve weight, exactly 0) the channels do not
-// interact and a 256-entry table built with the per-pixel arithmetic does the work.
+// Where the mask is exactly 1 (and, with a zero tone-curve weight, exactly 0) the channels do not
+// interact and a 256-entry table built with the per-pixel arithmetic does the work; elsewhere a
+// vector kernel blends pixel by pixel. A plan keeps all that for frames of one size and setting.
 #include "tessarofx/Vignette.h"
 
 #include <climits>
@@ -18,6 +18,7 @@
 #include "adjust/VignetteRows.h"
 #include "base/ByteLimits.h"
 #include "image/ImageLayout.h"
+#include "simd/color_adjust_rows.h"
 
 namespace tfx {
 namespace {
@@ -33,35 +34,19 @@ struct Channels {
   return 255.0f - (255.0f - v) * (255.0f - w * v) / 255.0f;
 }
 
-// `yes` where mask is all ones, `no` where it is 0.
-[[gnu::always_inline]] inline float Select(uint32_t mask, float yes, float no) {
-  uint32_t y, n;
-  std::memcpy(&y, &yes, 4);
-  std::memcpy(&n, &no, 4);
-  const uint32_t bits = (y & mask) | (n & ~mask);
-  float out;
-  std::memcpy(&out, &bits, 4);
-  return out;
-}
-
-// All in float. Written once: vignettePixel, the tables and the row blocks evaluate the same
-// expressions in the same order.
+// All in float. vignettePixel and the tables evaluate these expressions, and the vector kernel
+// the same ones in the same order.
 [[gnu::always_inline]] inline Channels Blend(Channels c, float g, float a, float e, float b) {
   const float gain = (1.0f + a) * (1.0f - g) + e * g;
   const Channels scaled = {c.red * gain, c.green * gain, c.blue * gain};
   const float inv = 1.0f - g;
   const float w =
       (1.0f - (scaled.red + scaled.green + scaled.blue) / 3.0f / 255.0f) * (inv * inv) * b;
-  // The curve is always evaluated and then picked by a bit mask: with a plain conditional the
-  // compiler may move the divisions into a branch, which keeps the block loop from vectorising.
-  const uint32_t curve = g < 1.0f ? ~0u : 0u;
-  return {Select(curve, Curve(scaled.red, w), scaled.red),
-          Select(curve, Curve(scaled.green, w), scaled.green),
-          Select(curve, Curve(scaled.blue, w), scaled.blue)};
+  if (!(g < 1.0f)) return scaled;
+  return {Curve(scaled.red, w), Curve(scaled.green, w), Curve(scaled.blue, w)};
 }
 
-// 0 below 0, else trunc(min(255, v)); NaN gives 255. Kept in float up to the conversion so
-// that it vectorises.
+// 0 below 0, else trunc(min(255, v)); NaN gives 255.
 [[gnu::always_inline]] inline int32_t ToByte(float v) {
   const float high = v < 255.0f ? v : 255.0f;
   return static_cast<int32_t>(v < 0.0f ? 0.0f : high);
@@ -76,57 +61,6 @@ tagRGBQUAD BlendPixel(tagRGBQUAD c, float g, float a, float e, float b) {
   c.rgbBlue = static_cast<uint8_t>(ToByte(out.blue));
   return c;
 }
-
-// Whole pixels as little-endian words (blue in the low byte), alpha kept.
-void TableRun(uint8_t* px, size_t count, const uint8_t table[256]) {
-  for (size_t i = 0; i < count; ++i, px += 4) {
-    uint32_t w;
-    std::memcpy(&w, px, 4);
-    w = (w & 0xff000000u) | table[w & 0xffu] | uint32_t{table[(w >> 8) & 0xffu]} << 8 |
-        uint32_t{table[(w >> 16) & 0xffu]} << 16;
-    std::memcpy(px, &w, 4);
-  }
-}
-
-// Words again, so that unpacking and packing vectorise along with the arithmetic.
-[[gnu::always_inline]] inline void BlendRun(uint8_t* px, const float* mask, size_t count,
-                                            const VignetteBlend& p) {
-  constexpr size_t kBlock = 64;
-  uint32_t words[kBlock];
-  float red[kBlock], green[kBlock], blue[kBlock];
-  int32_t outRed[kBlock], outGreen[kBlock], outBlue[kBlock];
-  for (size_t base = 0; base < count; base += kBlock, px += 4 * kBlock) {
-    const size_t n = count - base < kBlock ? count - base : kBlock;
-    std::memcpy(words, px, 4 * n);
-    for (size_t j = 0; j < n; ++j) {
-      blue[j] = static_cast<float>(words[j] & 0xffu);
-      green[j] = static_cast<float>((words[j] >> 8) & 0xffu);
-      red[j] = static_cast<float>((words[j] >> 16) & 0xffu);
-    }
-    for (size_t j = 0; j < n; ++j) {
-      const Channels out = Blend({red[j], green[j], blue[j]}, mask[base + j], p.a, p.e, p.b);
-      outRed[j] = ToByte(out.red);
-      outGreen[j] = ToByte(out.green);
-      outBlue[j] = ToByte(out.blue);
-    }
-    for (size_t j = 0; j < n; ++j) {
-      words[j] = (words[j] & 0xff000000u) | static_cast<uint32_t>(outBlue[j]) |
-                 static_cast<uint32_t>(outGreen[j]) << 8 | static_cast<uint32_t>(outRed[j]) << 16;
-    }
-    std::memcpy(px, words, 4 * n);
-  }
-}
-
-void BlendRunBaseline(uint8_t* px, const float* mask, size_t count, const VignetteBlend& p) {
-  BlendRun(px, mask, count, p);
-}
-
-#if defined(__x86_64__) || defined(__i386__)
-__attribute__((target("avx2"))) void BlendRunAvx2(uint8_t* px, const float* mask, size_t count,
-                                                  const VignetteBlend& p) {
-  BlendRun(px, mask, count, p);
-}
-#endif
 
 // The mask for 0 <= dx <= width >> 1, 0 <= dy <= height >> 1, row-major, (width >> 1) + 1 wide.
 // Geometry in float; only the cosine in double.
@@ -197,21 +131,41 @@ void MirrorRow(const float* quadrantRow, int width, float* out) {
   std::memcpy(out + cx, quadrantRow, sizeof(float) * size_t(width - cx));
 }
 
-}  // namespace
-
-const std::vector<const VignetteKernel*>& SupportedVignetteKernels() {
-  static const std::vector<const VignetteKernel*> kernels = [] {
-    static const VignetteKernel baseline = {"baseline", BlendRunBaseline};
-    std::vector<const VignetteKernel*> list;
-#if defined(__x86_64__) || defined(__i386__)
-    static const VignetteKernel avx2 = {"AVX2", BlendRunAvx2};
-    if (__builtin_cpu_supports("avx2")) list.push_back(&avx2);
-#endif
-    list.push_back(&baseline);
-    return list;
-  }();
-  return kernels;
+// Splits a row of mask weights into runs of one kind: inside, outside by table, or blended pixel
+// by pixel; f(kind, start, end) for each in order.
+template <class F>
+void ForEachRun(const float* mask, size_t count, bool outsideByTable, F f) {
+  size_t i = 0;
+  while (i < count) {
+    size_t end = i + 1;
+    if (mask[i] == 1.0f) {
+      while (end < count && mask[end] == 1.0f) ++end;
+      f(RunKind::kInside, i, end);
+    } else if (outsideByTable && mask[i] == 0.0f) {
+      while (end < count && mask[end] == 0.0f) ++end;
+      f(RunKind::kOutside, i, end);
+    } else {
+      while (end < count && mask[end] != 1.0f && !(outsideByTable && mask[end] == 0.0f)) ++end;
+      f(RunKind::kBlend, i, end);
+    }
+    i = end;
+  }
 }
+
+// Pixels [start, end) of a row; `mask` holds the weights of the run.
+void ApplyRun(uint8_t* row, RunKind kind, size_t start, size_t end, const float* mask,
+              const VignetteBlend& blend) {
+  uint8_t* px = row + 4 * start;
+  if (kind == RunKind::kBlend) {
+    blend.kernel->blendRun(px, mask, end - start, blend);
+  } else {
+    // Red, green and blue alike, alpha kept.
+    BestColorAdjustRows().applyTable(px, end - start,
+                                     kind == RunKind::kInside ? blend.inside : blend.outside);
+  }
+}
+
+}  // namespace
 
 VignetteBlend MakeVignetteBlend(float a, float e, float b, const VignetteKernel& kernel) {
   VignetteBlend p;
@@ -233,22 +187,51 @@ VignetteBlend MakeVignetteBlend(float a, float e, float b, const VignetteKernel&
 }
 
 void VignetteRow(uint8_t* bgra, const float* mask, size_t count, const VignetteBlend& blend) {
-  // Runs of one kind: inside, outside by table, or blended pixel by pixel.
-  const bool outside = blend.outsideByTable;
-  size_t i = 0;
-  while (i < count) {
-    size_t end = i + 1;
-    if (mask[i] == 1.0f) {
-      while (end < count && mask[end] == 1.0f) ++end;
-      TableRun(bgra + 4 * i, end - i, blend.inside);
-    } else if (outside && mask[i] == 0.0f) {
-      while (end < count && mask[end] == 0.0f) ++end;
-      TableRun(bgra + 4 * i, end - i, blend.outside);
-    } else {
-      while (end < count && mask[end] != 1.0f && !(outside && mask[end] == 0.0f)) ++end;
-      blend.kernel->blendRun(bgra + 4 * i, mask + i, end - i, blend);
+  ForEachRun(mask, count, blend.outsideByTable, [&](RunKind kind, size_t start, size_t end) {
+    ApplyRun(bgra, kind, start, end, mask + start, blend);
+  });
+}
+
+VignettePlan::VignettePlan(int width, int height, float amount, float feather, float highlights,
+                           float size, float roundness, float exposure)
+    : width_(width), height_(height) {
+  if (width <= 0 || height <= 0 || (amount == 0.0f && exposure == 0.0f)) return;
+  const std::unique_ptr<float[]> quadrant =
+      GradientQuadrant(width, height, feather / 100.0f, size / 100.0f, roundness / 100.0f);
+  std::unique_ptr<float[]> row(new (std::nothrow) float[size_t(width)]);
+  if (!quadrant || !row) return;
+  // powf: the exposure gain in single precision.
+  const float e = std::pow(2.0f, exposure / 100.0f);
+  const float a = amount / 100.0f;
+  const float b = std::fabs(a) * (2.0f * highlights / 100.0f - 1.0f);
+  blend_ = MakeVignetteBlend(a, e, b);
+  const int qh = (height >> 1) + 1;
+  const size_t qw = size_t(width >> 1) + 1;
+  firstRun_.reserve(size_t(qh) + 1);
+  for (int j = 0; j < qh; ++j) {
+    firstRun_.push_back(runs_.size());
+    MirrorRow(quadrant.get() + size_t(j) * qw, width, row.get());
+    ForEachRun(row.get(), size_t(width), blend_.outsideByTable,
+               [&](RunKind kind, size_t start, size_t end) {
+                 runs_.push_back({kind, start, end, masks_.size()});
+                 if (kind == RunKind::kBlend) {
+                   masks_.insert(masks_.end(), row.get() + start, row.get() + end);
+                 }
+               });
+  }
+  firstRun_.push_back(runs_.size());
+  active_ = true;
+}
+
+void VignettePlan::Apply(uint8_t* pixels, size_t stride, int y0, int rows) const {
+  if (!active_) return;
+  const int cy = height_ >> 1;
+  for (int y = y0; y < y0 + rows; ++y, pixels += stride) {
+    const size_t j = size_t(y < cy ? cy - y : y - cy);
+    for (size_t r = firstRun_[j]; r < firstRun_[j + 1]; ++r) {
+      const Run& run = runs_[r];
+      ApplyRun(pixels, run.kind, run.start, run.end, masks_.data() + run.mask, blend_);
     }
-    i = end;
   }
 }
 
@@ -262,6 +245,12 @@ CxImage* vignetteAdjustFilter(CxImage* img, float amount, float feather, float h
   if (amount == 0.0f && exposure == 0.0f) return img;
   const int width = static_cast<int>(img->GetWidth());
   const int height = static_cast<int>(img->GetHeight());
+  if (img->GetBpp() == 32 && img->getFormat() == IPF_BGRA) {
+    const tfx::VignettePlan plan(width, height, amount, feather, highlights, size, roundness,
+                                 exposure);
+    plan.Apply(img->GetBits(), img->GetEffWidth(), 0, height);
+    return img;
+  }
   const std::unique_ptr<float[]> quadrant =
       tfx::GradientQuadrant(width, height, feather / 100.0f, size / 100.0f, roundness / 100.0f);
   std::unique_ptr<float[]> row(new (std::nothrow) float[img->GetWidth()]);
@@ -271,18 +260,10 @@ CxImage* vignetteAdjustFilter(CxImage* img, float amount, float feather, float h
   const float e = std::pow(2.0f, exposure / 100.0f);
   const float a = amount / 100.0f;
   const float b = std::fabs(a) * (2.0f * highlights / 100.0f - 1.0f);
-  const tfx::VignetteBlend blend = tfx::MakeVignetteBlend(a, e, b);
-
   const int cy = height >> 1;
   const size_t qw = size_t(width >> 1) + 1;
-  const bool packed = img->GetBpp() == 32 && img->getFormat() == IPF_BGRA;
   for (int y = 0; y < height; ++y) {
     tfx::MirrorRow(quadrant.get() + size_t(y < cy ? cy - y : y - cy) * qw, width, row.get());
-    if (packed) {
-      tfx::VignetteRow(img->GetBits() + size_t(y) * img->GetEffWidth(), row.get(), img->GetWidth(),
-                       blend);
-      continue;
-    }
     for (int x = 0; x < width; ++x) {
       const tagRGBQUAD c = img->GetPixelColor(x, y, true);
       img->SetPixelColor(x, y, tfx::BlendPixel(c, row[x], a, e, b));

@@ -10,9 +10,8 @@ namespace tfx {
 
 struct VignetteBlend;
 
-// One compilation of the per-pixel blend: the same source built for a baseline CPU and, where the
-// CPU has it, for AVX2 (twice the lanes). Both evaluate the same expressions, without fused
-// multiply-add, so they give the same bytes.
+// One compilation of the per-pixel blend per instruction set; all evaluate the same expressions,
+// without fused multiply-add, so they give the same bytes.
 struct VignetteKernel {
   const char* name;
   void (*blendRun)(uint8_t* bgra, const float* mask, size_t count, const VignetteBlend& blend);
@@ -38,5 +37,33 @@ VignetteBlend MakeVignetteBlend(float a, float e, float b,
 
 // Blends `count` BGRA pixels with their mask weights; the same bytes as vignettePixel.
 void VignetteRow(uint8_t* bgra, const float* mask, size_t count, const VignetteBlend& blend);
+
+enum class RunKind : uint8_t { kInside, kOutside, kBlend };
+
+// vignetteAdjustFilter's work on BGRA frames of one size and one setting, made ready once: per
+// row of the mask's quadrant, the runs of pixels that each table takes and those blended one by
+// one, with the weights of the latter.
+class VignettePlan {
+ public:
+  // vignetteAdjustFilter's arguments, in its order; nothing to do where it would do nothing, or
+  // where memory runs out.
+  VignettePlan(int width, int height, float amount, float feather, float highlights, float size,
+               float roundness, float exposure);
+  // Rows [y0, y0 + rows) of a frame of the plan's size, the first at `pixels`.
+  void Apply(uint8_t* pixels, size_t stride, int y0, int rows) const;
+
+ private:
+  struct Run {
+    RunKind kind;
+    size_t start, end;
+    size_t mask;  // into masks_, for blended runs
+  };
+  int width_, height_;
+  bool active_ = false;
+  VignetteBlend blend_ = {};
+  std::vector<size_t> firstRun_;  // per quadrant row, and one past the last
+  std::vector<Run> runs_;
+  std::vector<float> masks_;
+};
 
 }  // namespace tfx

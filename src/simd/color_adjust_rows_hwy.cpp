@@ -506,27 +506,11 @@ const ColorAdjustRows* RowsOfThisTarget() {
 HWY_AFTER_NAMESPACE();
 
 #if HWY_ONCE
+#include "simd/dispatch.h"
+
 namespace tfx {
 
 HWY_EXPORT(RowsOfThisTarget);
-
-namespace {
-
-// The entry of `target` in an HWY_EXPORT table, by the rule hwy::ChosenTarget applies to the
-// mask of supported targets, here holding that one target: dynamic targets in their own slots,
-// EMU128 or SCALAR in the last.
-size_t DispatchSlot(int64_t target) {
-#if (HWY_TARGETS & (HWY_TARGETS - 1)) == 0
-  static_cast<void>(target);
-  return 0;  // a single target gets a single-entry table
-#else
-  const int64_t mask = (HWY_CHOSEN_TARGET_SHIFT(target) | HWY_CHOSEN_TARGET_MASK_SCALAR) &
-                       HWY_CHOSEN_TARGET_MASK_TARGETS;
-  return hwy::Num0BitsBelowLS1Bit_Nonzero64(static_cast<uint64_t>(mask));
-#endif
-}
-
-}  // namespace
 
 const ColorAdjustRows& BestColorAdjustRows() {
   static const ColorAdjustRows* const best = HWY_DYNAMIC_DISPATCH(RowsOfThisTarget)();
@@ -534,15 +518,7 @@ const ColorAdjustRows& BestColorAdjustRows() {
 }
 
 std::vector<const ColorAdjustRows*> SupportedColorAdjustRows() {
-  // The targets of hwy::SupportedAndGeneratedTargets(), best (lowest bit) first, walked here
-  // because its std::vector<int64_t> would be instantiated with default visibility and exported.
-  std::vector<const ColorAdjustRows*> rows;
-  for (int64_t targets = hwy::SupportedTargets() & HWY_TARGETS; targets != 0;
-       targets &= targets - 1) {
-    const int64_t target = targets & ~(targets - 1);
-    rows.push_back(HWY_DISPATCH_TABLE(RowsOfThisTarget)[DispatchSlot(target)]());
-  }
-  return rows;
+  return EverySupportedSet(HWY_DISPATCH_TABLE(RowsOfThisTarget));
 }
 
 }  // namespace tfx

@@ -1,0 +1,121 @@
+// The vignette blend, compiled once per instruction set by foreach_target.h.
+//
+// Every lane evaluates vignettePixel's float expressions in the same order (no MulAdd; the build
+// passes -ffp-contract=off), so every set gives its bytes.
+#include <cstring>
+
+#include "adjust/VignetteRows.h"
+
+#undef HWY_TARGET_INCLUDE
+#define HWY_TARGET_INCLUDE "simd/vignette_rows_hwy.cpp"
+#include <hwy/foreach_target.h>  // IWYU pragma: keep
+#include <hwy/highway.h>
+
+HWY_BEFORE_NAMESPACE();
+namespace tfx {
+namespace HWY_NAMESPACE {
+
+namespace hn = hwy::HWY_NAMESPACE;
+
+using DU = hn::ScalableTag<uint32_t>;
+using DI = hn::RebindToSigned<DU>;
+using DF = hn::RebindToFloat<DU>;
+using VU = hn::Vec<DU>;
+using VF = hn::Vec<DF>;
+
+// x / kDivisor as float division rounds it. The double product with 1 / kDivisor lies within
+// 2^-52 (relative) of the quotient, which is never closer than 2^-25 / kDivisor to a point where
+// float rounding changes (x has 24 significant bits), so both round alike; and a multiply is
+// several times cheaper than a divide.
+template <int kDivisor>
+HWY_INLINE VF DivideBy(VF x) {
+  const DF df;
+#if HWY_TARGET == HWY_SCALAR
+  return hn::Div(x, hn::Set(df, static_cast<float>(kDivisor)));
+#else
+  const hn::Half<DF> dh;
+  const hn::Repartition<double, DF> dd;
+  const auto r = hn::Set(dd, 1.0 / kDivisor);
+  const auto low = hn::DemoteTo(dh, hn::Mul(hn::PromoteTo(dd, hn::LowerHalf(dh, x)), r));
+  const auto high = hn::DemoteTo(dh, hn::Mul(hn::PromoteTo(dd, hn::UpperHalf(dh, x)), r));
+  return hn::Combine(df, high, low);
+#endif
+}
+
+struct BlendVector {
+  float onePlusA, e, b;
+
+  HWY_INLINE VU operator()(VU p, VF g) const {
+    const DU du;
+    const DI di;
+    const DF df;
+    const VU byte = hn::Set(du, 255u);
+    const VF blue = hn::ConvertTo(df, hn::BitCast(di, hn::And(p, byte)));
+    const VF green = hn::ConvertTo(df, hn::BitCast(di, hn::And(hn::ShiftRight<8>(p), byte)));
+    const VF red = hn::ConvertTo(df, hn::BitCast(di, hn::And(hn::ShiftRight<16>(p), byte)));
+    const VF one = hn::Set(df, 1.0f);
+    const VF top = hn::Set(df, 255.0f);
+    const VF inv = hn::Sub(one, g);
+    const VF gain = hn::Add(hn::Mul(hn::Set(df, onePlusA), inv), hn::Mul(hn::Set(df, e), g));
+    const VF sr = hn::Mul(red, gain), sg = hn::Mul(green, gain), sb = hn::Mul(blue, gain);
+    const VF mean = DivideBy<255>(DivideBy<3>(hn::Add(hn::Add(sr, sg), sb)));
+    const VF w = hn::Mul(hn::Mul(hn::Sub(one, mean), hn::Mul(inv, inv)), hn::Set(df, b));
+    const auto curved = hn::Lt(g, one);
+    const auto channel = [&](VF v) {
+      const VF curve =
+          hn::Sub(top, hn::Div(hn::Mul(hn::Sub(top, v), hn::Sub(top, hn::Mul(w, v))), top));
+      const VF out = hn::IfThenElse(curved, curve, v);
+      // 0 below 0, else trunc(min(255, v)); NaN gives 255.
+      const VF limited = hn::Max(hn::IfThenElse(hn::Lt(out, top), out, top), hn::Zero(df));
+      return hn::BitCast(du, hn::ConvertTo(di, limited));
+    };
+    return hn::Or3(hn::Or(hn::And(p, hn::Set(du, 0xff000000u)), channel(sb)),
+                   hn::ShiftLeft<8>(channel(sg)), hn::ShiftLeft<16>(channel(sr)));
+  }
+};
+
+void BlendRun(uint8_t* px, const float* mask, size_t count, const VignetteBlend& blend) {
+  const DU du;
+  const DF df;
+  const BlendVector kernel{1.0f + blend.a, blend.e, blend.b};
+  const size_t lanes = hn::Lanes(du);
+  size_t i = 0;
+  for (; i + lanes <= count; i += lanes) {
+    uint32_t* row = reinterpret_cast<uint32_t*>(px + 4 * i);
+    hn::StoreU(kernel(hn::LoadU(du, row), hn::LoadU(df, mask + i)), du, row);
+  }
+  if (i < count) {
+    // The tail through zero-padded copies, so that it gets the same arithmetic.
+    HWY_ALIGN uint32_t words[HWY_MAX_BYTES / 4] = {};
+    HWY_ALIGN float weights[HWY_MAX_BYTES / 4] = {};
+    std::memcpy(words, px + 4 * i, 4 * (count - i));
+    std::memcpy(weights, mask + i, 4 * (count - i));
+    hn::Store(kernel(hn::Load(du, words), hn::Load(df, weights)), du, words);
+    std::memcpy(px + 4 * i, words, 4 * (count - i));
+  }
+}
+
+const VignetteKernel* KernelOfThisTarget() {
+  static const VignetteKernel kernel = {hwy::TargetName(HWY_TARGET), &BlendRun};
+  return &kernel;
+}
+
+}  // namespace HWY_NAMESPACE
+}  // namespace tfx
+HWY_AFTER_NAMESPACE();
+
+#if HWY_ONCE
+#include "simd/dispatch.h"
+
+namespace tfx {
+
+HWY_EXPORT(KernelOfThisTarget);
+
+const std::vector<const VignetteKernel*>& SupportedVignetteKernels() {
+  static const std::vector<const VignetteKernel*> kernels =
+      EverySupportedSet(HWY_DISPATCH_TABLE(KernelOfThisTarget));
+  return kernels;
+}
+
+}  // namespace tfx
+#endif  // HWY_ONCE
