@@ -130,6 +130,8 @@ HWY_INLINE TableVector MakeTableVector(const uint8_t table[256], uint8_t* chunks
 
 #endif  // HWY_TARGET != HWY_SCALAR
 
+#include "simd/exact_divide-inl.h"
+
 // ---- Per-pixel arithmetic on 32-bit lanes ------------------------------------------------------
 
 HWY_INLINE VI Channel0(VU p) { return hn::BitCast(DI(), hn::And(p, hn::Set(DU(), 255u))); }
@@ -256,8 +258,8 @@ struct SaturationVector {
     const VF f0 = hn::ConvertTo(df, c0), f1 = hn::ConvertTo(df, c1), f2 = hn::ConvertTo(df, c2);
     const VI mx = hn::Max(c0, hn::Max(c1, c2));
     const VI mn = hn::Min(c0, hn::Min(c1, c2));
-    const VF sum = hn::Div(hn::ConvertTo(df, hn::Add(mx, mn)), hn::Set(df, 255.0f));
-    const VF delta = hn::Div(hn::ConvertTo(df, hn::Sub(mx, mn)), hn::Set(df, 255.0f));
+    const VF sum = DivideBy<255>(df, hn::ConvertTo(df, hn::Add(mx, mn)));
+    const VF delta = DivideBy<255>(df, hn::ConvertTo(df, hn::Sub(mx, mn)));
     // l * 255 with l = sum / 2: halving is exact, so this rounds the same product once.
     const VF lv = hn::Mul(sum, hn::Set(df, 127.5f));
     VF o0, o1, o2;
@@ -348,7 +350,7 @@ struct FusedColourVector {
     if (!kSaturate) return Pack(p, c0, c1, c2);
     const VI mx = hn::Max(c0, hn::Max(c1, c2));
     const VI mn = hn::Min(c0, hn::Min(c1, c2));
-    const VF sum = hn::Div(hn::ConvertTo(df, hn::Add(mx, mn)), hn::Set(df, 255.0f));
+    const VF sum = DivideBy<255>(df, hn::ConvertTo(df, hn::Add(mx, mn)));
     const VF lv = hn::Mul(sum, hn::Set(df, 127.5f));  // as in SaturationVector
     const VF gain = kIncrease ? hn::GatherIndex(df, t->gain, hn::Or(hn::ShiftLeft<8>(mx), mn))
                               : hn::Set(df, t->fixedGain);

@@ -23,24 +23,7 @@ using DF = hn::RebindToFloat<DU>;
 using VU = hn::Vec<DU>;
 using VF = hn::Vec<DF>;
 
-// x / kDivisor as float division rounds it. The double product with 1 / kDivisor lies within
-// 2^-52 (relative) of the quotient, which is never closer than 2^-25 / kDivisor to a point where
-// float rounding changes (x has 24 significant bits), so both round alike; and a multiply is
-// several times cheaper than a divide.
-template <int kDivisor>
-HWY_INLINE VF DivideBy(VF x) {
-  const DF df;
-#if HWY_TARGET == HWY_SCALAR
-  return hn::Div(x, hn::Set(df, static_cast<float>(kDivisor)));
-#else
-  const hn::Half<DF> dh;
-  const hn::Repartition<double, DF> dd;
-  const auto r = hn::Set(dd, 1.0 / kDivisor);
-  const auto low = hn::DemoteTo(dh, hn::Mul(hn::PromoteTo(dd, hn::LowerHalf(dh, x)), r));
-  const auto high = hn::DemoteTo(dh, hn::Mul(hn::PromoteTo(dd, hn::UpperHalf(dh, x)), r));
-  return hn::Combine(df, high, low);
-#endif
-}
+#include "simd/exact_divide-inl.h"
 
 struct BlendVector {
   float onePlusA, e, b;
@@ -58,7 +41,7 @@ struct BlendVector {
     const VF inv = hn::Sub(one, g);
     const VF gain = hn::Add(hn::Mul(hn::Set(df, onePlusA), inv), hn::Mul(hn::Set(df, e), g));
     const VF sr = hn::Mul(red, gain), sg = hn::Mul(green, gain), sb = hn::Mul(blue, gain);
-    const VF mean = DivideBy<255>(DivideBy<3>(hn::Add(hn::Add(sr, sg), sb)));
+    const VF mean = DivideBy<255>(df, DivideBy<3>(df, hn::Add(hn::Add(sr, sg), sb)));
     const VF w = hn::Mul(hn::Mul(hn::Sub(one, mean), hn::Mul(inv, inv)), hn::Set(df, b));
     const auto curved = hn::Lt(g, one);
     const auto channel = [&](VF v) {
