@@ -9,6 +9,7 @@
 #   <includedir>/tessarofx/                  TessaroFx.h, HostKit.h, ImageFunctions.h and parts
 #   <libdir>/cmake/TessaroFx/                find_package(TessaroFx CONFIG)
 #   <libdir>/pkgconfig/tessarofx.pc          host kit; tessarofx-image.pc: the image functions
+#   lib/python3/dist-packages/tessarofx/     the Python package; RUNPATH $ORIGIN/<it to libdir>
 include(CMakePackageConfigHelpers)
 
 set_target_properties(TessaroFx TessaroFxHost PROPERTIES
@@ -58,3 +59,15 @@ install(CODE "
   endforeach()")
 list(TRANSFORM TFX_PC_FILES REPLACE "(.+)" "${TFX_PC_BINARY_DIR}/\\1.pc")
 install(FILES ${TFX_PC_FILES} DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+
+# The Python package, where Debian's interpreter looks: <prefix>/lib/python3/dist-packages (with
+# prefix /usr, as the .deb installs it, on every Debian python3's path). The module finds the
+# plug-in relative to itself, as the tool does.
+if(TFX_BUILD_PYTHON)
+  set(TFX_INSTALL_PYTHONDIR lib/python3/dist-packages/tessarofx)
+  file(RELATIVE_PATH TFX_PYTHON_TO_LIB ${CMAKE_INSTALL_PREFIX}/${TFX_INSTALL_PYTHONDIR}
+       ${CMAKE_INSTALL_FULL_LIBDIR})
+  set_target_properties(tfx_python PROPERTIES INSTALL_RPATH "$ORIGIN/${TFX_PYTHON_TO_LIB}")
+  install(TARGETS tfx_python LIBRARY DESTINATION ${TFX_INSTALL_PYTHONDIR})
+  install(FILES ${TFX_PYTHON_SOURCES} DESTINATION ${TFX_INSTALL_PYTHONDIR})
+endif()
