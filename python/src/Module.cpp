@@ -5,9 +5,12 @@
 #include <dlfcn.h>
 #include <pybind11/eval.h>
 
+#include <cstdlib>
+
 #include "Frames.h"
 #include "media/ImageFiles.h"
 #include "tessarofx/ColorAdjust.h"
+#include "tessarofx/NLEHost.h"
 
 namespace tfxpy {
 namespace {
@@ -119,6 +122,18 @@ void WriteImageFile(const std::string& path, py::handle image, const std::string
 
 PYBIND11_MODULE(_native, m) {
   m.doc() = "TessaroFx filters, image functions and LUTs on NumPy arrays (compiled part).";
+  // Creation lines are informational: quiet, as in the tool, unless the environment asks.
+  if (INLELogger* logger = NLEGetDefaultLogger(); logger && !std::getenv("TESSAROFX_LOG_LEVEL")) {
+    logger->SetLevel(kNLELogWarning);
+  }
+  m.def(
+      "set_log_level",
+      [](int level) {
+        if (level < 0) throw py::value_error("a log level is 0 or more");
+        if (INLELogger* logger = NLEGetDefaultLogger()) logger->SetLevel(level);
+      },
+      py::arg("level"),
+      "The plug-in's log threshold: 0 trace, 16 debug, 32 info, 48 warning, 64 error.");
   RegisterErrors(m);
   RegisterFilters(m);
   RegisterFunctions(m);

@@ -29,7 +29,7 @@ from dataclasses import dataclass
 from typing import Optional, Tuple
 
 from . import _native
-from ._native import Error, LutError, ParameterError, from_bgra, to_bgra
+from ._native import Error, LutError, ParameterError, from_bgra, set_log_level, to_bgra
 
 __all__ = [
     "Error", "ParameterError", "LutError",
@@ -37,7 +37,7 @@ __all__ = [
     "filters", "devices", "functions",
     "Filter", "Chain", "apply",
     "Lut", "read_lut", "bake_lut",
-    "read_image", "write_image", "to_bgra", "from_bgra",
+    "read_image", "write_image", "to_bgra", "from_bgra", "set_log_level",
 ]
 
 
