@@ -255,8 +255,8 @@ def _make_function(spec):
             second = bound.arguments.get(images[1]) if len(images) > 1 else None
             return _native.call_function(tool_name, bound.arguments["image"], texts, second,
                                          order)
-        ranges = "".join(f"\n    {a[0]}: {a[1]:g}..{a[2]:g}" for a in args)
-        doc = spec["meaning"] + "." + ranges
+        ranges = "\n".join(f"{a[0]}: {a[1]:g}..{a[2]:g}" for a in args)
+        doc = spec["meaning"] + "." + ("\n\n" + ranges if ranges else "")
         if spec["also"]:
             doc += "\nAlso calls " + ", ".join(spec["also"]) + "."
 
