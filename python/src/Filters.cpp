@@ -97,6 +97,10 @@ py::list ListDevices() {
   return list;
 }
 
+bool Overlap(const cv::Mat& a, const cv::Mat& b) {
+  return a.datastart < b.dataend && b.datastart < a.dataend;
+}
+
 // One filter object, its CPU class or its OpenCL class, kept from frame to frame.
 class NativeFilter {
  public:
@@ -106,8 +110,9 @@ class NativeFilter {
     Check(tfxtool::ResolveFilter(Published(), name, &filter_), ErrorKind::kParameter);
     for (const auto& [key, value] : params) settings_.push_back({key, value});
     if (!device) {
-      Check(tfxtool::CreateFilter(Plugin(), filter_, settings_, nullptr, fx_),
-            ErrorKind::kParameter);
+      const Status created = tfxtool::CreateFilter(Plugin(), filter_, settings_, nullptr, fx_);
+      // A refused setting is the caller's; a filter the plug-in would not make is the library's.
+      Check(created, created.code() == 0 ? ErrorKind::kParameter : ErrorKind::kError);
       return;
     }
     if (!filter_.opencl) {
@@ -121,7 +126,6 @@ class NativeFilter {
     opencl_ = std::make_unique<tfxtool::OpenCLFilterRun>();
     const Status created =
         tfxtool::OpenCLFilterRun::Create(Plugin(), filter_, settings_, target, opencl_.get());
-    // A refused setting is the caller's; a program that does not build is the system's.
     Check(created, created.code() == 0 ? ErrorKind::kParameter : ErrorKind::kError);
   }
 
@@ -154,9 +158,16 @@ class NativeFilter {
       result = array;
       dst = given.pixels;
     }
+    // Filters read neighbouring pixels, so a destination that shares memory with an input
+    // (out=frame) gets a copy of that input to read from.
+    const bool overlaps = Overlap(dst, in.pixels) || (under && Overlap(dst, under->pixels));
     Status status;
     {
       py::gil_scoped_release released;
+      if (overlaps) {
+        in.pixels = in.pixels.clone();
+        if (under) under->pixels = under->pixels.clone();
+      }
       // One caller at a time per filter object; other objects run in parallel.
       std::lock_guard<std::mutex> lock(mutex_);
       status = opencl_ ? RunOpenCL(in.pixels, o, &dst)

@@ -90,8 +90,9 @@ def test_every_filter_gives_the_tools_bytes(files, name, params):
     out = np.full_like(img, 0x5A)
     assert f(img, background, out=out) is out
     np.testing.assert_array_equal(out, expected)
-    # The object keeps working frame after frame, and apply() is the same call.
+    # The object keeps working frame after frame, in place too, and apply() is the same call.
     np.testing.assert_array_equal(f(img, background), expected)
+    np.testing.assert_array_equal(f(out, background, out=out), f(expected, background))
     np.testing.assert_array_equal(tfx.apply(img, name, background=background, **params), expected)
 
 
