@@ -3,7 +3,6 @@
 #include <pybind11/stl.h>
 
 #include <chrono>
-#include <cstring>
 #include <memory>
 #include <mutex>
 #include <optional>
