@@ -189,6 +189,18 @@ def test_luts_match_the_tool(files, tmp_path):
                           d / "in.png", d / "out.png")
     np.testing.assert_array_equal(read.apply(img), expected)
 
+    # A .3dl goes through the plug-in's own reader, for a table and for the filter alike.
+    rows = np.random.default_rng(2).integers(0, 4096, (27, 3))
+    (tmp_path / "grade.3dl").write_text("3DMESH\nMesh 0 12\n0 2047 4095\n" +
+                                        "".join("%d %d %d\n" % tuple(r) for r in rows))
+    dl = tfx.read_lut(tmp_path / "grade.3dl")
+    expected = tool_image(d, "apply", "Lut", "-p", f"lut3dPath={tmp_path / 'grade.3dl'}",
+                          d / "in.png", d / "out.png")
+    np.testing.assert_array_equal(dl.apply(img), expected)
+    dl.write(tmp_path / "mine3.cube")
+    tool("lut", "convert", tmp_path / "grade.3dl", tmp_path / "tool3.cube")
+    assert (tmp_path / "mine3.cube").read_bytes() == (tmp_path / "tool3.cube").read_bytes()
+
     # Larger than the plug-in holds: refused without a size, resampled as `lut convert` does.
     n = 66
     axis = np.linspace(0, 1, n)
