@@ -178,6 +178,8 @@ VignetteBlend MakeVignetteBlend(float a, float e, float b, const VignetteKernel&
   // 0 and the scaled channels and their sum stay finite.
   const float outsideGain = (1.0f + a) * (1.0f - 0.0f) + e * 0.0f;
   p.outsideByTable = b == 0.0f && std::isfinite(outsideGain * 765.0f);
+  // The gain lies between 1 + a and e for every g in [0, 1].
+  p.zeroWeight = b == 0.0f && std::isfinite((std::fabs(1.0f + a) + std::fabs(e)) * 765.0f);
   for (int v = 0; v < 256; ++v) {
     const uint8_t u = static_cast<uint8_t>(v);
     p.inside[v] = BlendPixel(tagRGBQUAD{u, u, u, 0}, 1.0f, a, e, b).rgbBlue;

@@ -29,13 +29,17 @@ struct VignetteBlend {
   const VignetteKernel* kernel;
   uint8_t inside[256];  // g = 1: each channel times e alone
   bool outsideByTable;  // g = 0 with a zero tone-curve weight
+  // b = 0 and every scaled channel finite: the curve's weight is a signed zero for every g, and
+  // w * v = 0 exactly.
+  bool zeroWeight;
   uint8_t outside[256];
 };
 
 VignetteBlend MakeVignetteBlend(float a, float e, float b,
                                 const VignetteKernel& kernel = *SupportedVignetteKernels().front());
 
-// Blends `count` BGRA pixels with their mask weights; the same bytes as vignettePixel.
+// Blends `count` BGRA pixels with their mask weights (in [0, 1], as the gradient makes them); the
+// same bytes as vignettePixel.
 void VignetteRow(uint8_t* bgra, const float* mask, size_t count, const VignetteBlend& blend);
 
 enum class RunKind : uint8_t { kInside, kOutside, kBlend };

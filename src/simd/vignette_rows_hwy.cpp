@@ -25,6 +25,8 @@ using VF = hn::Vec<DF>;
 
 #include "simd/exact_divide-inl.h"
 
+// kZeroWeight: the blend's zeroWeight, where the curve's weight need not be computed.
+template <bool kZeroWeight>
 struct BlendVector {
   float onePlusA, e, b;
 
@@ -41,8 +43,11 @@ struct BlendVector {
     const VF inv = hn::Sub(one, g);
     const VF gain = hn::Add(hn::Mul(hn::Set(df, onePlusA), inv), hn::Mul(hn::Set(df, e), g));
     const VF sr = hn::Mul(red, gain), sg = hn::Mul(green, gain), sb = hn::Mul(blue, gain);
-    const VF mean = DivideBy<255>(df, DivideBy<3>(df, hn::Add(hn::Add(sr, sg), sb)));
-    const VF w = hn::Mul(hn::Mul(hn::Sub(one, mean), hn::Mul(inv, inv)), hn::Set(df, b));
+    VF w = hn::Zero(df);
+    if (!kZeroWeight) {
+      const VF mean = DivideBy<255>(df, DivideBy<3>(df, hn::Add(hn::Add(sr, sg), sb)));
+      w = hn::Mul(hn::Mul(hn::Sub(one, mean), hn::Mul(inv, inv)), hn::Set(df, b));
+    }
     const auto curved = hn::Lt(g, one);
     const auto channel = [&](VF v) {
       const VF curve =
@@ -57,10 +62,11 @@ struct BlendVector {
   }
 };
 
-void BlendRun(uint8_t* px, const float* mask, size_t count, const VignetteBlend& blend) {
+template <bool kZeroWeight>
+void BlendRunOf(uint8_t* px, const float* mask, size_t count, const VignetteBlend& blend) {
   const DU du;
   const DF df;
-  const BlendVector kernel{1.0f + blend.a, blend.e, blend.b};
+  const BlendVector<kZeroWeight> kernel{1.0f + blend.a, blend.e, blend.b};
   const size_t lanes = hn::Lanes(du);
   size_t i = 0;
   for (; i + lanes <= count; i += lanes) {
@@ -75,6 +81,14 @@ void BlendRun(uint8_t* px, const float* mask, size_t count, const VignetteBlend&
     std::memcpy(weights, mask + i, 4 * (count - i));
     hn::Store(kernel(hn::Load(du, words), hn::Load(df, weights)), du, words);
     std::memcpy(px + 4 * i, words, 4 * (count - i));
+  }
+}
+
+void BlendRun(uint8_t* px, const float* mask, size_t count, const VignetteBlend& blend) {
+  if (blend.zeroWeight) {
+    BlendRunOf<true>(px, mask, count, blend);
+  } else {
+    BlendRunOf<false>(px, mask, count, blend);
   }
 }
 
