@@ -95,6 +95,24 @@ void ContrastTable(float c, uint8_t table[256]) {
   for (int v = 0; v < 256; ++v) table[v] = ContrastChannel(v, limits.lo, limits.hi, limits.d);
 }
 
+// The exposure, brightness and contrast curves composed into one table; false when all three are
+// no-ops (the table is then the identity).
+bool ComposeTone(float e, float b, float c, uint8_t table[256]) {
+  for (int v = 0; v < 256; ++v) table[v] = static_cast<uint8_t>(v);
+  uint8_t step[256];
+  bool any = false;
+  const auto compose = [&](float strength, void (*build)(float, uint8_t*)) {
+    if (strength == 0.0f) return;
+    build(strength, step);
+    for (int v = 0; v < 256; ++v) table[v] = step[table[v]];
+    any = true;
+  };
+  compose(e, ExposureTable);
+  compose(b, BrightnessTable);
+  compose(c, ContrastTable);
+  return any;
+}
+
 }  // namespace
 
 CxImage* ExposureAdjust(CxImage* image, float e, const ColorAdjustRows& rows) {
@@ -144,17 +162,7 @@ CxImage* ToneAdjust(CxImage* image, float e, float b, float c, const ColorAdjust
     return ContrastAdjust(BrightnessAdjust(ExposureAdjust(image, e, rows), b, rows), c, rows);
   }
   uint8_t table[256];
-  for (int v = 0; v < 256; ++v) table[v] = static_cast<uint8_t>(v);
-  uint8_t step[256];
-  const auto compose = [&](float strength, void (*build)(float, uint8_t*)) {
-    if (strength == 0.0f) return;
-    build(strength, step);
-    for (uint8_t& t : table) t = step[t];
-  };
-  compose(e, ExposureTable);
-  compose(b, BrightnessTable);
-  compose(c, ContrastTable);
-  if (e != 0.0f || b != 0.0f || c != 0.0f) ApplyTable(image, table, rows);
+  if (ComposeTone(e, b, c, table)) ApplyTable(image, table, rows);
   return image;
 }
 
@@ -165,17 +173,7 @@ ColorAdjustPlan::ColorAdjustPlan(float e, float b, float c, float v, float s,
       hasSaturation_(s != 0.0f),
       vibrance_(hasVibrance_ ? VibranceStrength(v) : 0.0f),
       sigma_(s / 100.0f) {
-  for (int i = 0; i < 256; ++i) tone_[i] = static_cast<uint8_t>(i);
-  uint8_t step[256];
-  const auto compose = [&](float strength, void (*build)(float, uint8_t*)) {
-    if (strength == 0.0f) return;
-    build(strength, step);
-    for (uint8_t& t : tone_) t = step[t];
-    hasTone_ = true;
-  };
-  compose(e, ExposureTable);
-  compose(b, BrightnessTable);
-  compose(c, ContrastTable);
+  hasTone_ = ComposeTone(e, b, c, tone_);
   if ((hasVibrance_ || hasSaturation_) && !Fuse()) {
     gain_.clear();
   }
