@@ -197,32 +197,14 @@ class NativeFilter {
     const cv::Mat input = ToBgra(pixels, order);
     const cv::Mat under = background ? ToBgra(*background, order) : input;
     cv::Mat target = order == Order::kBgra ? *dst : cv::Mat(input.size(), CV_8UC4);
-    NLEComPtr<INLEMemoryFrame> fgFrame, bgFrame, dstFrame;
-    if (Status s = tfxtool::WrapFrame(input, fgFrame); !s.ok()) return s;
-    if (Status s = tfxtool::WrapFrame(under, bgFrame); !s.ok()) return s;
-    if (Status s = tfxtool::WrapFrame(target, dstFrame); !s.ok()) return s;
     const bool prepare = input.size() != prepared_;
     prepared_ = cv::Size();
-    fx_->SetForeground(fgFrame.get());
-    fx_->SetBackground(bgFrame.get());
-    fx_->SetTotalTime(total_);
-    fx_->SetCurrentTime(current_);
-    HRESULT hr = NLE_S_OK;
-    if (prepare) {
-      CGFilterParam param = {};
-      param.frameSize = {input.cols, input.rows};
-      param.quality = 1;
-      hr = fx_->Prepare(param);
-    }
-    if (NLE_SUCCEEDED(hr)) {
-      const auto start = std::chrono::steady_clock::now();
-      hr = fx_->Running(dstFrame.get());
-      runningNs_ = std::chrono::duration_cast<std::chrono::nanoseconds>(
-                       std::chrono::steady_clock::now() - start)
-                       .count();
-    }
-    fx_->SetForeground(nullptr);
-    fx_->SetBackground(nullptr);
+    const auto start = std::chrono::steady_clock::now();
+    const HRESULT hr =
+        tfxtool::RunFilterFrame(fx_.get(), input, under, target, current_, total_, prepare);
+    runningNs_ = std::chrono::duration_cast<std::chrono::nanoseconds>(
+                     std::chrono::steady_clock::now() - start)
+                     .count();
     if (NLE_FAILED(hr)) {
       return Status::Error(filter_.name + " failed: " + tfxtool::DescribeResult(hr), hr);
     }

@@ -43,29 +43,19 @@ Status FilterChain::Run(const cv::Mat& bgraIn, cv::Mat* bgraOut, const cv::Mat* 
   prepared_ = cv::Size();
   cv::Mat input = bgraIn;
   cv::Mat under = background ? *background : bgraIn;
+  // Every filter writes every pixel of its destination, so none is cleared. The steps between
+  // keep their frames from call to call; the last one's is new, since the caller keeps it.
+  scratch_.resize(filters_.empty() ? 0 : filters_.size() - 1);
   for (size_t i = 0; i < filters_.size(); ++i) {
-    cv::Mat dst(size, CV_8UC4, cv::Scalar::all(0));
-    NLEComPtr<INLEMemoryFrame> fgFrame, bgFrame, dstFrame;
-    if (Status s = WrapFrame(input, fgFrame); !s.ok()) return s;
-    if (Status s = WrapFrame(under, bgFrame); !s.ok()) return s;
-    if (Status s = WrapFrame(dst, dstFrame); !s.ok()) return s;
-
-    INLECGFilter* fx = filters_[i].get();
-    fx->SetForeground(fgFrame.get());
-    fx->SetBackground(bgFrame.get());
-    fx->SetTotalTime(total_);
-    fx->SetCurrentTime(current_);
-    HRESULT hr = NLE_S_OK;
-    if (prepare) {
-      CGFilterParam param = {};
-      param.frameSize = {size.width, size.height};
-      param.quality = 1;
-      hr = fx->Prepare(param);
+    cv::Mat dst;
+    if (i + 1 < filters_.size()) {
+      scratch_[i].create(size, CV_8UC4);
+      dst = scratch_[i];
+    } else {
+      dst.create(size, CV_8UC4);
     }
-    if (NLE_SUCCEEDED(hr)) hr = fx->Running(dstFrame.get());
-    // The filter only borrows its inputs, and these frames end with this step.
-    fx->SetForeground(nullptr);
-    fx->SetBackground(nullptr);
+    const HRESULT hr =
+        RunFilterFrame(filters_[i].get(), input, under, dst, current_, total_, prepare);
     if (NLE_FAILED(hr)) {
       return Status::Error(steps_[i].filter.name + " failed: " + DescribeResult(hr), hr);
     }

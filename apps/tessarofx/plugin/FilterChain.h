@@ -50,6 +50,7 @@ class FilterChain {
  private:
   std::vector<ChainStep> steps_;
   std::vector<NLEComPtr<INLECGFilter>> filters_;
+  std::vector<cv::Mat> scratch_;  // the results of all steps but the last
   cv::Size prepared_;  // the frame size the filters were prepared for, empty before the first
   int32_t current_ = 0;
   int32_t total_ = 1;

@@ -237,6 +237,31 @@ Status WrapFrame(const cv::Mat& bgra, NLEComPtr<INLEMemoryFrame>& frame) {
   return Status::Ok();
 }
 
+HRESULT RunFilterFrame(INLECGFilter* fx, const cv::Mat& input, const cv::Mat& background,
+                       cv::Mat& dst, int32_t current, int32_t total, bool prepare) {
+  NLEComPtr<INLEMemoryFrame> fgFrame, bgFrame, dstFrame;
+  Status wrapped = WrapFrame(input, fgFrame);
+  if (wrapped.ok()) wrapped = WrapFrame(background, bgFrame);
+  if (wrapped.ok()) wrapped = WrapFrame(dst, dstFrame);
+  if (!wrapped.ok()) return NLE_FAILED(wrapped.code()) ? wrapped.code() : NLE_E_OUTOFMEMORY;
+  fx->SetForeground(fgFrame.get());
+  fx->SetBackground(bgFrame.get());
+  fx->SetTotalTime(total);
+  fx->SetCurrentTime(current);
+  HRESULT hr = NLE_S_OK;
+  if (prepare) {
+    CGFilterParam param = {};
+    param.frameSize = {input.cols, input.rows};
+    param.quality = 1;
+    hr = fx->Prepare(param);
+  }
+  if (NLE_SUCCEEDED(hr)) hr = fx->Running(dstFrame.get());
+  // The filter only borrows its inputs, and these frames end with this call.
+  fx->SetForeground(nullptr);
+  fx->SetBackground(nullptr);
+  return hr;
+}
+
 Status ReadPublishedFilters(const PluginLibrary& plugin, std::vector<PublishedFilter>* filters) {
   filters->clear();
   const uint32_t count = plugin.FilterCount();

@@ -74,6 +74,12 @@ Status CreateFilter(const PluginLibrary& plugin, const ResolvedFilter& filter,
 // A host frame over a matrix's pixels; the matrix must outlive it.
 Status WrapFrame(const cv::Mat& bgra, NLEComPtr<INLEMemoryFrame>& frame);
 
+// One frame through a filter as an editor runs it: the inputs lent for the call only, the time
+// in the clip set, Prepare first when `prepare` (a new run of frames of `input`'s size), then
+// Running into `dst` (the input's size). The inputs are only read.
+HRESULT RunFilterFrame(INLECGFilter* fx, const cv::Mat& input, const cv::Mat& background,
+                       cv::Mat& dst, int32_t current, int32_t total, bool prepare);
+
 // Creates the filter's CPU class with the settings applied and runs it once: `foreground` is the
 // frame the effect adjusts, `background` the frame under it; `out` gets the foreground's size.
 // The inputs are only read.
