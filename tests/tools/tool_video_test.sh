@@ -53,6 +53,14 @@ done
 "$tool" apply -q "${chain[@]}" --codec ffv1 --threads 1 clip.mkv t1.mkv
 [ "$(video_md5 t4.mkv)" = "$(video_md5 t1.mkv)" ] && ok "--threads 4 equals --threads 1" ||
   fail "--threads 4 differs from --threads 1"
+# --opencl puts the steps with an OpenCL class on a device (PoCL here), the rest stay on the CPU.
+if "$tool" devices >/dev/null 2>&1; then
+  device_chain=(-f ColorAdjust -p u_exposure=30 -f WhiteBalanceAdjust -p u_temperature=40)
+  "$tool" apply -q "${device_chain[@]}" --codec ffv1 clip.mkv cpu.mkv
+  "$tool" apply -q --opencl "${device_chain[@]}" --codec ffv1 --threads 2 clip.mkv device.mkv
+  [ "$(video_md5 device.mkv)" = "$(video_md5 cpu.mkv)" ] && ok "--opencl chain equals the CPU" ||
+    fail "--opencl chain differs from the CPU"
+fi
 # Against the lossless result in the same 4:2:0 layout, so that only the encoder's loss counts;
 # a frame larger than the others, as tiny frames of test patterns are all edges.
 ff -f lavfi -i "testsrc2=s=192x128:r=25:d=0.6,format=bgra" -c:v ffv1 big.mkv

@@ -16,19 +16,16 @@
 namespace tfxtool {
 namespace {
 
-Status RunOpenCL(const PluginLibrary& plugin, const ResolvedFilter& filter,
-                 const std::vector<ParamSetting>& settings, int deviceIndex,
-                 const std::string& kernelDir, const cv::Mat& input, cv::Mat* result) {
-  // Asked before the device, so that the answer does not depend on the machine.
-  if (!filter.opencl) {
-    return Status::Error(filter.name + " has no OpenCL class; see tessarofx list");
+// With --opencl, the chain must have a step for the device.
+Status CheckOpenCLSteps(const std::vector<ChainStep>& steps) {
+  for (const ChainStep& step : steps) {
+    if (step.filter.opencl) return Status::Ok();
   }
-  NLEComPtr<INLECGDevice> device;
-  OpenCLTarget target;
-  if (Status s = OpenOpenCLTarget(plugin, deviceIndex, kernelDir, device, &target); !s.ok()) {
-    return s;
+  if (steps.size() == 1) {
+    return Status::Error(steps[0].filter.name + " has no OpenCL class; see tessarofx list");
   }
-  return RunFilterOpenCL(plugin, filter, settings, target, input, result);
+  return Status::Error(
+      "--opencl: none of the chain's filters has an OpenCL class; see tessarofx list");
 }
 
 struct ApplyOptions {
@@ -39,25 +36,17 @@ struct ApplyOptions {
   VideoOptions video;
 };
 
-// A worker of a clip: a chain of its own, or the one filter's OpenCL class on a device of its
-// own.
+// A worker of a clip: a chain of its own and, with --opencl, a device of its own for the steps
+// that have an OpenCL class.
 class ChainWorker final : public FrameWorker {
  public:
+  NLEComPtr<INLECGDevice> device;
+  OpenCLTarget target;
   FilterChain chain;
   Status Process(cv::Mat& bgra, const cv::Mat* background, int64_t index, int64_t total) override {
     chain.SetFrameTime(static_cast<int32_t>(std::min<int64_t>(index, INT32_MAX)),
                        static_cast<int32_t>(std::min<int64_t>(total, INT32_MAX)));
     return chain.Run(bgra, &bgra, background);
-  }
-};
-
-class OpenCLWorker final : public FrameWorker {
- public:
-  NLEComPtr<INLECGDevice> device;
-  OpenCLTarget target;
-  OpenCLFilterRun run;
-  Status Process(cv::Mat& bgra, const cv::Mat*, int64_t, int64_t) override {
-    return run.Run(bgra, &bgra);
   }
 };
 
@@ -81,34 +70,25 @@ Status ApplyChainToClip(const GlobalOptions& options, const PluginLibrary& plugi
   job.alpha = [makesAlpha, keepsAlpha](bool inputAlpha) {
     return inputAlpha ? keepsAlpha : makesAlpha;
   };
-  if (request.opencl) {
-    job.makeWorker = [&](std::unique_ptr<FrameWorker>* out) {
-      auto worker = std::make_unique<OpenCLWorker>();
+  job.makeWorker = [&](std::unique_ptr<FrameWorker>* out) {
+    if (first && !request.opencl) {
+      *out = std::move(first);
+      return Status::Ok();
+    }
+    auto worker = std::make_unique<ChainWorker>();
+    const OpenCLTarget* device = nullptr;
+    if (request.opencl) {
       if (Status s = OpenOpenCLTarget(plugin, request.deviceIndex, request.kernels, worker->device,
                                       &worker->target);
           !s.ok()) {
         return s;
       }
-      if (Status s = OpenCLFilterRun::Create(plugin, steps[0].filter, steps[0].settings,
-                                             worker->target, &worker->run);
-          !s.ok()) {
-        return s;
-      }
-      *out = std::move(worker);
-      return Status::Ok();
-    };
-  } else {
-    job.makeWorker = [&](std::unique_ptr<FrameWorker>* out) {
-      if (first) {
-        *out = std::move(first);
-        return Status::Ok();
-      }
-      auto worker = std::make_unique<ChainWorker>();
-      if (Status s = FilterChain::Create(plugin, steps, &worker->chain); !s.ok()) return s;
-      *out = std::move(worker);
-      return Status::Ok();
-    };
-  }
+      device = &worker->target;
+    }
+    if (Status s = FilterChain::Create(plugin, steps, &worker->chain, device); !s.ok()) return s;
+    *out = std::move(worker);
+    return Status::Ok();
+  };
   return RunVideoJob(job, *options.reporter);
 }
 
@@ -156,9 +136,6 @@ Status ApplyFilters(const GlobalOptions& options, const ApplyOptions& given) {
   if (words.size() > 1 && !backgroundPath.empty()) {
     return Status::Error("--background goes with one filter: it is ChromeKeyCombine's key mask");
   }
-  if (words.size() > 1 && opencl) {
-    return Status::Error("--opencl runs one filter; give it without -f chains");
-  }
   if (!opencl && (!deviceText.empty() || !kernelDir.empty())) {
     return Status::Error(std::string(deviceText.empty() ? "--kernels" : "--device") +
                          " only goes with --opencl");
@@ -203,10 +180,10 @@ Status ApplyFilters(const GlobalOptions& options, const ApplyOptions& given) {
     }
     steps.push_back(std::move(resolved));
   }
+  if (opencl) {
+    if (Status s = CheckOpenCLSteps(steps); !s.ok()) return s;
+  }
   if (clip) {
-    if (opencl && !steps[0].filter.opencl) {
-      return Status::Error(steps[0].filter.name + " has no OpenCL class; see tessarofx list");
-    }
     ClipRequest request{input,       output, backgroundPath,
                         given.video, opencl, static_cast<int>(deviceIndex),
                         kernelDir};
@@ -227,18 +204,22 @@ Status ApplyFilters(const GlobalOptions& options, const ApplyOptions& given) {
     }
   }
 
-  cv::Mat result;
+  NLEComPtr<INLECGDevice> device;
+  OpenCLTarget target;
   if (opencl) {
-    if (Status s = RunOpenCL(plugin, steps[0].filter, steps[0].settings,
-                             static_cast<int>(deviceIndex), kernelDir, foreground, &result);
+    if (Status s =
+            OpenOpenCLTarget(plugin, static_cast<int>(deviceIndex), kernelDir, device, &target);
         !s.ok()) {
       return s;
     }
-  } else {
-    FilterChain chain;
-    if (Status s = FilterChain::Create(plugin, std::move(steps), &chain); !s.ok()) return s;
-    if (Status s = chain.Run(foreground, &result, &background); !s.ok()) return s;
   }
+  cv::Mat result;
+  FilterChain chain;
+  if (Status s = FilterChain::Create(plugin, std::move(steps), &chain, opencl ? &target : nullptr);
+      !s.ok()) {
+    return s;
+  }
+  if (Status s = chain.Run(foreground, &result, &background); !s.ok()) return s;
   return WriteImage(output, result);
 }
 
@@ -278,7 +259,8 @@ Examples:
                    "the frame under a lone filter (ChromeKeyCombine's key mask)")
       ->type_name("FILE");
   apply->add_flag("--opencl", given->opencl,
-                  "run the filter's OpenCL class on a device (list: OpenCL)");
+                  "run the filters that have an OpenCL class on a device (list: OpenCL), the "
+                  "others on the CPU");
   apply
       ->add_option("--device", given->device,
                    "with --opencl: a device from 'tessarofx devices' (default -1)")

@@ -12,16 +12,33 @@ bool Is(const ChainStep& step, const FilterInfo& filter) {
 }  // namespace
 
 Status FilterChain::Create(const PluginLibrary& plugin, std::vector<ChainStep> steps,
-                           FilterChain* chain) {
+                           FilterChain* chain, const OpenCLTarget* device) {
   FilterChain made;
   for (const ChainStep& step : steps) {
     NLEComPtr<INLECGFilter> fx;
-    if (Status s = CreateFilter(plugin, step.filter, step.settings, nullptr, fx); !s.ok()) return s;
+    std::unique_ptr<OpenCLFilterRun> run;
+    if (device && step.filter.opencl) {
+      run = std::make_unique<OpenCLFilterRun>();
+      if (Status s =
+              OpenCLFilterRun::Create(plugin, step.filter, step.settings, *device, run.get());
+          !s.ok()) {
+        return s;
+      }
+    } else if (Status s = CreateFilter(plugin, step.filter, step.settings, nullptr, fx); !s.ok()) {
+      return s;
+    }
     made.filters_.push_back(fx);
+    made.onDevice_.push_back(std::move(run));
   }
   made.steps_ = std::move(steps);
   *chain = std::move(made);
   return Status::Ok();
+}
+
+size_t FilterChain::DeviceSteps() const {
+  size_t count = 0;
+  for (const auto& run : onDevice_) count += run ? 1 : 0;
+  return count;
 }
 
 void FilterChain::SetFrameTime(int32_t current, int32_t total) {
@@ -48,6 +65,12 @@ Status FilterChain::Run(const cv::Mat& bgraIn, cv::Mat* bgraOut, const cv::Mat* 
   scratch_.resize(filters_.empty() ? 0 : filters_.size() - 1);
   for (size_t i = 0; i < filters_.size(); ++i) {
     cv::Mat dst;
+    if (onDevice_[i]) {
+      // A new matrix for the download.
+      if (Status s = onDevice_[i]->Run(input, &dst); !s.ok()) return s;
+      input = under = dst;
+      continue;
+    }
     if (i + 1 < filters_.size()) {
       scratch_[i].create(size, CV_8UC4);
       dst = scratch_[i];

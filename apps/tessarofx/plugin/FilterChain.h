@@ -28,8 +28,10 @@ class FilterChain {
   // Creates each step's filter (its CPU class) with its settings applied; a setting that does not
   // fit its filter is refused here, before any frame. Creating is cheap next to a frame, so N
   // threads make N chains from the same steps.
+  // With `device`, steps whose filter has an OpenCL class run it on that device (each uploads its
+  // input and downloads its result), the others on the CPU; the device must outlive the chain.
   static Status Create(const PluginLibrary& plugin, std::vector<ChainStep> steps,
-                       FilterChain* chain);
+                       FilterChain* chain, const OpenCLTarget* device = nullptr);
 
   // Runs one 8-bit BGRA frame through every step into `bgraOut` (same size; it may be `bgraIn`).
   // `background` is the frame under the first step (ChromeKeyCombine's key mask), by default the
@@ -46,11 +48,14 @@ class FilterChain {
   bool CarriesAlpha(bool inputAlpha = false) const;
 
   const std::vector<ChainStep>& steps() const { return steps_; }
+  // How many steps run on a device.
+  size_t DeviceSteps() const;
 
  private:
   std::vector<ChainStep> steps_;
-  std::vector<NLEComPtr<INLECGFilter>> filters_;
-  std::vector<cv::Mat> scratch_;  // the results of all steps but the last
+  std::vector<NLEComPtr<INLECGFilter>> filters_;            // null for a step on the device
+  std::vector<std::unique_ptr<OpenCLFilterRun>> onDevice_;  // null for a step on the CPU
+  std::vector<cv::Mat> scratch_;                            // the results of all steps but the last
   cv::Size prepared_;  // the frame size the filters were prepared for, empty before the first
   int32_t current_ = 0;
   int32_t total_ = 1;
