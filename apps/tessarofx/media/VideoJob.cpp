@@ -122,6 +122,20 @@ class BackgroundSource {
 
 }  // namespace
 
+namespace {
+
+bool IsOpaque(const cv::Mat& bgra) {
+  for (int y = 0; y < bgra.rows; ++y) {
+    const uint8_t* row = bgra.ptr<uint8_t>(y);
+    for (int x = 0; x < bgra.cols; ++x) {
+      if (row[4 * x + 3] != 255) return false;
+    }
+  }
+  return true;
+}
+
+}  // namespace
+
 bool IsStillImagePath(const std::string& path) {
   if (path.find('%') != std::string::npos) return false;
   const size_t dot = path.rfind('.');
@@ -158,15 +172,15 @@ Status RunVideoJob(const VideoJob& job, Reporter& reporter) {
   const bool makesAlpha = job.alpha && job.alpha(false);
   options.alpha = job.alpha && job.alpha(info.hasAlpha);
   Status opened = FromMedia(writer.Open(job.output, reader, options));
+  bool alphaDropped = false;  // the input's alpha, kept by the chain, not written
   if (!opened.ok() && options.alpha && !makesAlpha) {
     options.alpha = false;
     opened = FromMedia(writer.Open(job.output, reader, options));
-    if (opened.ok()) {
-      reporter.Warn(job.input + " has alpha, which " + job.output +
-                    " cannot hold with its codec: written without it");
-    }
+    alphaDropped = opened.ok();
   }
   if (!opened.ok()) return opened;
+  // Many BGRA clips are opaque throughout; only transparency that is lost deserves a word.
+  bool transparencyLost = false;
 
   InterruptGuard interrupt;
   const int64_t estimate = info.frameCountEstimate;
@@ -197,6 +211,7 @@ Status RunVideoJob(const VideoJob& job, Reporter& reporter) {
       },
       [&](Frame& frame) {
         const auto t = Stopwatch::Clock::now();
+        if (alphaDropped && !transparencyLost) transparencyLost = !IsOpaque(frame.video.bgra);
         Status s = FromMedia(writer.Write(frame.video));
         encode.Add(t);
         ++written;
@@ -220,6 +235,10 @@ Status RunVideoJob(const VideoJob& job, Reporter& reporter) {
   }
   encode.Add(t);
   reporter.Finish();
+  if (transparencyLost) {
+    reporter.Warn(job.input + " has transparent pixels, which " + job.output +
+                  " cannot hold with its codec: written without them");
+  }
   if (job.timings) {
     const double wall = std::chrono::duration<double>(Stopwatch::Clock::now() - started).count();
     char line[256];
