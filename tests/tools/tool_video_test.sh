@@ -2,7 +2,7 @@
 # The tool on clips, as a user runs it: every frame of a lossless result is the picture path's
 # result for that decoded frame; sound, timing and frame count survive; any number of threads
 # gives the same bytes; H.264 stays close to the lossless result; and every failure leaves
-# nothing at the target and names its cause.
+# nothing at the target and names its cause, a full disk included.
 #   tool_video_test.sh TOOL
 set -uo pipefail
 tool=$1
@@ -88,7 +88,7 @@ expect_failure() {  # expect_failure NAME PATTERN TARGET COMMAND...
   if [ $rc = 0 ]; then fail "$name: exit status 0"; return; fi
   grep -qi -- "$pattern" fail.log || { fail "$name: no message like '$pattern'"; cat fail.log; }
   [ ! -e "$target" ] || fail "$name: $target exists"
-  ls -a "$(dirname "$target")" | grep -q '\.tmp-' && fail "$name: a temporary file is left"
+  ls -a "$(dirname "$target")" 2>/dev/null | grep -q '\.tmp-' && fail "$name: a temporary file is left"
   echo "ok: $name"
 }
 ff -f lavfi -i "sine=d=0.3" sound.wav
@@ -101,8 +101,19 @@ if [ "$(id -u)" != 0 ]; then
   expect_failure "unwritable directory" "sealed" sealed/x4.mkv \
     "$tool" apply ColorAdjust clip.mkv sealed/x4.mkv
 fi
+expect_failure "missing output directory" "nowhere" nowhere/x6.mkv \
+  "$tool" apply ColorAdjust clip.mkv nowhere/x6.mkv
 expect_failure "a picture as the output of a clip" "clip" x5.png \
   "$tool" apply ColorAdjust clip.mkv x5.png
+# A full disk: a 64 KiB file system of its own, where mount namespaces are allowed.
+ff -f lavfi -i "testsrc2=s=320x240:r=25:d=2" -c:v libx264 -preset ultrafast mid.mp4
+mkdir -p tiny
+if unshare -m sh -c 'mount -t tmpfs -o size=64k tmpfs tiny' 2>/dev/null; then
+  unshare -m sh -c 'mount -t tmpfs -o size=64k tmpfs tiny && "$0" apply -q --codec ffv1 \
+    ColorAdjust mid.mp4 tiny/x7.mkv; echo "rc $?"; ls -A tiny' "$tool" >full.log 2>&1
+  grep -q "No space left" full.log && grep -q "rc 1" full.log && [ "$(tail -n 1 full.log)" = "rc 1" ] &&
+    ok "a full disk" || { fail "full disk"; cat full.log; }
+fi
 # Ctrl-C halfway: nothing at the target, no temporary file.
 ff -f lavfi -i "testsrc2=s=640x360:r=25:d=20" -c:v libx264 -preset ultrafast long.mp4
 "$tool" apply -q --threads 1 ColorAdjust -p u_exposure=10 long.mp4 cut.mp4 &
