@@ -48,6 +48,15 @@ done
 [ "$(times vfr.mkv)" = "$(times vfr-out.mkv)" ] && ok "variable frame rate kept" ||
   fail "VFR timestamps changed"
 
+# Rotation and colour tags survive (stream copy adds the rotation: the encoder option ignores it).
+ff -f lavfi -i "testsrc2=s=96x64:r=25:d=0.4" -c:v libx264 -preset ultrafast -pix_fmt yuv420p \
+  -color_primaries bt709 -color_trc bt709 -colorspace bt709 plain.mp4
+ff -i plain.mp4 -c copy -metadata:s:v:0 rotate=90 turned.mp4
+"$tool" apply -q ColorAdjust -p u_exposure=10 turned.mp4 turned-out.mp4
+tags() { ffprobe -v error -show_streams -select_streams v "$1" | grep -E '^(rotation|color_)'; }
+[ "$(tags turned-out.mp4)" = "$(tags turned.mp4)" ] && tags turned.mp4 | grep -q rotation=90 &&
+  ok "rotation and colour tags kept" || fail "rotation or colour tags changed"
+
 # Threads change nothing; H.264 stays within 40 dB of the lossless result.
 "$tool" apply -q "${chain[@]}" --codec ffv1 --threads 4 clip.mkv t4.mkv
 "$tool" apply -q "${chain[@]}" --codec ffv1 --threads 1 clip.mkv t1.mkv
