@@ -175,6 +175,7 @@ ColorAdjustPlan::ColorAdjustPlan(float e, float b, float c, float v, float s,
       sigma_(s / 100.0f) {
   hasTone_ = ComposeTone(e, b, c, tone_);
   if ((hasVibrance_ || hasSaturation_) && !Fuse()) {
+    centre_.clear();
     gain_.clear();
   }
 }
@@ -192,16 +193,32 @@ bool ColorAdjustPlan::Fuse() {
     if (TruncToInt(static_cast<float>(weight) * vibrance_) < -256) return false;
   }
   const bool increase = sigma_ >= 0.0f;
-  if (hasSaturation_ && increase) {
-    gain_.assign(256 * 256, 0.0f);
-    for (int mx = 1; mx < 256; ++mx) {
-      for (int mn = 0; mn < mx; ++mn) {
-        const SaturationSpread spread = SpreadOf(static_cast<float>(mx), static_cast<float>(mn));
-        const float sat =
-            spread.l < 0.5f ? spread.delta / spread.sum : spread.delta / (2.0f - spread.sum);
-        const float a = sat + sigma_ >= 1.0f ? 1.0f / sat - 1.0f : 1.0f / (1.0f - sigma_) - 1.0f;
-        if (!std::isfinite(a)) return false;
-        gain_[static_cast<size_t>(mx) * 256 + mn] = a;
+  if (hasSaturation_) {
+    centre_.assign(256 * 256, 0.0f);
+    gain_.assign(increase ? 256 * 256 : 0, 0.0f);
+    for (int mx = 0; mx < 256; ++mx) {
+      for (int mn = 0; mn <= mx; ++mn) {
+        // The pair after vibrance, which keeps the two channels largest and smallest.
+        const int luma = (mx + mn) >> 1;
+        const auto weight = static_cast<uint8_t>(-((mx - luma) >> 1));
+        const int k = TruncToInt(static_cast<float>(weight) * vibrance_);
+        const int top = MixChannel(mx, luma, k), bottom = MixChannel(mn, luma, k);
+        const size_t at = static_cast<size_t>(mx) * 256 + mn;
+        if (top == bottom) {
+          // A grey stays as it is: no gain, or the grey as the centre.
+          if (!increase) centre_[at] = static_cast<float>(top);
+          continue;
+        }
+        const SaturationSpread spread =
+            SpreadOf(static_cast<float>(top), static_cast<float>(bottom));
+        centre_[at] = spread.lv;
+        if (increase) {
+          const float sat =
+              spread.l < 0.5f ? spread.delta / spread.sum : spread.delta / (2.0f - spread.sum);
+          const float a = sat + sigma_ >= 1.0f ? 1.0f / sat - 1.0f : 1.0f / (1.0f - sigma_) - 1.0f;
+          if (!std::isfinite(a)) return false;
+          gain_[at] = a;
+        }
       }
     }
   }
@@ -209,6 +226,7 @@ bool ColorAdjustPlan::Fuse() {
              vibrance_,
              hasSaturation_,
              increase,
+             centre_.empty() ? nullptr : centre_.data(),
              gain_.empty() ? nullptr : gain_.data(),
              1.0f + sigma_};
   fused_ = true;

@@ -42,7 +42,7 @@ class ColorAdjustPlan {
   bool hasVibrance_, hasSaturation_;
   float vibrance_;  // the kernels' strength
   float sigma_;
-  std::vector<float> gain_;
+  std::vector<float> centre_, gain_;
   FusedColourTables tables_ = {};
   bool fused_ = false;
 };

@@ -10,15 +10,17 @@
 namespace tfx {
 
 // Exposure, brightness, contrast, vibrance and saturation in one pass, for settings where the tone
-// curve and vibrance keep the order of a pixel's channels: then saturation's gain depends on the
-// largest and smallest channel after vibrance alone, and comes from a table.
+// curve and vibrance keep the order of a pixel's channels: then what saturation derives from a
+// pixel depends on its largest and smallest channel after the curve alone, and comes from tables.
 struct FusedColourTables {
   const uint8_t* tone;  // 256 entries, or null for none
   float strength;       // vibrance's, with 255 * |strength| below 2^22 (0: none)
   bool saturate;
   bool increase;  // sigma >= 0
-  // Saturation's a at largest * 256 + smallest, for smallest <= largest (0 for a grey), when
-  // increasing; 1 + sigma when decreasing.
+  // By largest * 256 + smallest channel after the curve (entries with smallest <= largest), of
+  // the pixel after vibrance: saturation's l * 255 (for a grey when decreasing, the grey itself),
+  // and its a when increasing (0 for a grey); 1 + sigma when decreasing.
+  const float* centre;
   const float* gain;
   float fixedGain;
 };

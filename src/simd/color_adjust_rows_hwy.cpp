@@ -332,14 +332,13 @@ struct FusedColourVector {
   const FusedColourTables* t;
 
   HWY_INLINE VU operator()(VU raw) const {
-    const DU du;
     const DI di;
     const DF df;
     const VU p = kTone ? tone(raw) : raw;
     VI c0 = Channel0(p), c1 = Channel1(p), c2 = Channel2(p);
+    const VI mx = hn::Max(c0, hn::Max(c1, c2));
+    const VI mn = hn::Min(c0, hn::Min(c1, c2));
     if (t->strength != 0.0f) {
-      const VI mx = hn::Max(c0, hn::Max(c1, c2));
-      const VI mn = hn::Min(c0, hn::Min(c1, c2));
       const VI luma = hn::ShiftRight<1>(hn::Add(mx, mn));
       const VI weight = hn::And(hn::Neg(hn::ShiftRight<1>(hn::Sub(mx, luma))), hn::Set(di, 255));
       const VI k = SmallToInt(hn::Mul(hn::ConvertTo(df, weight), hn::Set(df, t->strength)));
@@ -348,21 +347,16 @@ struct FusedColourVector {
       c2 = MixChannelSmall(c2, luma, k);
     }
     if (!kSaturate) return Pack(p, c0, c1, c2);
-    const VI mx = hn::Max(c0, hn::Max(c1, c2));
-    const VI mn = hn::Min(c0, hn::Min(c1, c2));
-    const VF sum = DivideBy<255>(df, hn::ConvertTo(df, hn::Add(mx, mn)));
-    const VF lv = hn::Mul(sum, hn::Set(df, 127.5f));  // as in SaturationVector
-    const VF gain = kIncrease ? hn::GatherIndex(df, t->gain, hn::Or(hn::ShiftLeft<8>(mx), mn))
-                              : hn::Set(df, t->fixedGain);
+    const VI index = hn::Or(hn::ShiftLeft<8>(mx), mn);
+    const VF lv = hn::GatherIndex(df, t->centre, index);
+    const VF gain = kIncrease ? hn::GatherIndex(df, t->gain, index) : hn::Set(df, t->fixedGain);
     const auto channel = [&](VI c) {
       const VF f = hn::ConvertTo(df, c);
       const VF o = kIncrease ? hn::Add(f, hn::Mul(hn::Sub(f, lv), gain))
                              : hn::Add(lv, hn::Mul(hn::Sub(f, lv), gain));
       return ByteBits(ClampToByteRange<false>(o));
     };
-    const VU adjusted = PackByteBits(p, channel(c0), channel(c1), channel(c2));
-    if (kIncrease) return adjusted;  // a grey's gain is 0
-    return hn::IfThenElse(hn::RebindMask(du, hn::Eq(mx, mn)), Pack(p, c0, c1, c2), adjusted);
+    return PackByteBits(p, channel(c0), channel(c1), channel(c2));
   }
 };
 
