@@ -754,6 +754,8 @@ TEST_F(ToolTest, ApplyOpenCLRefusesOptionsThatDoNotFit) {
   } cases[] = {
       {"apply --opencl ColorAdjust in.png out.png",
        "ColorAdjust has no OpenCL class; see tessarofx list"},
+      {"apply --opencl -f ColorAdjust -f LightAdjust in.png out.png",
+       "none of the chain's filters has an OpenCL class"},
       {"apply --device 0 WhiteBalanceAdjust in.png out.png", "--device only goes with --opencl"},
       {"apply --kernels . WhiteBalanceAdjust in.png out.png", "--kernels only goes with --opencl"},
       {"apply --opencl -b in.png WhiteBalanceAdjust in.png out.png",
