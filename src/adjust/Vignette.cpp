@@ -156,6 +156,7 @@ void ForEachRun(const float* mask, size_t count, bool outsideByTable, F f) {
 void ApplyRun(uint8_t* row, RunKind kind, size_t start, size_t end, const float* mask,
               const VignetteBlend& blend) {
   uint8_t* px = row + 4 * start;
+  if (kind == RunKind::kInside && blend.insideUnchanged) return;
   if (kind == RunKind::kBlend) {
     blend.kernel->blendRun(px, mask, end - start, blend);
   } else {
@@ -180,10 +181,12 @@ VignetteBlend MakeVignetteBlend(float a, float e, float b, const VignetteKernel&
   p.outsideByTable = b == 0.0f && std::isfinite(outsideGain * 765.0f);
   // The gain lies between 1 + a and e for every g in [0, 1].
   p.zeroWeight = b == 0.0f && std::isfinite((std::fabs(1.0f + a) + std::fabs(e)) * 765.0f);
+  p.insideUnchanged = true;
   for (int v = 0; v < 256; ++v) {
     const uint8_t u = static_cast<uint8_t>(v);
     p.inside[v] = BlendPixel(tagRGBQUAD{u, u, u, 0}, 1.0f, a, e, b).rgbBlue;
     p.outside[v] = BlendPixel(tagRGBQUAD{u, u, u, 0}, 0.0f, a, e, b).rgbBlue;
+    p.insideUnchanged = p.insideUnchanged && p.inside[v] == u;
   }
   return p;
 }

@@ -27,8 +27,9 @@ struct VignetteBlend {
   float e;
   float b;
   const VignetteKernel* kernel;
-  uint8_t inside[256];  // g = 1: each channel times e alone
-  bool outsideByTable;  // g = 0 with a zero tone-curve weight
+  uint8_t inside[256];   // g = 1: each channel times e alone
+  bool insideUnchanged;  // that table is the identity (no exposure)
+  bool outsideByTable;   // g = 0 with a zero tone-curve weight
   // b = 0 and every scaled channel finite: the curve's weight is a signed zero for every g, and
   // w * v = 0 exactly.
   bool zeroWeight;
