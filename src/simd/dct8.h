@@ -23,10 +23,12 @@ void Dct8x8Columns(const float* rows, float* out);
 // The sliding 8 x 8 hard-threshold denoiser of one plane: every block position is transformed,
 // coefficients below `threshold` in magnitude are zeroed, and the inverse transforms covering a
 // pixel are averaged. Writes only the pixels that blocks cover, rows below height - 8 and columns
-// below width - 8; needs width and height of at least 9 and stride >= width. `dst` may be `src`.
-// False when the scratch cannot be allocated, with nothing written.
+// below width - 8; needs width and height of at least 9. Samples along a row are `step` bytes
+// apart (one channel of interleaved pixels), rows `stride`; `dst` may be `src`, and with a step
+// above 1 the bytes between a plane's samples are neither read nor written. False when the
+// scratch cannot be allocated, with nothing written.
 bool DctDenoisePlane(const uint8_t* src, uint8_t* dst, int width, int height, ptrdiff_t stride,
-                     float threshold);
+                     float threshold, size_t step = 1);
 
 // The instruction set the kernels above would run now, as Highway names it.
 const char* Dct8Target();

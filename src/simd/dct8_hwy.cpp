@@ -13,6 +13,7 @@
 #undef HWY_TARGET_INCLUDE
 #define HWY_TARGET_INCLUDE "simd/dct8_hwy.cpp"
 #include <hwy/foreach_target.h>  // IWYU pragma: keep
+#include <hwy/cache_control.h>
 #include <hwy/highway.h>
 
 HWY_BEFORE_NAMESPACE();
@@ -122,32 +123,24 @@ void Transpose(const float* in, float* out) {
 // Block (x, y) covers columns x..x+7 and rows y..y+7. Its 2-D transform is the row transform of
 // its 8 rows, then the column transform; the inverse is the reverse. Two facts make the sliding
 // window cheap:
-//  - For one x, every block shares the row transforms of the 8 columns x..x+7, so those are done
-//    once per row (a strip), not once per block.
+//  - Every block of one x shares the row transforms of columns x..x+7, so the transform of each
+//    pixel row at x is done once, not once per block.
 //  - The inverse row transform is linear and the same for every block of that x, so each block
-//    only undoes its column transform; the rows of all blocks over a strip row are summed, still
-//    in the row-frequency domain, and the inverse row transform runs once per strip row.
-// Everything is held column-major (one array per column or frequency), and vectors run down a
-// column: one lane per row, or per block of a group of consecutive blocks.
+//    only undoes its column transform; the rows of all blocks over a pixel row are summed, still
+//    in the row-frequency domain, and the inverse row transform runs once per pixel row and x.
+// The float additions keep one order on every target: row p of block column x sums row p - y of
+// blocks y = p - 7 .. p in increasing y, and pixel (c, p) adds the inverse row transforms of
+// block columns x = c - 7 .. c to zero in increasing x.
 //
-// A block's rows are not added into the strip as the block is done: adding row i of the blocks
-// of a group into a running sum would load each vector one float after a store it overlaps, which
-// store forwarding cannot serve. Row i of every block is kept instead (in an array per i and
-// frequency, indexed by block), and strip row p later sums row i of block p - i for i from 7 down
-// to 0: its blocks in increasing y, the same additions in the same order on every target.
-//
-// A group may reach past the last block of a band. Such blocks read rows below the band (zeros,
-// or an earlier band's: finite either way) and reach only rows past the band's last block,
-// which are never written; rows above the first block read zeros before it.
+// Vectors run along a row, one lane per block column, and the plane is walked down in tiles of
+// kTileBlocks block columns, so that a tile's rolling state (the row transforms of 8 rows and the
+// block-row sums of 8 rows) stays in the first-level cache. The last 7 pixels a tile reaches
+// also take blocks of the next tile: their sums so far are carried, one set per row, and the
+// next tile adds its terms to them. A tile writes only pixels left of its last block column and
+// reads only from its first block column on, so the output may overwrite the source.
 //
 // The weight of a pixel is the number of blocks covering it, (min(y, 7) + 1) * (min(x, 7) + 1)
 // for every pixel the output takes from the blocks; it is formed exactly instead of counted.
-//
-// The plane is done in bands of block rows, so that the scratch and the rows a band walks down
-// stay in the second-level cache on large planes. A band also transforms the 7 block rows above
-// its first output row, so each of its rows sees all of its blocks: a pixel's arithmetic does
-// not depend on the band it falls in. Those 7 rows of the source are saved before the band above
-// writes over them, for a plane denoised in place.
 
 using DF = hn::ScalableTag<float>;
 using VF = hn::Vec<DF>;
@@ -155,137 +148,177 @@ using VF = hn::Vec<DF>;
 // Enough for aligned loads of the widest vector.
 constexpr size_t kAlignment = 64;
 
+// Block columns per tile, a multiple of every vector length.
+constexpr size_t kTileBlocks = 64;
+// Where block column `first` of a tile row of terms starts: past 7 zeros, on a vector boundary.
+constexpr size_t kLead = 16;
+// A tile row with the columns before and after its blocks, and the widest vector past them.
+constexpr size_t kRowFloats = kTileBlocks + 48;
+// Pixels whose sums pass from one tile to the next.
+constexpr size_t kCarried = 7;
+
 size_t RoundUp(size_t n, size_t step) { return (n + step - 1) / step * step; }
 
-// Block rows per band, the 7 it shares with the band above included.
-constexpr int kBandBlocks = 256;
-
-struct Strips {
-  size_t pitch;       // floats per column array, a multiple of the vector length
-  size_t blockPitch;  // floats per block-row array, zeros before its first block included
-  float* columns;     // 8 source columns as floats, column c in slot c % 8
-  float* rows;        // the row transforms: frequency k of every row
-  float* blockRows;   // row i, frequency k of every block at (i * 8 + k) * blockPitch, block 0
-                      // blockPitch - pitch floats in
-  float* outputs;     // 8 output columns, column c in slot c % 8, summed over x
-  uint8_t* bytes;     // one finished output column
-
-  float* BlockRow(size_t i, size_t k) const {
-    return blockRows + (i * 8 + k + 1) * blockPitch - pitch;
-  }
+struct Scratch {
+  float* transforms;  // row r's transform at (r % 8 * 8 + k) * kTileBlocks, frequency k
+  float* sums;        // row r's block-row sums, laid out as the transforms
+  // Two of each, for consecutive rows: a row's floats are stored one step before they are read
+  // at other offsets, since a load that straddles stores still in flight waits for them.
+  float* terms[2];  // term j of block column x at j * kRowFloats + x - first + kLead, zeros around
+  float* samples[2];  // a row's samples from column `first`
+  float* partial;     // sums carried into the tile's first 7 pixels, zeros after
+  float* totals;      // the sums of one row's pixels, from column `first`
+  float* columnWeight;
+  uint8_t* bytes;
+  float* carried;  // kCarried per block row; null with a single tile, whose partial sums are 0
 };
 
-// Rows of the plane seen by one band: band row 0 is plane row `top`.
-struct Band {
-  const uint8_t* src;  // band row 0
-  uint8_t* dst;        // band row 0
+// One 8-bit plane, samples `step` bytes apart along a row.
+struct Plane {
+  const uint8_t* src;
+  uint8_t* dst;
   ptrdiff_t stride;
-  const uint8_t* saved;  // band rows 0..savedRows-1 as they were before the band above, packed
-  int savedRows;
-  int height;    // rows read: those of its blocks, blocks + 7
-  int blocks;    // block rows
-  int firstOut;  // the rows written, [firstOut, blocks)
-  size_t top;
+  size_t step;
 };
 
-void LoadColumn(const Band& band, int width, int column, float* out) {
-  for (int y = 0; y < band.savedRows; ++y) {
-    out[y] = band.saved[static_cast<size_t>(y) * width + column];
+// A tile reads a few bytes of each row, far apart: the rows it reads next are fetched ahead.
+constexpr ptrdiff_t kPrefetchRows = 6;
+
+void LoadSamples(const Plane& plane, size_t row, size_t rows, size_t first, size_t count,
+                 float* out) {
+  const uint8_t* p = plane.src + static_cast<ptrdiff_t>(row) * plane.stride + first * plane.step;
+  if (row + kPrefetchRows < rows) {
+    const uint8_t* ahead = p + kPrefetchRows * plane.stride;
+    for (size_t i = 0; i < count * plane.step; i += 64) hwy::Prefetch(ahead + i);
+    hwy::Prefetch(ahead + (count - 1) * plane.step);
   }
-  const uint8_t* p = band.src + band.savedRows * band.stride + column;
-  for (int y = band.savedRows; y < band.height; ++y, p += band.stride) out[y] = *p;
+  size_t i = 0;
+  if (plane.step == 1) {
+    const DF d;
+    const hn::RebindToSigned<DF> di;
+    const hn::Rebind<uint8_t, DF> d8;
+    for (; i + hn::Lanes(d) <= count; i += hn::Lanes(d)) {
+      hn::Store(hn::ConvertTo(d, hn::PromoteTo(di, hn::LoadU(d8, p + i))), d, out + i);
+    }
+  }
+  for (; i < count; ++i) out[i] = p[i * plane.step];
 }
 
-// The forward row transform of every strip row, columns x..x+7 being in the slots.
-void RowTransforms(const Strips& s, size_t x, size_t end) {
+// The forward row transform of `samples` into transform slot `slot`.
+void RowTransforms(const Scratch& s, const float* samples, size_t slot, size_t tile) {
   const DF d;
-  for (size_t y = 0; y < end; y += hn::Lanes(d)) {
-    VF in[8], out[8];
-    for (size_t n = 0; n < 8; ++n) in[n] = hn::Load(d, s.columns + ((x + n) & 7) * s.pitch + y);
-    Forward(d, in, out);
-    for (size_t k = 0; k < 8; ++k) hn::Store(out[k], d, s.rows + k * s.pitch + y);
+  float* out = s.transforms + slot * 8 * kTileBlocks;
+  for (size_t x = 0; x < tile; x += hn::Lanes(d)) {
+    VF in[8], X[8];
+    for (size_t n = 0; n < 8; ++n) in[n] = hn::LoadU(d, samples + x + n);
+    Forward(d, in, X);
+    for (size_t k = 0; k < 8; ++k) hn::Store(X[k], d, out + k * kTileBlocks + x);
   }
 }
 
-// Every block of this x: column transform, threshold, inverse column transform.
-void Blocks(const Strips& s, size_t groupEnd, float threshold) {
+// Block row y: column transform, threshold, inverse column transform; row i of each block
+// starts the sums of row y + 7 and is added to those of rows y..y+6.
+void Blocks(const Scratch& s, size_t y, size_t tile, float threshold) {
   const DF d;
   const VF t = hn::Set(d, threshold);
-  for (size_t y0 = 0; y0 < groupEnd; y0 += hn::Lanes(d)) {
-    for (size_t k = 0; k < 8; ++k) {
-      const float* rows = s.rows + k * s.pitch + y0;
+  const float* rows[8];
+  float* sums[8];
+  for (size_t i = 0; i < 8; ++i) {
+    rows[i] = s.transforms + (y + i) % 8 * 8 * kTileBlocks;
+    sums[i] = s.sums + (y + i) % 8 * 8 * kTileBlocks;
+  }
+  for (size_t x = 0; x < tile; x += hn::Lanes(d)) {
+    for (size_t k = 0; k < 8 * kTileBlocks; k += kTileBlocks) {
       VF in[8], coefficients[8], out[8];
-      for (size_t i = 0; i < 8; ++i) in[i] = hn::LoadU(d, rows + i);
+      for (size_t i = 0; i < 8; ++i) in[i] = hn::Load(d, rows[i] + k + x);
       Forward(d, in, coefficients);
       for (size_t j = 0; j < 8; ++j) {
         coefficients[j] = hn::IfThenZeroElse(hn::Lt(hn::Abs(coefficients[j]), t), coefficients[j]);
       }
       Inverse(d, coefficients, out);
-      for (size_t i = 0; i < 8; ++i) hn::Store(out[i], d, s.BlockRow(i, k) + y0);
+      hn::Store(out[7], d, sums[7] + k + x);
+      for (size_t i = 0; i < 7; ++i) {
+        hn::Store(hn::Add(hn::Load(d, sums[i] + k + x), out[i]), d, sums[i] + k + x);
+      }
     }
   }
 }
 
-// Each strip row sums its blocks' rows, and the inverse row transform of the sums is added to
-// output columns x..x+7.
-void InverseRows(const Strips& s, size_t x, size_t groupEnd) {
+// The inverse row transform of row y's sums, term j of block column x going to pixel x + j.
+void InverseRows(const Scratch& s, size_t y, size_t tile) {
+  float* terms = s.terms[y % 2];
   const DF d;
-  for (size_t y = 0; y < groupEnd; y += hn::Lanes(d)) {
+  const float* sums = s.sums + y % 8 * 8 * kTileBlocks;
+  for (size_t x = 0; x < tile; x += hn::Lanes(d)) {
     VF in[8], out[8];
-    for (size_t k = 0; k < 8; ++k) {
-      in[k] = hn::LoadU(d, s.BlockRow(7, k) + y - 7);
-      for (size_t i = 7; i-- > 0;) in[k] = hn::Add(in[k], hn::LoadU(d, s.BlockRow(i, k) + y - i));
-    }
+    for (size_t k = 0; k < 8; ++k) in[k] = hn::Load(d, sums + k * kTileBlocks + x);
     Inverse(d, in, out);
-    for (size_t j = 0; j < 8; ++j) {
-      float* column = s.outputs + ((x + j) & 7) * s.pitch + y;
-      hn::Store(hn::Add(hn::Load(d, column), out[j]), d, column);
-    }
+    for (size_t j = 0; j < 8; ++j) hn::Store(out[j], d, terms + j * kRowFloats + kLead + x);
+  }
+  // Lanes past the tile's blocks: no block there.
+  for (size_t j = 0; j < 8; ++j) {
+    std::fill(terms + j * kRowFloats + kLead + tile,
+              terms + j * kRowFloats + kLead + RoundUp(tile, hn::Lanes(d)), 0.0f);
   }
 }
 
-// Output column x, now complete: the average, truncated into 0..255, in the band's output rows;
-// the column's slot is cleared for column x + 8.
-void FinishColumn(const Strips& s, const Band& band, size_t x, size_t groupEnd) {
+// Row y's pixels from `first` on: the carried sums plus the terms of the tile's block columns,
+// then the average, truncated into 0..255, for the tile's own pixels.
+void FinishRow(const Scratch& s, size_t y, size_t tile) {
+  const float* terms = s.terms[y % 2];
   const DF d;
   const hn::RebindToSigned<DF> di;
   const hn::Rebind<uint8_t, DF> d8;
-  float* column = s.outputs + (x & 7) * s.pitch;
-  const VF columnWeight = hn::Set(d, static_cast<float>(std::min<size_t>(x, 7) + 1));
-  const VF seven = hn::Set(d, 7.0f), one = hn::Set(d, 1.0f);
+  const VF rowWeight = hn::Set(d, static_cast<float>(std::min<size_t>(y, 7) + 1));
   const VF zero = hn::Zero(d), top = hn::Set(d, 255.0f);
-  for (size_t y = 0; y < groupEnd; y += hn::Lanes(d)) {
-    // Rows past 2^24 round, but stay above 7.
-    const VF planeRow = hn::Iota(d, static_cast<float>(band.top + y));
-    const VF rowWeight = hn::Add(hn::Min(planeRow, seven), one);
-    const VF mean = hn::Div(hn::Load(d, column + y), hn::Mul(rowWeight, columnWeight));
+  for (size_t u = 0; u < tile + kCarried; u += hn::Lanes(d)) {
+    VF sum = hn::Load(d, s.partial + u);
+    for (size_t j = 8; j-- > 0;)
+      sum = hn::Add(sum, hn::LoadU(d, terms + j * kRowFloats + kLead + u - j));
+    hn::Store(sum, d, s.totals + u);
+    const VF mean = hn::Div(sum, hn::Mul(rowWeight, hn::Load(d, s.columnWeight + u)));
     const VF clamped = hn::Min(hn::Max(mean, zero), top);
-    hn::StoreU(hn::DemoteTo(d8, hn::ConvertTo(di, clamped)), d8, s.bytes + y);
-    hn::Store(zero, d, column + y);
+    hn::StoreU(hn::DemoteTo(d8, hn::ConvertTo(di, clamped)), d8, s.bytes + u);
   }
-  uint8_t* p = band.dst + band.firstOut * band.stride + x;
-  for (int y = band.firstOut; y < band.blocks; ++y, p += band.stride) *p = s.bytes[y];
 }
 
-void DenoiseBand(const Strips& s, const Band& band, int width, float threshold) {
-  const size_t lanes = hn::Lanes(DF());
-  const size_t groupEnd = RoundUp(static_cast<size_t>(band.blocks), lanes);
-  // The last group reads 7 rows past its end.
-  const size_t rowsEnd = groupEnd + RoundUp(8, lanes);
-  std::fill(s.outputs, s.outputs + 8 * s.pitch, 0.0f);
-  for (int column = 0; column < 8; ++column) {
-    LoadColumn(band, width, column, s.columns + column * s.pitch);
+// Row y's sums, averages and output bytes, the sums of its next 7 pixels carried.
+void WriteRow(const Scratch& s, const Plane& plane, size_t first, size_t y, size_t tile) {
+  float* carried = s.carried ? s.carried + y * kCarried : nullptr;
+  if (carried) std::copy(carried, carried + kCarried, s.partial);
+  FinishRow(s, y, tile);
+  if (carried) std::copy(s.totals + tile, s.totals + tile + kCarried, carried);
+  uint8_t* out = plane.dst + static_cast<ptrdiff_t>(y) * plane.stride + first * plane.step;
+  if (plane.step == 1) {
+    std::memcpy(out, s.bytes, tile);
+  } else {
+    for (size_t u = 0; u < tile; ++u) out[u * plane.step] = s.bytes[u];
   }
-  for (size_t x = 0; x < static_cast<size_t>(width - 8); ++x) {
-    if (x > 0) {
-      LoadColumn(band, width, static_cast<int>(x + 7), s.columns + ((x + 7) & 7) * s.pitch);
-    }
-    RowTransforms(s, x, rowsEnd);
-    Blocks(s, groupEnd, threshold);
-    InverseRows(s, x, groupEnd);
-    // Column x is read no more (the next load is x + 8), so dst may be src.
-    FinishColumn(s, band, x, groupEnd);
+}
+
+// Row y is written a step late, once block row y + 1 is done: still before anything reads a
+// row below y + 8, and it lets the stores of each step settle before the next step reads them.
+void DenoiseTile(const Scratch& s, const Plane& plane, size_t first, size_t tile, size_t blockRows,
+                 float threshold) {
+  const size_t rows = blockRows + 8;
+  std::fill(s.terms[0], s.terms[0] + 16 * kRowFloats, 0.0f);
+  std::fill(s.sums, s.sums + 64 * kTileBlocks, 0.0f);
+  for (size_t u = 0; u < kRowFloats; ++u) {
+    s.columnWeight[u] = static_cast<float>(std::min<size_t>(first + u, 7) + 1);
   }
+  LoadSamples(plane, 0, rows, first, tile + 7, s.samples[0]);
+  for (size_t row = 0; row < 7; ++row) {
+    LoadSamples(plane, row + 1, rows, first, tile + 7, s.samples[(row + 1) % 2]);
+    RowTransforms(s, s.samples[row % 2], row, tile);
+  }
+  for (size_t y = 0; y < blockRows; ++y) {
+    RowTransforms(s, s.samples[(y + 7) % 2], (y + 7) % 8, tile);
+    if (y + 1 < blockRows) LoadSamples(plane, y + 8, rows, first, tile + 7, s.samples[y % 2]);
+    Blocks(s, y, tile, threshold);
+    if (y > 0) WriteRow(s, plane, first, y - 1, tile);
+    InverseRows(s, y, tile);
+  }
+  WriteRow(s, plane, first, blockRows - 1, tile);
 }
 
 }  // namespace
@@ -311,49 +344,27 @@ void Dct8x8OfTarget(const float* in, float* out, bool inverse) {
 void Dct8x8ColumnsOfTarget(const float* rows, float* out) { Columns(rows, out, false); }
 
 bool DctDenoisePlaneOfTarget(const uint8_t* src, uint8_t* dst, int width, int height,
-                             ptrdiff_t stride, float threshold) {
-  const size_t lanes = hn::Lanes(DF());
-  const int blocks = height - 8;
-  const size_t pitch =
-      RoundUp(static_cast<size_t>(std::min(blocks, kBandBlocks)), lanes) + RoundUp(8, lanes);
-  const size_t blockPitch = pitch + RoundUp(8, lanes);
-  const size_t savedBytes = 7 * static_cast<size_t>(width);
-  const size_t floats =
-      24 * pitch + 64 * blockPitch + (pitch + 2 * savedBytes + sizeof(float) - 1) / sizeof(float);
+                             ptrdiff_t stride, float threshold, size_t step) {
+  const size_t blockColumns = static_cast<size_t>(width) - 8;
+  const size_t blockRows = static_cast<size_t>(height) - 8;
+  // Only planes of more than one tile carry sums.
+  const size_t carried = blockColumns > kTileBlocks ? kCarried * blockRows : 0;
+  const size_t floats = 128 * kTileBlocks + 22 * kRowFloats + carried;
   float* scratch = new (std::align_val_t(kAlignment), std::nothrow) float[floats]();  // zero-filled
   if (!scratch) return false;
-  uint8_t* bytes = reinterpret_cast<uint8_t*>(scratch + 24 * pitch + 64 * blockPitch);
-  const Strips s{pitch,
-                 blockPitch,
-                 scratch,
-                 scratch + 8 * pitch,
-                 scratch + 16 * pitch,
-                 scratch + 16 * pitch + 64 * blockPitch,
-                 bytes};
-  uint8_t* above = bytes + pitch;
-  uint8_t* below = above + savedBytes;
-
-  for (int first = 0, out = 0; out < blocks;) {
-    // Compared as a distance: first + kBandBlocks overflows on planes near INT_MAX rows.
-    const int end = blocks - first > kBandBlocks ? first + kBandBlocks : blocks;
-    const Band band{src + first * stride,
-                    dst + first * stride,
-                    stride,
-                    above,
-                    out - first,
-                    end - first + 7,
-                    end - first,
-                    out - first,
-                    static_cast<size_t>(first)};
-    if (end < blocks) {
-      for (int y = 0; y < 7; ++y) {
-        std::memcpy(below + static_cast<size_t>(y) * width, src + (end - 7 + y) * stride, width);
-      }
-    }
-    DenoiseBand(s, band, width, threshold);
-    std::swap(above, below);
-    out = end;
-    first = end - 7;
+  float* rows = scratch + 128 * kTileBlocks;
+  const Scratch s{scratch,
+                  scratch + 64 * kTileBlocks,
+                  {rows, rows + 8 * kRowFloats},
+                  {rows + 16 * kRowFloats, rows + 17 * kRowFloats},
+                  rows + 18 * kRowFloats,
+                  rows + 19 * kRowFloats,
+                  rows + 20 * kRowFloats,
+                  reinterpret_cast<uint8_t*>(rows + 21 * kRowFloats),
+                  carried ? rows + 22 * kRowFloats : nullptr};
+  const Plane plane{src, dst, stride, step};
+  for (size_t first = 0; first < blockColumns; first += kTileBlocks) {
+    DenoiseTile(s, plane, first, std::min(kTileBlocks, blockColumns - first), blockRows, threshold);
   }
   ::operator delete[](scratch, std::align_val_t(kAlignment));
   return true;
@@ -387,8 +398,9 @@ void Dct8x8Columns(const float* rows, float* out) {
 }
 
 bool DctDenoisePlane(const uint8_t* src, uint8_t* dst, int width, int height, ptrdiff_t stride,
-                     float threshold) {
-  return HWY_DYNAMIC_DISPATCH(DctDenoisePlaneOfTarget)(src, dst, width, height, stride, threshold);
+                     float threshold, size_t step) {
+  return HWY_DYNAMIC_DISPATCH(DctDenoisePlaneOfTarget)(src, dst, width, height, stride, threshold,
+                                                       step);
 }
 
 const char* Dct8Target() { return HWY_DYNAMIC_DISPATCH(Dct8TargetOfThisTarget)(); }
