@@ -1,11 +1,14 @@
 // The sliding 8 x 8 DCT denoiser and its colour forms. The transforms themselves live in
-// simd/dct8_hwy.cpp; this file checks arguments, keeps the unfiltered border and splits images
-// into planes.
+// simd/dct8_hwy.cpp; this file checks arguments, keeps the unfiltered border and filters the
+// colour planes of images where they lie, or splits images into planes.
 #include <cstdint>
 #include <cstring>
+#include <memory>
+#include <new>
 
 #include "base/ByteLimits.h"
 #include "simd/dct8.h"
+#include "simd/hsl_rows.h"
 #include "tessarofx/Denoise.h"
 
 void DCT8X81D(const float* in, float* out, bool inverse) {
@@ -62,9 +65,60 @@ bool Denoisable(const CxImage* image) {
   return padded * height <= image->GetSize();
 }
 
+// Pixels of 3 or 4 bytes in the order the header names, in rows as Create pads them: splitting
+// such an image into planes and recombining them changes nothing but the planes' bytes.
+bool Interleaved(const CxImage* image) {
+  const uint32_t bpp = image->GetBpp();
+  const _ImagePixelFormat format = image->getFormat();
+  const bool order =
+      bpp == 32 ? format == IPF_BGRA || format == IPF_RGBA : format == IPF_BGR || format == IPF_RGB;
+  const uint64_t padded = ((uint64_t{bpp} * image->GetWidth() + 31) >> 3) & ~uint64_t{3};
+  return order && image->GetEffWidth() == padded;
+}
+
+// What splitting, denoising and recombining the planes gives such an image, without the
+// planes: the colour bytes are filtered where they lie, or turned into hue, saturation and
+// lightness triples, filtered there and turned back. Alpha and row padding are not touched.
+// False when memory runs out, with the image untouched.
+bool DenoiseInterleaved(CxImage* image, float sigma, bool hsl) {
+  const int width = static_cast<int>(image->GetWidth());
+  const int height = static_cast<int>(image->GetHeight());
+  const size_t bytesPerPixel = image->GetBpp() / 8;
+  const ptrdiff_t stride = image->GetEffWidth();
+  // As dct_Denosing forms it.
+  const float threshold = 3.0f * sigma;
+  const bool blocks = width > 8 && height > 8;
+  uint8_t* bits = image->GetBits();
+  if (!hsl) {
+    return !blocks ||
+           tfx::DctDenoisePlane(bits, bits, width, height, stride, threshold, bytesPerPixel, 3);
+  }
+  const bool redFirst = image->getFormat() == IPF_RGBA || image->getFormat() == IPF_RGB;
+  const size_t row = 3 * static_cast<size_t>(width);
+  const std::unique_ptr<uint8_t[]> triples(new (std::nothrow) uint8_t[row * height]);
+  if (!triples) return false;
+  for (int y = 0; y < height; ++y) {
+    tfx::RgbToHslRow(bits + y * stride, bytesPerPixel, redFirst, &triples[y * row], width);
+  }
+  if (blocks && !tfx::DctDenoisePlane(triples.get(), triples.get(), width, height,
+                                      static_cast<ptrdiff_t>(row), threshold, 3, 3)) {
+    return false;
+  }
+  for (int y = 0; y < height; ++y) {
+    tfx::HslToRgbRow(&triples[y * row], bits + y * stride, bytesPerPixel, redFirst, width);
+  }
+  return true;
+}
+
 // Splits `image` into three planes (and alpha), denoises the three, and recombines them.
 CxImage* DenoisePlanes(CxImage* image, float strength, bool hsl) {
   if (!Denoisable(image) || strength == 0.0f) return image;
+  // The product is formed in double, as the strength scale is a double constant.
+  const float sigma = static_cast<float>(strength * 0.15);
+  if (Interleaved(image)) {
+    DenoiseInterleaved(image, sigma, hsl);
+    return image;
+  }
   const unsigned width = image->GetWidth(), height = image->GetHeight();
   CxImage planes[4];
   for (CxImage& plane : planes) {
@@ -73,8 +127,6 @@ CxImage* DenoisePlanes(CxImage* image, float strength, bool hsl) {
   const bool split = hsl ? image->SplitHSLA(&planes[0], &planes[1], &planes[2], &planes[3])
                          : image->SplitRGBA(&planes[0], &planes[1], &planes[2], &planes[3]);
   if (!split) return image;
-  // The product is formed in double, as the strength scale is a double constant.
-  const float sigma = static_cast<float>(strength * 0.15);
   const int stride = static_cast<int>(planes[0].GetEffWidth());
   for (int i = 0; i < 3; ++i) {
     uint8_t* bits = planes[i].GetBits();

@@ -24,11 +24,11 @@ void Dct8x8Columns(const float* rows, float* out);
 // coefficients below `threshold` in magnitude are zeroed, and the inverse transforms covering a
 // pixel are averaged. Writes only the pixels that blocks cover, rows below height - 8 and columns
 // below width - 8; needs width and height of at least 9. Samples along a row are `step` bytes
-// apart (one channel of interleaved pixels), rows `stride`; `dst` may be `src`, and with a step
-// above 1 the bytes between a plane's samples are neither read nor written. False when the
-// scratch cannot be allocated, with nothing written.
+// apart, rows `stride`; `dst` may be `src`. With `channels`, that many interleaved planes are
+// denoised, starting at byte 0, 1, ... of each `step`; other bytes are neither read nor written.
+// False when the scratch cannot be allocated, with nothing written.
 bool DctDenoisePlane(const uint8_t* src, uint8_t* dst, int width, int height, ptrdiff_t stride,
-                     float threshold, size_t step = 1);
+                     float threshold, size_t step = 1, size_t channels = 1);
 
 // The instruction set the kernels above would run now, as Highway names it.
 const char* Dct8Target();

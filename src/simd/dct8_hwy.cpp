@@ -12,8 +12,8 @@
 
 #undef HWY_TARGET_INCLUDE
 #define HWY_TARGET_INCLUDE "simd/dct8_hwy.cpp"
-#include <hwy/foreach_target.h>  // IWYU pragma: keep
 #include <hwy/cache_control.h>
+#include <hwy/foreach_target.h>  // IWYU pragma: keep
 #include <hwy/highway.h>
 
 HWY_BEFORE_NAMESPACE();
@@ -179,7 +179,15 @@ struct Plane {
   uint8_t* dst;
   ptrdiff_t stride;
   size_t step;
+  size_t channel;  // the byte of a 4-byte step the samples are
 };
+
+// 4-byte pixels go through 32-bit lanes, the plane's byte being bits 8 channel up (x86 and
+// every other target here are little-endian).
+#if HWY_TARGET != HWY_SCALAR
+using DU = hn::RebindToUnsigned<DF>;
+using DPixelBytes = hn::Repartition<uint8_t, DU>;
+#endif
 
 // A tile reads a few bytes of each row, far apart: the rows it reads next are fetched ahead.
 constexpr ptrdiff_t kPrefetchRows = 6;
@@ -193,14 +201,27 @@ void LoadSamples(const Plane& plane, size_t row, size_t rows, size_t first, size
     hwy::Prefetch(ahead + (count - 1) * plane.step);
   }
   size_t i = 0;
+  const DF d;
+  const hn::RebindToSigned<DF> di;
   if (plane.step == 1) {
-    const DF d;
-    const hn::RebindToSigned<DF> di;
     const hn::Rebind<uint8_t, DF> d8;
     for (; i + hn::Lanes(d) <= count; i += hn::Lanes(d)) {
       hn::Store(hn::ConvertTo(d, hn::PromoteTo(di, hn::LoadU(d8, p + i))), d, out + i);
     }
   }
+#if HWY_TARGET != HWY_SCALAR
+  if (plane.step == 4) {
+    const DU du;
+    const DPixelBytes d8;
+    const auto low = hn::Set(du, 0xFF);
+    const int shift = static_cast<int>(8 * plane.channel);
+    for (; i + hn::Lanes(d) <= count; i += hn::Lanes(d)) {
+      const auto pixels = hn::BitCast(du, hn::LoadU(d8, p - plane.channel + 4 * i));
+      const auto samples = hn::And(hn::ShiftRightSame(pixels, shift), low);
+      hn::Store(hn::ConvertTo(d, hn::BitCast(di, samples)), d, out + i);
+    }
+  }
+#endif
   for (; i < count; ++i) out[i] = p[i * plane.step];
 }
 
@@ -291,9 +312,26 @@ void WriteRow(const Scratch& s, const Plane& plane, size_t first, size_t y, size
   uint8_t* out = plane.dst + static_cast<ptrdiff_t>(y) * plane.stride + first * plane.step;
   if (plane.step == 1) {
     std::memcpy(out, s.bytes, tile);
-  } else {
-    for (size_t u = 0; u < tile; ++u) out[u * plane.step] = s.bytes[u];
+    return;
   }
+  size_t u = 0;
+#if HWY_TARGET != HWY_SCALAR
+  if (plane.step == 4) {
+    const DU du;
+    const DPixelBytes d8;
+    const hn::Rebind<uint8_t, DU> dBytes;
+    const int shift = static_cast<int>(8 * plane.channel);
+    const auto others = hn::Set(du, ~(0xFFu << shift));
+    for (; u + hn::Lanes(du) <= tile; u += hn::Lanes(du)) {
+      uint8_t* pixels = out - plane.channel + 4 * u;
+      const auto kept = hn::And(hn::BitCast(du, hn::LoadU(d8, pixels)), others);
+      const auto sample =
+          hn::ShiftLeftSame(hn::PromoteTo(du, hn::LoadU(dBytes, s.bytes + u)), shift);
+      hn::StoreU(hn::BitCast(d8, hn::Or(kept, sample)), d8, pixels);
+    }
+  }
+#endif
+  for (; u < tile; ++u) out[u * plane.step] = s.bytes[u];
 }
 
 // Row y is written a step late, once block row y + 1 is done: still before anything reads a
@@ -344,7 +382,7 @@ void Dct8x8OfTarget(const float* in, float* out, bool inverse) {
 void Dct8x8ColumnsOfTarget(const float* rows, float* out) { Columns(rows, out, false); }
 
 bool DctDenoisePlaneOfTarget(const uint8_t* src, uint8_t* dst, int width, int height,
-                             ptrdiff_t stride, float threshold, size_t step) {
+                             ptrdiff_t stride, float threshold, size_t step, size_t channels) {
   const size_t blockColumns = static_cast<size_t>(width) - 8;
   const size_t blockRows = static_cast<size_t>(height) - 8;
   // Only planes of more than one tile carry sums.
@@ -362,9 +400,13 @@ bool DctDenoisePlaneOfTarget(const uint8_t* src, uint8_t* dst, int width, int he
                   rows + 20 * kRowFloats,
                   reinterpret_cast<uint8_t*>(rows + 21 * kRowFloats),
                   carried ? rows + 22 * kRowFloats : nullptr};
-  const Plane plane{src, dst, stride, step};
-  for (size_t first = 0; first < blockColumns; first += kTileBlocks) {
-    DenoiseTile(s, plane, first, std::min(kTileBlocks, blockColumns - first), blockRows, threshold);
+  for (size_t channel = 0; channel < channels; ++channel) {
+    const Plane plane{src + channel, dst + channel, stride, step, channel};
+    if (s.carried) std::fill(s.carried, s.carried + carried, 0.0f);
+    for (size_t first = 0; first < blockColumns; first += kTileBlocks) {
+      DenoiseTile(s, plane, first, std::min(kTileBlocks, blockColumns - first), blockRows,
+                  threshold);
+    }
   }
   ::operator delete[](scratch, std::align_val_t(kAlignment));
   return true;
@@ -398,9 +440,9 @@ void Dct8x8Columns(const float* rows, float* out) {
 }
 
 bool DctDenoisePlane(const uint8_t* src, uint8_t* dst, int width, int height, ptrdiff_t stride,
-                     float threshold, size_t step) {
+                     float threshold, size_t step, size_t channels) {
   return HWY_DYNAMIC_DISPATCH(DctDenoisePlaneOfTarget)(src, dst, width, height, stride, threshold,
-                                                       step);
+                                                       step, channels);
 }
 
 const char* Dct8Target() { return HWY_DYNAMIC_DISPATCH(Dct8TargetOfThisTarget)(); }

@@ -8,12 +8,14 @@
 #include <string>
 #include <vector>
 
+#include "simd/hsl_rows.h"
 #include "support/EveryTarget.h"
 #include "support/ImageBuilders.h"
 #include "tessarofx/Denoise.h"
 
 namespace {
 
+using tfx_test::EveryColour;
 using tfx_test::ForEveryTarget;
 using tfx_test::Image;
 using tfx_test::NoiseBytes;
@@ -334,43 +336,78 @@ TEST(DctDenoise, LeavesBadInputAlone) {
 
 tagRGBQUAD Same(tagRGBQUAD c) { return c; }
 
-TEST(DctDenoise, FiltersThreeColourPlanesAndKeepsAlpha) {
+TEST(DctDenoise, FiltersThreeColourPlanesAndKeepsAlphaOnEveryTarget) {
   const float strength = 60.0f, sigma = static_cast<float>(strength * 0.15);
   struct Case {
     unsigned bpp;
     _ImagePixelFormat format;
     bool hsl;
+    unsigned w, h, extraStride;  // a wrapped stride beyond the padding is recombined without it
   };
-  for (const Case c : {Case{32, IPF_BGRA, false}, Case{24, IPF_RGB, false},
-                       Case{32, IPF_RGBA, true}, Case{24, IPF_BGR, true}}) {
-    SCOPED_TRACE(std::to_string(c.bpp) + (c.hsl ? " bits, HSL" : " bits, RGB"));
-    const unsigned w = 27, h = 19;
-    Image image = NoiseImage(w, h, c.bpp, c.format, ((c.bpp * w + 31) >> 3) & ~3u, 41);
-    // Planes as the red, green and blue bytes of each pixel (hue, saturation and lightness).
-    std::vector<uint8_t> planes[3], alpha;
-    for (unsigned i = 0; i < w * h; ++i) {
-      const tagRGBQUAD q = image->GetPixelColor(i % w, i / w, true);
-      const tagRGBQUAD t = c.hsl ? CxImage::RGBtoHSL(q) : q;
-      planes[0].push_back(t.rgbRed);
-      planes[1].push_back(t.rgbGreen);
-      planes[2].push_back(t.rgbBlue);
-      alpha.push_back(q.rgbReserved);
+  ForEveryTarget([&] {
+    for (const Case c : {Case{32, IPF_BGRA, false, 27, 19, 0}, Case{24, IPF_RGB, false, 27, 19, 0},
+                         Case{32, IPF_RGBA, true, 27, 19, 0}, Case{24, IPF_BGR, true, 27, 19, 0},
+                         Case{32, IPF_BGRA, false, 150, 37, 0}, Case{24, IPF_RGB, true, 149, 30, 0},
+                         Case{32, IPF_BGRA, true, 150, 21, 0}, Case{24, IPF_BGR, false, 149, 22, 0},
+                         Case{32, IPF_RGBA, true, 30, 12, 8}}) {
+      SCOPED_TRACE(std::to_string(c.bpp) + (c.hsl ? " bits, HSL, " : " bits, RGB, ") +
+                   std::to_string(c.w) + " wide");
+      const unsigned w = c.w, h = c.h;
+      Image image =
+          NoiseImage(w, h, c.bpp, c.format, (((c.bpp * w + 31) >> 3) & ~3u) + c.extraStride, 41);
+      // Planes as the red, green and blue bytes of each pixel (hue, saturation and lightness).
+      std::vector<uint8_t> planes[3], alpha;
+      for (unsigned i = 0; i < w * h; ++i) {
+        const tagRGBQUAD q = image->GetPixelColor(i % w, i / w, true);
+        const tagRGBQUAD t = c.hsl ? CxImage::RGBtoHSL(q) : q;
+        planes[0].push_back(t.rgbRed);
+        planes[1].push_back(t.rgbGreen);
+        planes[2].push_back(t.rgbBlue);
+        alpha.push_back(q.rgbReserved);
+      }
+      for (auto& plane : planes) {
+        const std::vector<uint8_t> before = plane;
+        dct_Denosing(plane.data(), plane.data(), w, h, w, sigma);
+        EXPECT_NE(plane, before);  // hue and saturation change too
+      }
+      ASSERT_EQ(c.hsl ? deNoiseLumiance(image.get(), strength) : deNoiseRGB(image.get(), strength),
+                image.get());
+      for (unsigned i = 0; i < w * h; ++i) {
+        tagRGBQUAD expected = (c.hsl ? CxImage::HSLtoRGB : Same)(
+            tagRGBQUAD{planes[2][i], planes[1][i], planes[0][i], 0});
+        expected.rgbReserved = c.bpp == 32 ? alpha[i] : 0;
+        const tagRGBQUAD actual = image->GetPixelColor(i % w, i / w, true);
+        ASSERT_EQ(std::memcmp(&expected, &actual, 4), 0) << "pixel " << i;
+      }
     }
-    for (auto& plane : planes) {
-      const std::vector<uint8_t> before = plane;
-      dct_Denosing(plane.data(), plane.data(), w, h, w, sigma);
-      EXPECT_NE(plane, before);  // hue and saturation change too
-    }
-    ASSERT_EQ(c.hsl ? deNoiseLumiance(image.get(), strength) : deNoiseRGB(image.get(), strength),
-              image.get());
-    for (unsigned i = 0; i < w * h; ++i) {
-      tagRGBQUAD expected = (c.hsl ? CxImage::HSLtoRGB
-                                   : Same)(tagRGBQUAD{planes[2][i], planes[1][i], planes[0][i], 0});
-      expected.rgbReserved = c.bpp == 32 ? alpha[i] : 0;
-      const tagRGBQUAD actual = image->GetPixelColor(i % w, i / w, true);
-      ASSERT_EQ(std::memcmp(&expected, &actual, 4), 0) << "pixel " << i;
-    }
+  });
+}
+
+TEST(HslRows, GiveTheBytesOfCxImageConversionsForEveryColourOnEveryTarget) {
+  // Every colour, and its three bytes read as hue, saturation and lightness.
+  const CxImage& all = EveryColour();
+  const size_t count = size_t(all.GetWidth()) * all.GetHeight();
+  const uint8_t* pixels = all.GetBits();
+  std::vector<uint8_t> triples(3 * count), hsl(3 * count), rgb(4 * count);
+  for (size_t i = 0; i < count; ++i) {
+    const uint8_t* p = pixels + 4 * i;
+    std::copy(p, p + 3, &triples[3 * i]);
+    const tagRGBQUAD t = CxImage::RGBtoHSL(tagRGBQUAD{p[0], p[1], p[2], p[3]});
+    hsl[3 * i] = t.rgbRed;
+    hsl[3 * i + 1] = t.rgbGreen;
+    hsl[3 * i + 2] = t.rgbBlue;
+    const tagRGBQUAD c = CxImage::HSLtoRGB(tagRGBQUAD{p[2], p[1], p[0], 0});
+    const uint8_t back[4] = {c.rgbBlue, c.rgbGreen, c.rgbRed, p[3]};
+    std::copy(back, back + 4, &rgb[4 * i]);
   }
+  ForEveryTarget([&] {
+    std::vector<uint8_t> out(3 * count);
+    tfx::RgbToHslRow(pixels, 4, false, out.data(), count);
+    EXPECT_TRUE(out == hsl);
+    std::vector<uint8_t> back(pixels, pixels + 4 * count);
+    tfx::HslToRgbRow(triples.data(), back.data(), 4, false, count);
+    EXPECT_TRUE(back == rgb);
+  });
 }
 
 TEST(DctDenoise, ReturnsImagesItCannotFilterUntouched) {

@@ -1,0 +1,163 @@
+// CxImage's integer HSL conversions over rows, compiled once per instruction set by
+// foreach_target.h.
+//
+// RGBtoHSL's integers never reach 2^24, so they are exact in float lanes, and its quotients are
+// float quotients truncated: a quotient n / d of RGBtoHSL lies at least 1 / d below the next
+// integer, far more than the rounding of a float quotient below 256. HSLtoRGB is float already
+// and is evaluated with the same operations in the same order, nothing fused. Pixels are taken
+// apart and put together byte by byte, a vector's worth at a time.
+#include "simd/hsl_rows.h"
+
+#undef HWY_TARGET_INCLUDE
+#define HWY_TARGET_INCLUDE "simd/hsl_rows_hwy.cpp"
+#include <hwy/foreach_target.h>  // IWYU pragma: keep
+#include <hwy/highway.h>
+
+HWY_BEFORE_NAMESPACE();
+namespace tfx {
+namespace HWY_NAMESPACE {
+
+namespace hn = hwy::HWY_NAMESPACE;
+
+namespace {
+
+using DF = hn::ScalableTag<float>;
+using VF = hn::Vec<DF>;
+
+// The most lanes of any target, for the byte staging arrays.
+constexpr size_t kMaxLanes = 64;
+
+// floor(n / d) for the non-negative integers of RGBtoHSL.
+VF Quotient(VF n, VF d) { return hn::Floor(hn::Div(n, d)); }
+
+// Bytes of `count` (at most one vector) pixels into float lanes: the colour at offset `at`.
+VF Channel(const uint8_t* pixels, size_t step, size_t at, size_t count) {
+  HWY_ALIGN float lanes[kMaxLanes] = {};
+  for (size_t i = 0; i < count; ++i) lanes[i] = pixels[i * step + at];
+  return hn::Load(DF(), lanes);
+}
+
+// HueToRGB's channel, for hues within one turn of 0..360.
+VF HueToChannel(VF p, VF q, VF hue) {
+  const DF d;
+  const VF turn = hn::Set(d, 360.0f), zero = hn::Zero(d), sixty = hn::Set(d, 60.0f);
+  hue = hn::IfThenElse(hn::Gt(hue, turn), hn::Sub(hue, turn),
+                       hn::IfThenElse(hn::Lt(hue, zero), hn::Add(hue, turn), hue));
+  const VF rising = hn::Add(p, hn::Div(hn::Mul(hn::Sub(q, p), hue), sixty));
+  const VF falling =
+      hn::Add(p, hn::Div(hn::Mul(hn::Sub(q, p), hn::Sub(hn::Set(d, 240.0f), hue)), sixty));
+  return hn::IfThenElse(
+      hn::Lt(hue, sixty), rising,
+      hn::IfThenElse(hn::Lt(hue, hn::Set(d, 180.0f)), q,
+                     hn::IfThenElse(hn::Lt(hue, hn::Set(d, 240.0f)), falling, p)));
+}
+
+// (uint8_t)(int)(v * 255), the low byte of the truncated product.
+void StoreByte(VF v, uint8_t* out, size_t step, size_t count) {
+  const DF d;
+  const hn::RebindToSigned<DF> di;
+  HWY_ALIGN int32_t lanes[kMaxLanes];
+  hn::Store(hn::ConvertTo(di, hn::Mul(v, hn::Set(d, 255.0f))), di, lanes);
+  for (size_t i = 0; i < count; ++i) out[i * step] = static_cast<uint8_t>(lanes[i]);
+}
+
+}  // namespace
+
+void RgbToHslRowOfTarget(const uint8_t* pixels, size_t bytesPerPixel, bool redFirst, uint8_t* hsl,
+                         size_t count) {
+  const DF d;
+  const hn::RebindToSigned<DF> di;
+  const size_t n = hn::Lanes(d);
+  const VF k255 = hn::Set(d, 255.0f), k510 = hn::Set(d, 510.0f), k42 = hn::Set(d, 42.0f);
+  const VF half = hn::Set(d, 0.5f), one = hn::Set(d, 1.0f);
+  for (size_t x = 0; x < count; x += n) {
+    const size_t lanes = count - x < n ? count - x : n;
+    const uint8_t* p = pixels + x * bytesPerPixel;
+    const VF r = Channel(p, bytesPerPixel, redFirst ? 0 : 2, lanes);
+    const VF g = Channel(p, bytesPerPixel, 1, lanes);
+    const VF b = Channel(p, bytesPerPixel, redFirst ? 2 : 0, lanes);
+    const VF cMax = hn::Max(hn::Max(r, g), b), cMin = hn::Min(hn::Min(r, g), b);
+    const VF sum = hn::Add(cMax, cMin), delta = hn::Sub(cMax, cMin);
+    const VF l = Quotient(hn::Add(hn::Mul(sum, k255), k255), k510);
+    // Greys divide by 1 instead of 0 and are replaced below.
+    const auto grey = hn::Eq(cMax, cMin);
+    const VF dividend = hn::IfThenElse(grey, one, delta);
+    const VF below = hn::IfThenElse(hn::Le(l, hn::Set(d, 127.0f)), sum, hn::Sub(k510, sum));
+    const VF divisor = hn::IfThenElse(grey, one, below);
+    const VF s =
+        Quotient(hn::Add(hn::Mul(delta, k255), hn::Floor(hn::Mul(divisor, half))), divisor);
+    const VF rounding = hn::Floor(hn::Mul(dividend, half));
+    const VF rDelta = Quotient(hn::Add(hn::Mul(hn::Sub(cMax, r), k42), rounding), dividend);
+    const VF gDelta = Quotient(hn::Add(hn::Mul(hn::Sub(cMax, g), k42), rounding), dividend);
+    const VF bDelta = Quotient(hn::Add(hn::Mul(hn::Sub(cMax, b), k42), rounding), dividend);
+    const VF h = hn::IfThenElse(
+        hn::Eq(r, cMax), hn::Sub(bDelta, gDelta),
+        hn::IfThenElse(hn::Eq(g, cMax), hn::Sub(hn::Add(hn::Set(d, 85.0f), rDelta), bDelta),
+                       hn::Sub(hn::Add(hn::Set(d, 170.0f), gDelta), rDelta)));
+    HWY_ALIGN int32_t hue[kMaxLanes], saturation[kMaxLanes], lightness[kMaxLanes];
+    hn::Store(hn::ConvertTo(di, hn::IfThenElse(grey, hn::Set(d, 170.0f), h)), di, hue);
+    hn::Store(hn::ConvertTo(di, hn::IfThenZeroElse(grey, s)), di, saturation);
+    hn::Store(hn::ConvertTo(di, l), di, lightness);
+    uint8_t* out = hsl + 3 * x;
+    for (size_t i = 0; i < lanes; ++i) {
+      // A negative hue keeps its low byte: it wraps modulo 256.
+      out[3 * i] = static_cast<uint8_t>(hue[i] & 255);
+      out[3 * i + 1] = static_cast<uint8_t>(saturation[i]);
+      out[3 * i + 2] = static_cast<uint8_t>(lightness[i]);
+    }
+  }
+}
+
+void HslToRgbRowOfTarget(const uint8_t* hsl, uint8_t* pixels, size_t bytesPerPixel, bool redFirst,
+                         size_t count) {
+  const DF d;
+  const size_t n = hn::Lanes(d);
+  const VF k255 = hn::Set(d, 255.0f), one = hn::Set(d, 1.0f), k120 = hn::Set(d, 120.0f);
+  for (size_t x = 0; x < count; x += n) {
+    const size_t lanes = count - x < n ? count - x : n;
+    const uint8_t* in = hsl + 3 * x;
+    const VF s = hn::Div(Channel(in, 3, 1, lanes), k255);
+    const VF l = hn::Div(Channel(in, 3, 2, lanes), k255);
+    const VF q = hn::IfThenElse(hn::Le(l, hn::Set(d, 0.5f)), hn::Mul(hn::Add(one, s), l),
+                                hn::Sub(hn::Add(l, s), hn::Mul(l, s)));
+    // H * 360 is an exact integer product, then a float quotient.
+    const VF h = hn::Div(hn::Mul(Channel(in, 3, 0, lanes), hn::Set(d, 360.0f)), k255);
+    const VF p = hn::Sub(hn::Mul(hn::Set(d, 2.0f), l), q);
+    const auto grey = hn::Eq(s, hn::Zero(d));
+    const VF blue = hn::IfThenElse(grey, l, HueToChannel(p, q, hn::Sub(h, k120)));
+    const VF green = hn::IfThenElse(grey, l, HueToChannel(p, q, h));
+    const VF red = hn::IfThenElse(grey, l, HueToChannel(p, q, hn::Add(h, k120)));
+    uint8_t* out = pixels + x * bytesPerPixel;
+    StoreByte(blue, out + (redFirst ? 2 : 0), bytesPerPixel, lanes);
+    StoreByte(green, out + 1, bytesPerPixel, lanes);
+    StoreByte(red, out + (redFirst ? 0 : 2), bytesPerPixel, lanes);
+  }
+}
+
+const char* HslRowsTargetOfTarget() { return hwy::TargetName(HWY_TARGET); }
+
+}  // namespace HWY_NAMESPACE
+}  // namespace tfx
+HWY_AFTER_NAMESPACE();
+
+#if HWY_ONCE
+namespace tfx {
+
+HWY_EXPORT(RgbToHslRowOfTarget);
+HWY_EXPORT(HslToRgbRowOfTarget);
+HWY_EXPORT(HslRowsTargetOfTarget);
+
+void RgbToHslRow(const uint8_t* pixels, size_t bytesPerPixel, bool redFirst, uint8_t* hsl,
+                 size_t count) {
+  HWY_DYNAMIC_DISPATCH(RgbToHslRowOfTarget)(pixels, bytesPerPixel, redFirst, hsl, count);
+}
+
+void HslToRgbRow(const uint8_t* hsl, uint8_t* pixels, size_t bytesPerPixel, bool redFirst,
+                 size_t count) {
+  HWY_DYNAMIC_DISPATCH(HslToRgbRowOfTarget)(hsl, pixels, bytesPerPixel, redFirst, count);
+}
+
+const char* HslRowsTarget() { return HWY_DYNAMIC_DISPATCH(HslRowsTargetOfTarget)(); }
+
+}  // namespace tfx
+#endif  // HWY_ONCE
