@@ -157,6 +157,9 @@ struct BoxDivide {
 template <int kBlurred>
 class BoxBlur {
  public:
+  // The largest radius whose windows BoxRowWindow sums directly.
+  static constexpr int64_t kWindowRadius = 7;
+
   BoxBlur(uint8_t* pixels, int64_t w, int64_t h, int64_t channels, int64_t r)
       : pixels_(pixels),
         w_(w),
@@ -171,7 +174,7 @@ class BoxBlur {
     // Column sums (32 or 64 bits), the running totals of one extended row, the ring and one
     // output row.
     const size_t sum_bytes = lanes_ * (divide_.by_multiply ? 4 : 8);
-    const size_t running_bytes = static_cast<size_t>((w_ + 2 * r_ + 2) * kBlurred) * 4;
+    const size_t running_bytes = static_cast<size_t>((w_ + 2 * r_ + 2) * kBlurred) * 4 + 64;
     const size_t ring_bytes = lanes_ * static_cast<size_t>(ring_rows_);
     const ScratchBlock scratch(sum_bytes + running_bytes + ring_bytes + static_cast<size_t>(w_));
     if (!scratch) return;
@@ -189,11 +192,47 @@ class BoxBlur {
   uint8_t* Row(int64_t y) const { return pixels_ + y * w_ * channels_; }
   uint8_t* Mid(int64_t y) const { return ring_ + static_cast<size_t>(y % ring_rows_) * lanes_; }
 
+  // BoxRowWindow's pair sums, after the copy of an extended row in the running totals' room:
+  // (w + 2 r) kBlurred bytes, aligned up to 64, and as many 16-bit sums fit in its
+  // 4 (w + 2 r + 2) kBlurred + 64 bytes.
+  uint16_t* Pairs() const {
+    const size_t copy = static_cast<size_t>((w_ + 2 * r_) * kBlurred);
+    return reinterpret_cast<uint16_t*>(reinterpret_cast<uint8_t*>(running_) +
+                                       (copy + 63) / 64 * 64);
+  }
+
+  // Outputs [from, to) of a row of the row pass, from a copy of the samples their windows reach.
+  void WindowsFromCopy(const uint8_t* row, uint8_t* mid, int64_t from, int64_t to) {
+    auto* extended = reinterpret_cast<uint8_t*>(running_);
+    uint8_t* p = extended;
+    for (int64_t i = from - r_; i < to + r_; ++i, p += kBlurred) {
+      std::memcpy(p, row + std::clamp<int64_t>(i, 0, w_ - 1) * channels_, kBlurred);
+    }
+    tfx::BoxRowWindow(extended, kBlurred, static_cast<size_t>(2 * r_ + 1), mid + from * kBlurred,
+                      static_cast<size_t>((to - from) * kBlurred), Pairs());
+  }
+
   // Row y of the row pass: channel k of each pixel, edge samples repeated, into byte k of
   // kBlurred-byte pixels.
   void MakeMid(int64_t y) {
     const uint8_t* row = Row(y);
     uint8_t* mid = Mid(y);
+    if (r_ <= kWindowRadius) {
+      // Small windows are summed tap by tap, a vector of outputs at once. Windows inside the row
+      // read it where it lies; those reaching past an edge read a copy with the edge repeated.
+      // The copies take 16 pixels more than the edges need, which the middle writes again,
+      // so that they are wide enough for vectors.
+      const int64_t edge = r_ + 16;
+      if (kBlurred != channels_ || w_ <= 2 * edge) {
+        WindowsFromCopy(row, mid, 0, w_);
+        return;
+      }
+      WindowsFromCopy(row, mid, 0, edge);
+      tfx::BoxRowWindow(row, kBlurred, static_cast<size_t>(2 * r_ + 1), mid + r_ * kBlurred,
+                        static_cast<size_t>((w_ - 2 * r_) * kBlurred), Pairs());
+      WindowsFromCopy(row, mid, w_ - edge, w_);
+      return;
+    }
     if (divide_.by_multiply) {
       // Running totals of the row extended by radius copies of its first pixel and radius + 1 of
       // its last: every window sum is then one difference, and a vector of them goes at once.

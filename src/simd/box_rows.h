@@ -26,4 +26,11 @@ void BoxRowStep(uint32_t* sums, const uint8_t* entering, const uint8_t* leaving,
 void BoxRowDifference(const uint32_t* running, size_t span, uint8_t* out, size_t lanes,
                       BoxQuotient quotient);
 
+// out[j] = floor((row[j] + row[j + pitch] + ... + row[j + (taps - 1) pitch]) / taps) for
+// j < lanes, with 2 to 15 taps: the window sums stay below 2^16 and divide by a 16-bit
+// multiply-high. `pairs` holds lanes + (taps - 1) pitch scratch entries; `out` may not overlap
+// `row`.
+void BoxRowWindow(const uint8_t* row, size_t pitch, size_t taps, uint8_t* out, size_t lanes,
+                  uint16_t* pairs);
+
 }  // namespace tfx

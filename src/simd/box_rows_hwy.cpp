@@ -69,6 +69,52 @@ void BoxRowDifferenceOfTarget(const uint32_t* running, size_t span, uint8_t* out
   }
 }
 
+// Taps are added a pair at a time from a row of pair sums, so each output adds half as many
+// vectors and widens a single one. With m = ceil(2^16 / taps), n m / 2^16 overshoots n / taps
+// by less than n / 2^16, which for n <= 255 taps is below 1 / taps while 255 taps^2 < 2^16: the
+// floor is exact.
+void BoxRowWindowOfTarget(const uint8_t* HWY_RESTRICT row, size_t pitch, size_t taps,
+                          uint8_t* HWY_RESTRICT out, size_t lanes, uint16_t* HWY_RESTRICT pairs) {
+  const hn::ScalableTag<uint16_t> d16;
+  const hn::RebindToSigned<decltype(d16)> di16;
+  const hn::Rebind<uint8_t, decltype(d16)> d8;
+  const size_t n = hn::Lanes(d16);
+  const size_t half = taps / 2;
+  const size_t pairLanes = lanes + 2 * (half - 1) * pitch;
+  // A row of at least one vector ends with a vector that overlaps the one before it, writing
+  // some lanes twice with the same values.
+  const auto pair = [&](size_t i) {
+    const auto a = hn::PromoteTo(d16, hn::LoadU(d8, row + i));
+    hn::StoreU(hn::Add(a, hn::PromoteTo(d16, hn::LoadU(d8, row + i + pitch))), d16, pairs + i);
+  };
+  if (pairLanes >= n) {
+    for (size_t i = 0; i + n <= pairLanes; i += n) pair(i);
+    pair(pairLanes - n);
+  } else {
+    for (size_t i = 0; i < pairLanes; ++i)
+      pairs[i] = static_cast<uint16_t>(row[i] + row[i + pitch]);
+  }
+  const uint32_t mul = (65536 + static_cast<uint32_t>(taps) - 1) / static_cast<uint32_t>(taps);
+  const auto m = hn::Set(d16, static_cast<uint16_t>(mul));
+  const uint8_t* last = taps % 2 != 0 ? row + (taps - 1) * pitch : nullptr;
+  const auto window = [&](size_t j) {
+    auto sum = hn::LoadU(d16, pairs + j);
+    for (size_t k = 1; k < half; ++k) sum = hn::Add(sum, hn::LoadU(d16, pairs + j + 2 * k * pitch));
+    if (last) sum = hn::Add(sum, hn::PromoteTo(d16, hn::LoadU(d8, last + j)));
+    hn::StoreU(hn::DemoteTo(d8, hn::BitCast(di16, hn::MulHigh(sum, m))), d8, out + j);
+  };
+  if (lanes >= n) {
+    for (size_t j = 0; j + n <= lanes; j += n) window(j);
+    window(lanes - n);
+    return;
+  }
+  for (size_t j = 0; j < lanes; ++j) {
+    uint32_t sum = 0;
+    for (size_t t = 0; t < taps; ++t) sum += row[j + t * pitch];
+    out[j] = static_cast<uint8_t>((sum * mul) >> 16);
+  }
+}
+
 }  // namespace HWY_NAMESPACE
 }  // namespace tfx
 HWY_AFTER_NAMESPACE();
@@ -79,6 +125,7 @@ namespace tfx {
 HWY_EXPORT(BoxRowAccumulateOfTarget);
 HWY_EXPORT(BoxRowStepOfTarget);
 HWY_EXPORT(BoxRowDifferenceOfTarget);
+HWY_EXPORT(BoxRowWindowOfTarget);
 
 void BoxRowDifference(const uint32_t* running, size_t span, uint8_t* out, size_t lanes,
                       BoxQuotient quotient) {
@@ -92,6 +139,11 @@ void BoxRowAccumulate(uint32_t* sums, const uint8_t* row, size_t lanes, uint32_t
 void BoxRowStep(uint32_t* sums, const uint8_t* entering, const uint8_t* leaving, uint8_t* out,
                 size_t lanes, BoxQuotient quotient) {
   HWY_DYNAMIC_DISPATCH(BoxRowStepOfTarget)(sums, entering, leaving, out, lanes, quotient);
+}
+
+void BoxRowWindow(const uint8_t* row, size_t pitch, size_t taps, uint8_t* out, size_t lanes,
+                  uint16_t* pairs) {
+  HWY_DYNAMIC_DISPATCH(BoxRowWindowOfTarget)(row, pitch, taps, out, lanes, pairs);
 }
 
 }  // namespace tfx

@@ -199,11 +199,13 @@ TEST(FastAverageBlur, IsABoxMeanOfBoxMeansOnEveryTarget) {
   };
   // Rows narrower than the window, heights just above the radius and past the ring of 2 radius
   // + 2 rows, every channel count, and radii from 128 on, whose quotients no 32-bit multiply
-  // gives.
-  const Case cases[] = {{1, 2, 1, 1},    {5, 4, 3, 3},     {2, 9, 1, 4},      {16, 9, 3, 8},
-                        {9, 9, 4, 2},    {7, 12, 2, 5},    {30, 31, 3, 1},    {3, 6, 5, 5},
-                        {41, 9, 3, 7},   {3, 140, 3, 130}, {40, 129, 1, 128}, {33, 20, 4, 19},
-                        {4, 300, 3, 128}};
+  // gives; rows of many vectors at small radii, whose windows are summed directly, and just
+  // above them.
+  const Case cases[] = {{1, 2, 1, 1},     {5, 4, 3, 3},     {2, 9, 1, 4},      {16, 9, 3, 8},
+                        {9, 9, 4, 2},     {7, 12, 2, 5},    {30, 31, 3, 1},    {3, 6, 5, 5},
+                        {41, 9, 3, 7},    {3, 140, 3, 130}, {40, 129, 1, 128}, {33, 20, 4, 19},
+                        {4, 300, 3, 128}, {131, 17, 3, 7},  {150, 18, 4, 8},   {133, 16, 1, 6},
+                        {70, 12, 3, 2}};
   for (const Case& c : cases) {
     SCOPED_TRACE(testing::Message() << c.width << "x" << c.height << " channels " << c.channels
                                     << " radius " << c.radius);
