@@ -137,7 +137,9 @@ void Transpose(const float* in, float* out) {
 // block-row sums of 8 rows) stays in the first-level cache. The last 7 pixels a tile reaches
 // also take blocks of the next tile: their sums so far are carried, one set per row, and the
 // next tile adds its terms to them. A tile writes only pixels left of its last block column and
-// reads only from its first block column on, so the output may overwrite the source.
+// reads only from its first block column on; the 7 columns past its last block column are
+// written by the tile to its right, a row at least 9 steps after this tile read it, and tiles
+// take each band of rows from left to right. So the output may overwrite the source.
 //
 // The weight of a pixel is the number of blocks covering it, (min(y, 7) + 1) * (min(x, 7) + 1)
 // for every pixel the output takes from the blocks; it is formed exactly instead of counted.
@@ -156,6 +158,14 @@ constexpr size_t kLead = 16;
 constexpr size_t kRowFloats = kTileBlocks + 48;
 // Pixels whose sums pass from one tile to the next.
 constexpr size_t kCarried = 7;
+// Floats of one tile's state.
+constexpr size_t kTileFloats = 128 * kTileBlocks + 22 * kRowFloats;
+// Tiles walked side by side, a band of block rows at a time: the rows of a band are then read by
+// one tile after another while their pages are still in the translation cache, where a tile
+// walking the whole height would look up every row's page anew. A group's states take a few
+// MiB.
+constexpr size_t kGroupTiles = 64;
+constexpr size_t kBandRows = 128;
 
 size_t RoundUp(size_t n, size_t step) { return (n + step - 1) / step * step; }
 
@@ -334,11 +344,8 @@ void WriteRow(const Scratch& s, const Plane& plane, size_t first, size_t y, size
   for (; u < tile; ++u) out[u * plane.step] = s.bytes[u];
 }
 
-// Row y is written a step late, once block row y + 1 is done: still before anything reads a
-// row below y + 8, and it lets the stores of each step settle before the next step reads them.
-void DenoiseTile(const Scratch& s, const Plane& plane, size_t first, size_t tile, size_t blockRows,
-                 float threshold) {
-  const size_t rows = blockRows + 8;
+// A tile's state before block row 0: the first 7 rows transformed, row 7 loaded.
+void StartTile(const Scratch& s, const Plane& plane, size_t first, size_t tile, size_t rows) {
   std::fill(s.terms[0], s.terms[0] + 16 * kRowFloats, 0.0f);
   std::fill(s.sums, s.sums + 64 * kTileBlocks, 0.0f);
   for (size_t u = 0; u < kRowFloats; ++u) {
@@ -349,14 +356,19 @@ void DenoiseTile(const Scratch& s, const Plane& plane, size_t first, size_t tile
     LoadSamples(plane, row + 1, rows, first, tile + 7, s.samples[(row + 1) % 2]);
     RowTransforms(s, s.samples[row % 2], row, tile);
   }
-  for (size_t y = 0; y < blockRows; ++y) {
-    RowTransforms(s, s.samples[(y + 7) % 2], (y + 7) % 8, tile);
-    if (y + 1 < blockRows) LoadSamples(plane, y + 8, rows, first, tile + 7, s.samples[y % 2]);
-    Blocks(s, y, tile, threshold);
-    if (y > 0) WriteRow(s, plane, first, y - 1, tile);
-    InverseRows(s, y, tile);
-  }
-  WriteRow(s, plane, first, blockRows - 1, tile);
+}
+
+// Block row y of a tile. Row y - 1 is written a step late, once block row y is done: still
+// before anything reads a row below y + 7, and it lets the stores of each step settle before
+// the next step reads them. The last row is left to the caller.
+void StepTile(const Scratch& s, const Plane& plane, size_t first, size_t tile, size_t y,
+              size_t blockRows, float threshold) {
+  RowTransforms(s, s.samples[(y + 7) % 2], (y + 7) % 8, tile);
+  if (y + 1 < blockRows)
+    LoadSamples(plane, y + 8, blockRows + 8, first, tile + 7, s.samples[y % 2]);
+  Blocks(s, y, tile, threshold);
+  if (y > 0) WriteRow(s, plane, first, y - 1, tile);
+  InverseRows(s, y, tile);
 }
 
 }  // namespace
@@ -385,27 +397,49 @@ bool DctDenoisePlaneOfTarget(const uint8_t* src, uint8_t* dst, int width, int he
                              ptrdiff_t stride, float threshold, size_t step, size_t channels) {
   const size_t blockColumns = static_cast<size_t>(width) - 8;
   const size_t blockRows = static_cast<size_t>(height) - 8;
+  const size_t tiles = (blockColumns + kTileBlocks - 1) / kTileBlocks;
+  const size_t group = std::min(tiles, kGroupTiles);
   // Only planes of more than one tile carry sums.
-  const size_t carried = blockColumns > kTileBlocks ? kCarried * blockRows : 0;
-  const size_t floats = 128 * kTileBlocks + 22 * kRowFloats + carried;
+  const size_t carried = tiles > 1 ? kCarried * blockRows : 0;
+  const size_t floats = group * kTileFloats + carried;
   float* scratch = new (std::align_val_t(kAlignment), std::nothrow) float[floats]();  // zero-filled
   if (!scratch) return false;
-  float* rows = scratch + 128 * kTileBlocks;
-  const Scratch s{scratch,
-                  scratch + 64 * kTileBlocks,
-                  {rows, rows + 8 * kRowFloats},
-                  {rows + 16 * kRowFloats, rows + 17 * kRowFloats},
-                  rows + 18 * kRowFloats,
-                  rows + 19 * kRowFloats,
-                  rows + 20 * kRowFloats,
-                  reinterpret_cast<uint8_t*>(rows + 21 * kRowFloats),
-                  carried ? rows + 22 * kRowFloats : nullptr};
+  const auto state = [&](size_t t) {
+    float* tile = scratch + (t % group) * kTileFloats;
+    float* rows = tile + 128 * kTileBlocks;
+    return Scratch{tile,
+                   tile + 64 * kTileBlocks,
+                   {rows, rows + 8 * kRowFloats},
+                   {rows + 16 * kRowFloats, rows + 17 * kRowFloats},
+                   rows + 18 * kRowFloats,
+                   rows + 19 * kRowFloats,
+                   rows + 20 * kRowFloats,
+                   reinterpret_cast<uint8_t*>(rows + 21 * kRowFloats),
+                   carried ? scratch + group * kTileFloats : nullptr};
+  };
+  const auto tileWidth = [&](size_t t) {
+    return std::min(kTileBlocks, blockColumns - t * kTileBlocks);
+  };
   for (size_t channel = 0; channel < channels; ++channel) {
     const Plane plane{src + channel, dst + channel, stride, step, channel};
-    if (s.carried) std::fill(s.carried, s.carried + carried, 0.0f);
-    for (size_t first = 0; first < blockColumns; first += kTileBlocks) {
-      DenoiseTile(s, plane, first, std::min(kTileBlocks, blockColumns - first), blockRows,
-                  threshold);
+    if (carried) std::fill(scratch + group * kTileFloats, scratch + floats, 0.0f);
+    for (size_t g0 = 0; g0 < tiles; g0 += group) {
+      const size_t g1 = std::min(tiles, g0 + group);
+      for (size_t t = g0; t < g1; ++t) {
+        StartTile(state(t), plane, t * kTileBlocks, tileWidth(t), blockRows + 8);
+      }
+      for (size_t y0 = 0; y0 < blockRows; y0 += kBandRows) {
+        const size_t y1 = std::min(blockRows, y0 + kBandRows);
+        for (size_t t = g0; t < g1; ++t) {
+          const Scratch s = state(t);
+          for (size_t y = y0; y < y1; ++y) {
+            StepTile(s, plane, t * kTileBlocks, tileWidth(t), y, blockRows, threshold);
+          }
+        }
+      }
+      for (size_t t = g0; t < g1; ++t) {
+        WriteRow(state(t), plane, t * kTileBlocks, blockRows - 1, tileWidth(t));
+      }
     }
   }
   ::operator delete[](scratch, std::align_val_t(kAlignment));

@@ -212,10 +212,12 @@ std::vector<uint8_t> Defined(const Plane& p, float sigma) {
 }
 
 TEST(DctDenoise, FollowsTheDefinedArithmeticToTheBitOnEveryTarget) {
-  // Widths across tiles of block columns and vector tails, and planes denoised in place.
-  const Plane planes[] = {NoisyRamp(9, 9, 9, 61), NoisyRamp(40, 23, 43, 62),
-                          NoisyRamp(77, 31, 77, 63), NoisyRamp(203, 57, 208, 64),
-                          NoisyRamp(300, 20, 300, 65)};
+  // Widths across tiles of block columns and vector tails, heights across bands of rows, more
+  // tiles than are walked side by side, and planes denoised in place.
+  const Plane planes[] = {NoisyRamp(9, 9, 9, 61),       NoisyRamp(40, 23, 43, 62),
+                          NoisyRamp(77, 31, 77, 63),    NoisyRamp(203, 57, 208, 64),
+                          NoisyRamp(300, 20, 300, 65),  NoisyRamp(150, 300, 150, 66),
+                          NoisyRamp(4200, 11, 4200, 67)};
   ForEveryTarget([&] {
     for (const Plane& p : planes) {
       for (const float sigma : {0.0f, 4.0f, 15.0f}) {
