@@ -181,7 +181,9 @@ class BoxBlur {
     running_ = scratch.As<uint32_t>(sum_bytes);
     ring_ = scratch.As<uint8_t>(sum_bytes + running_bytes);
     out_row_ = scratch.As<uint8_t>(sum_bytes + running_bytes + ring_bytes);
-    if (divide_.by_multiply) {
+    if (r_ <= kWindowRadius) {
+      Columns(scratch.As<uint16_t>());
+    } else if (divide_.by_multiply) {
       Columns(scratch.As<uint32_t>());
     } else {
       Columns(scratch.As<uint64_t>());
@@ -264,10 +266,12 @@ class BoxBlur {
   }
 
   // The column pass. The first window of a column reaches rows 0..radius, all below the height.
-  // 32-bit sums go with the multiply-and-shift quotient, 64-bit ones with a division.
+  // 16-bit sums go with the windows BoxRowWindow sums, 32-bit ones with the multiply-and-shift
+  // quotient, 64-bit ones with a division.
   template <class Sum>
   void Columns(Sum* sums) {
     constexpr bool kByMultiply = std::is_same_v<Sum, uint32_t>;
+    constexpr bool kSmall = std::is_same_v<Sum, uint16_t>;
     int64_t made = -1;  // the last row of the row pass made
     auto make_through = [&](int64_t y) {
       while (made < y) MakeMid(++made);
@@ -279,14 +283,18 @@ class BoxBlur {
       if constexpr (kByMultiply) {
         tfx::BoxRowAccumulate(sums, Mid(i), lanes_, weight);
       } else {
-        for (size_t j = 0; j < lanes_; ++j) sums[j] += Sum{weight} * Mid(i)[j];
+        for (size_t j = 0; j < lanes_; ++j)
+          sums[j] = static_cast<Sum>(sums[j] + weight * Mid(i)[j]);
       }
     }
     for (int64_t y = 0; y < h_; ++y) {
       const int64_t entering = std::min(y + r_ + 1, h_ - 1);
       make_through(entering);
       uint8_t* out = kBlurred == channels_ ? Row(y) : out_row_;
-      if constexpr (kByMultiply) {
+      if constexpr (kSmall) {
+        tfx::BoxRowStep16(sums, Mid(entering), Mid(std::max<int64_t>(y - r_, 0)), out, lanes_,
+                          static_cast<size_t>(2 * r_ + 1));
+      } else if constexpr (kByMultiply) {
         tfx::BoxRowStep(sums, Mid(entering), Mid(std::max<int64_t>(y - r_, 0)), out, lanes_,
                         divide_.quotient);
       } else {

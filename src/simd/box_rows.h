@@ -33,4 +33,9 @@ void BoxRowDifference(const uint32_t* running, size_t span, uint8_t* out, size_t
 void BoxRowWindow(const uint8_t* row, size_t pitch, size_t taps, uint8_t* out, size_t lanes,
                   uint16_t* pairs);
 
+// BoxRowStep with 16-bit sums for the windows of BoxRowWindow: out[j] = floor(sums[j] / taps),
+// then sums[j] += entering[j] - leaving[j] for j < lanes, with 2 to 15 taps.
+void BoxRowStep16(uint16_t* sums, const uint8_t* entering, const uint8_t* leaving, uint8_t* out,
+                  size_t lanes, size_t taps);
+
 }  // namespace tfx

@@ -115,6 +115,29 @@ void BoxRowWindowOfTarget(const uint8_t* HWY_RESTRICT row, size_t pitch, size_t 
   }
 }
 
+void BoxRowStep16OfTarget(uint16_t* HWY_RESTRICT sums, const uint8_t* entering,
+                          const uint8_t* leaving, uint8_t* out, size_t lanes, size_t taps) {
+  const hn::ScalableTag<uint16_t> d16;
+  const hn::RebindToSigned<decltype(d16)> di16;
+  const hn::Rebind<uint8_t, decltype(d16)> d8;
+  const size_t n = hn::Lanes(d16);
+  // The quotient of BoxRowWindow.
+  const uint32_t mul = (65536 + static_cast<uint32_t>(taps) - 1) / static_cast<uint32_t>(taps);
+  const auto m = hn::Set(d16, static_cast<uint16_t>(mul));
+  size_t j = 0;
+  for (; j + n <= lanes; j += n) {
+    const auto sum = hn::LoadU(d16, sums + j);
+    hn::StoreU(hn::DemoteTo(d8, hn::BitCast(di16, hn::MulHigh(sum, m))), d8, out + j);
+    const auto in = hn::PromoteTo(d16, hn::LoadU(d8, entering + j));
+    const auto gone = hn::PromoteTo(d16, hn::LoadU(d8, leaving + j));
+    hn::StoreU(hn::Sub(hn::Add(sum, in), gone), d16, sums + j);
+  }
+  for (; j < lanes; ++j) {
+    out[j] = static_cast<uint8_t>((sums[j] * mul) >> 16);
+    sums[j] = static_cast<uint16_t>(sums[j] + entering[j] - leaving[j]);
+  }
+}
+
 }  // namespace HWY_NAMESPACE
 }  // namespace tfx
 HWY_AFTER_NAMESPACE();
@@ -126,6 +149,7 @@ HWY_EXPORT(BoxRowAccumulateOfTarget);
 HWY_EXPORT(BoxRowStepOfTarget);
 HWY_EXPORT(BoxRowDifferenceOfTarget);
 HWY_EXPORT(BoxRowWindowOfTarget);
+HWY_EXPORT(BoxRowStep16OfTarget);
 
 void BoxRowDifference(const uint32_t* running, size_t span, uint8_t* out, size_t lanes,
                       BoxQuotient quotient) {
@@ -144,6 +168,11 @@ void BoxRowStep(uint32_t* sums, const uint8_t* entering, const uint8_t* leaving,
 void BoxRowWindow(const uint8_t* row, size_t pitch, size_t taps, uint8_t* out, size_t lanes,
                   uint16_t* pairs) {
   HWY_DYNAMIC_DISPATCH(BoxRowWindowOfTarget)(row, pitch, taps, out, lanes, pairs);
+}
+
+void BoxRowStep16(uint16_t* sums, const uint8_t* entering, const uint8_t* leaving, uint8_t* out,
+                  size_t lanes, size_t taps) {
+  HWY_DYNAMIC_DISPATCH(BoxRowStep16OfTarget)(sums, entering, leaving, out, lanes, taps);
 }
 
 }  // namespace tfx
