@@ -283,8 +283,9 @@ class BoxBlur {
       if constexpr (kByMultiply) {
         tfx::BoxRowAccumulate(sums, Mid(i), lanes_, weight);
       } else {
-        for (size_t j = 0; j < lanes_; ++j)
-          sums[j] = static_cast<Sum>(sums[j] + weight * Mid(i)[j]);
+        for (size_t j = 0; j < lanes_; ++j) {
+          sums[j] = static_cast<Sum>(sums[j] + static_cast<Sum>(weight) * Mid(i)[j]);
+        }
       }
     }
     for (int64_t y = 0; y < h_; ++y) {

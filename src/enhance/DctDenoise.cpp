@@ -110,7 +110,8 @@ bool DenoiseInterleaved(CxImage* image, float sigma, bool hsl) {
   return true;
 }
 
-// Splits `image` into three planes (and alpha), denoises the three, and recombines them.
+// Denoises the colour (or HSL) planes of `image`: where they lie when its layout allows, else
+// split into three planes (and alpha) that are then recombined.
 CxImage* DenoisePlanes(CxImage* image, float strength, bool hsl) {
   if (!Denoisable(image) || strength == 0.0f) return image;
   // The product is formed in double, as the strength scale is a double constant.
