@@ -4,7 +4,6 @@
 #include "tessarofx/CubeLut.h"
 
 #include <algorithm>
-#include <climits>
 #include <cmath>
 #include <cstdint>
 #include <cstring>
@@ -72,17 +71,11 @@ int CubeLut::doLUT(unsigned char* pixels, int width, int height, int pitch, int 
   if (static_cast<unsigned>(size_ - 1) > 63u) return 23;
   if (rowTable_ || height < 1) return 0;
   if (!pixels || width < 1 || bytesPerPixel < 3) return 0;
-  // Rows closer together than a row's bytes would run past the end of the caller's buffer; one
-  // row needs no pitch at all.
-  const int64_t rowBytes = int64_t{width} * bytesPerPixel;
-  const int64_t span = pitch < 0 ? -int64_t{pitch} : int64_t{pitch};
-  if (height > 1 && span < rowBytes) return 0;
-  // Nor does any caller hold an image above INT_MAX bytes.
-  if ((height - 1) * span + rowBytes > INT_MAX) return 0;
-  const tfx::TetraTable table{&lattice_[0][0][0][0], ft_, gt_, size_};
-  for (int y = 0; y < height; ++y) {
-    tfx::TetraRow(table, pixels + static_cast<ptrdiff_t>(y) * pitch, width, bytesPerPixel);
-  }
+  // The lattice is public and may change between calls, so it is packed afresh every time; the
+  // storage stays with the thread.
+  thread_local tfx::TetraPlan plan;
+  plan.Prepare(tfx::TetraTable{&lattice_[0][0][0][0], ft_, gt_, size_});
+  tfx::TetraImage(plan, pixels, pitch, pixels, width, height, pitch, bytesPerPixel);
   return status_;
 }
 

@@ -1,5 +1,9 @@
 #include "lut/CubeLutApply.h"
 
+#include <climits>
+#include <cstring>
+#include <initializer_list>
+
 #include "simd/lut_tetra_rows.h"
 
 namespace tfx {
@@ -29,10 +33,86 @@ void TetraRowReference(const TetraTable& t, uint8_t* row, int width, int bytesPe
   }
 }
 
-void TetraRow(const TetraTable& table, uint8_t* row, int width, int bytesPerPixel) {
+void TetraPlan::Prepare(const TetraTable& table) {
+  table_ = table;
+  const int n = table.size;
+  packed_ = n >= 1 && n <= 64;
+  for (int v = 0; v < 256 && packed_; ++v) packed_ = table.gt[v] >= 0 && table.gt[v] < n;
+  if (!packed_) return;
+  std::memcpy(ft_, table.ft, sizeof ft_);
+
+  const auto point = [&](int i, int j, int k) {
+    return table.lattice + ((i * 64 + j) * 64 + k) * 3;
+  };
+  grey_ = true;
+  for (int i = 0; i < n && grey_; ++i) {
+    for (int j = 0; j < n && grey_; ++j) {
+      for (int k = 0; k < n; ++k) {
+        const float* p = point(i, j, k);
+        if (std::memcmp(p, p + 1, sizeof *p) != 0 || std::memcmp(p, p + 2, sizeof *p) != 0) {
+          grey_ = false;
+          break;
+        }
+      }
+    }
+  }
+  const int per = grey_ ? 1 : 4;
+  stride_[0] = n * n * per;
+  stride_[1] = n * per;
+  stride_[2] = per;
+  for (int axis = 0; axis < 3; ++axis) {
+    for (int v = 0; v < 256; ++v) lower_[axis][v] = table.gt[v] * stride_[axis];
+  }
+  const size_t floats = static_cast<size_t>(n) * n * n * per;
+  if (floats > capacity_) {
+    points_ = hwy::AllocateAligned<float>(floats);
+    capacity_ = floats;
+  }
+  float* out = points_.get();
+  for (int i = 0; i < n; ++i) {
+    for (int j = 0; j < n; ++j) {
+      for (int k = 0; k < n; ++k) {
+        const float* p = point(i, j, k);
+        if (grey_) {
+          *out++ = p[0];
+        } else {
+          out[0] = p[0], out[1] = p[1], out[2] = p[2], out[3] = 0.0f;
+          out += 4;
+        }
+      }
+    }
+  }
+}
+
+void TetraRow(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width,
+              int bytesPerPixel) {
+  if (width <= 0) return;
+  if (!plan.Packed()) {
+    if (in != out) std::memcpy(out, in, static_cast<size_t>(width) * bytesPerPixel);
+    TetraRowReference(plan.Table(), out, width, bytesPerPixel);
+    return;
+  }
   // Highway picks the instruction set on every call, so a row costs one indirect call and the
   // choice follows hwy::SetSupportedTargetsForTest.
-  TetraRowVector(table, row, width, bytesPerPixel);
+  TetraRowVector(plan, in, out, width, bytesPerPixel);
+}
+
+void TetraImage(const TetraPlan& plan, const uint8_t* in, int inPitch, uint8_t* pixels, int width,
+                int height, int pitch, int bytesPerPixel) {
+  if (height < 1 || !in || !pixels || width < 1 || bytesPerPixel < 3) return;
+  // Rows closer together than a row's bytes would run past the end of the caller's buffer; one
+  // row needs no pitch at all.
+  const int64_t rowBytes = int64_t{width} * bytesPerPixel;
+  for (const int p : {pitch, inPitch}) {
+    const int64_t span = p < 0 ? -int64_t{p} : int64_t{p};
+    if (height > 1 && span < rowBytes) return;
+    // Nor does any caller hold an image above INT_MAX bytes.
+    if ((height - 1) * span + rowBytes > INT_MAX) return;
+  }
+  for (int y = 0; y < height; ++y) {
+    TetraRow(plan, in + static_cast<ptrdiff_t>(y) * inPitch,
+             pixels + static_cast<ptrdiff_t>(y) * pitch, width, bytesPerPixel);
+  }
 }
 
 }  // namespace tfx

@@ -5,6 +5,8 @@
 #include <cstddef>
 #include <cstdint>
 
+#include <hwy/aligned_allocator.h>
+
 namespace tfx {
 
 // What one application needs from a CubeLut: the 64-strided float lattice and the per-byte
@@ -60,8 +62,46 @@ inline void Tetrahedral(const float* c000, ptrdiff_t dr, ptrdiff_t dg, ptrdiff_t
   for (int c = 0; c < 3; ++c) out[c] = w0 * c000[c] + w1 * m1[c] + w2 * m2[c] + w3 * c111[c];
 }
 
-// Applies the table to `width` pixels of `bytesPerPixel` bytes (blue, green, red first) in place.
-void TetraRow(const TetraTable& table, uint8_t* row, int width, int bytesPerPixel);
+// A TetraTable laid out for the vector rows. Copying the lattice costs a small part of one 4K frame
+// and is what lets the rows read each corner as one aligned block: the N^3 points packed one after
+// another (blue fastest), each as red, green, blue and a 0, or as one float when every point is
+// grey (the three components the same bits, so one blend gives all three bytes, as a key mask
+// does), and per axis the offset in floats of each byte's lower point.
+class TetraPlan {
+ public:
+  // Reads the table as it is now; a later change to it is not seen until the next Prepare.
+  void Prepare(const TetraTable& table);
+
+  const TetraTable& Table() const { return table_; }
+  // False when an index table entry lies outside the lattice's N points: only the reference
+  // reads such a table the way doLUT always has.
+  bool Packed() const { return packed_; }
+  bool Grey() const { return grey_; }
+  const float* Points() const { return points_.get(); }
+  const float* Fractions() const { return ft_; }
+  const int32_t* Lower(int axis) const { return lower_[axis]; }  // red 0, green 1, blue 2
+  int32_t Stride(int axis) const { return stride_[axis]; }       // floats between points
+  int32_t Last(int axis) const { return stride_[axis] * (table_.size - 1); }
+
+ private:
+  TetraTable table_{};
+  bool packed_ = false;
+  bool grey_ = false;
+  size_t capacity_ = 0;  // floats
+  hwy::AlignedFreeUniquePtr<float[]> points_;
+  float ft_[256] = {};
+  int32_t lower_[3][256] = {};
+  int32_t stride_[3] = {};
+};
+
+// Applies the table to `width` pixels of `bytesPerPixel` bytes (blue, green, red first) from `in`
+// to `out`, which is either `in` itself or a row that does not overlap it.
+void TetraRow(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width, int bytesPerPixel);
+
+// doLUT's checks and rows over a whole image, in place or from `in` (with its own pitch) to
+// `pixels`; images its arguments cannot describe are left alone.
+void TetraImage(const TetraPlan& plan, const uint8_t* in, int inPitch, uint8_t* pixels, int width,
+                int height, int pitch, int bytesPerPixel);
 
 // The plain per-pixel formula, one comparison chain per pixel: the reference every fast path is
 // held to.

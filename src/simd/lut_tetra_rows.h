@@ -7,11 +7,13 @@
 
 namespace tfx {
 
-struct TetraTable;
+class TetraPlan;
 
-// TetraRow's contract, on the instruction set Highway's dispatch picks at the time of the call
-// (hwy::SetSupportedTargetsForTest included). Any bytesPerPixel of 3 or more; 4 is the fast one.
-void TetraRowVector(const TetraTable& table, uint8_t* row, int width, int bytesPerPixel);
+// TetraRow's contract for a packed plan, on the instruction set Highway's dispatch picks at the
+// time of the call (hwy::SetSupportedTargetsForTest included). Any bytesPerPixel of 3 or more; 4
+// is the fast one.
+void TetraRowVector(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width,
+                    int bytesPerPixel);
 
 // The name of the instruction set TetraRowVector would run now.
 const char* TetraRowVectorTarget();

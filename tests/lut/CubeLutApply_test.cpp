@@ -33,13 +33,14 @@ struct Lattice {
     return lut->getLut3DData(nullptr, nullptr, nullptr, nullptr) + ((i * 64 + j) * 64 + k) * 3;
   }
 
+  // Grey: every point's three components the same value, as in a key mask.
   template <class Value>
-  void Fill(Value value) {
+  void Fill(Value value, bool grey = false) {
     const int n = lut->getLutSize();
     for (int i = 0; i < n; ++i) {
       for (int j = 0; j < n; ++j) {
         for (int k = 0; k < n; ++k) {
-          for (int c = 0; c < 3; ++c) Point(i, j, k)[c] = value();
+          for (int c = 0; c < 3; ++c) Point(i, j, k)[c] = grey && c ? Point(i, j, k)[0] : value();
         }
       }
     }
@@ -69,16 +70,21 @@ std::vector<float> EdgeValues() {
 }
 
 // TetraRow and TetraRowReference on the same random rows of every width from 0 to 67 (every
-// tail of every vector size) and one long row, with guard bytes behind each row.
+// tail of every vector size) and one long row, with guard bytes behind each row; odd widths go
+// from a copy of the row to the row, the others in place.
 void ExpectSameRows(const tfx::TetraTable& table, int bytesPerPixel, uint32_t salt) {
+  tfx::TetraPlan plan;
+  plan.Prepare(table);
   std::mt19937 rng(salt);
   for (int width = 0; width <= 68; ++width) {
     const int pixels = width < 68 ? width : 4099;
     std::vector<uint8_t> expected(static_cast<size_t>(pixels) * bytesPerPixel + 16);
     for (auto& b : expected) b = static_cast<uint8_t>(rng());
     std::vector<uint8_t> actual = expected;
+    const std::vector<uint8_t> in = expected;
     tfx::TetraRowReference(table, expected.data(), pixels, bytesPerPixel);
-    tfx::TetraRow(table, actual.data(), pixels, bytesPerPixel);
+    tfx::TetraRow(plan, width % 2 ? in.data() : actual.data(), actual.data(), pixels,
+                  bytesPerPixel);
     if (expected != actual) {
       size_t i = 0;
       while (expected[i] == actual[i]) ++i;
@@ -99,20 +105,24 @@ TEST(CubeLutApply, DispatchFollowsTheTargetsInForce) {
 }
 
 // Random lattices, and hostile ones: mostly ordinary values, so that some corners mix with an
-// edge value and some do not.
+// edge value and some do not; each also grey, which takes the one-float-a-point rows.
 TEST(CubeLutApply, RandomAndHostileLatticesMatchTheReference) {
   const std::vector<float> edges = EdgeValues();
   for (const int n : {2, 3, 5, 17, 33, 64}) {
-    for (const bool hostile : {false, true}) {
-      SCOPED_TRACE(testing::Message() << n << (hostile ? " hostile" : " random"));
+    for (const int kind : {0, 1, 2, 3}) {
+      const bool hostile = kind % 2, grey = kind / 2;
+      SCOPED_TRACE(testing::Message()
+                   << n << (hostile ? " hostile" : " random") << (grey ? " grey" : ""));
       Lattice lattice(n);
       std::mt19937 rng(static_cast<uint32_t>(n + 100 * hostile));
       std::uniform_real_distribution<float> value(-40.0f, 300.0f);
-      lattice.Fill([&] {
-        if (!hostile) return value(rng);
-        return rng() % 3 == 0 ? edges[rng() % edges.size()]
-                              : std::ldexp(static_cast<float>(rng() % 4096) - 1024.0f, -2);
-      });
+      lattice.Fill(
+          [&] {
+            if (!hostile) return value(rng);
+            return rng() % 3 == 0 ? edges[rng() % edges.size()]
+                                  : std::ldexp(static_cast<float>(rng() % 4096) - 1024.0f, -2);
+          },
+          grey);
       ForEveryTarget([&] {
         ExpectSameRows(lattice.Table(), 4, 1);
         ExpectSameRows(lattice.Table(), 3, 2);
@@ -158,9 +168,11 @@ TEST(CubeLutApply, LatticePointsConvertLikeTheScalarHelper) {
       }
     }
   }
+  tfx::TetraPlan plan;
+  plan.Prepare(lattice.Table());
   ForEveryTarget([&] {
     std::vector<uint8_t> actual = row;
-    tfx::TetraRow(lattice.Table(), actual.data(), static_cast<int>(actual.size() / 4), 4);
+    tfx::TetraRow(plan, actual.data(), actual.data(), static_cast<int>(actual.size() / 4), 4);
     int failures = 0;
     for (size_t p = 0; p < actual.size() && failures < 10; p += 4) {
       for (int c = 0; c < 3; ++c) {
@@ -180,16 +192,23 @@ TEST(CubeLutApply, EveryColourMatchesTheReference) {
   std::uniform_real_distribution<float> value(-20.0f, 280.0f);
   lattice.Fill([&] { return value(rng); });
   const CxImage& colours = tfx_test::EveryColour();
-  const auto apply = [&](void (*rowFunction)(const tfx::TetraTable&, uint8_t*, int, int)) {
+  tfx::TetraPlan plan;
+  plan.Prepare(lattice.Table());
+  const auto apply = [&](bool reference) {
     tfx_test::Image image = tfx_test::Clone(colours);
     for (unsigned y = 0; y < image->GetHeight(); ++y) {
-      rowFunction(lattice.Table(), image->GetBits() + size_t{y} * image->GetEffWidth(),
-                  static_cast<int>(image->GetWidth()), 4);
+      uint8_t* row = image->GetBits() + size_t{y} * image->GetEffWidth();
+      const int width = static_cast<int>(image->GetWidth());
+      if (reference) {
+        tfx::TetraRowReference(lattice.Table(), row, width, 4);
+      } else {
+        tfx::TetraRow(plan, row, row, width, 4);
+      }
     }
     return image;
   };
-  const tfx_test::Image expected = apply(&tfx::TetraRowReference);
-  ForEveryTarget([&] { EXPECT_TRUE(tfx_test::SameBuffer(*expected, *apply(&tfx::TetraRow))); });
+  const tfx_test::Image expected = apply(true);
+  ForEveryTarget([&] { EXPECT_TRUE(tfx_test::SameBuffer(*expected, *apply(false))); });
 }
 
 // The interpolation a caller resamples with is the one doLUT applies: on a lattice of 18 points
