@@ -3,6 +3,7 @@
 // joins the two with ChromeKeyCombine.
 #include "effects/ChromeKeyTables.h"
 #include "effects/EffectParams.h"
+#include "effects/LutFileCache.h"
 #include "plugin/NLEDynamicEffect.h"
 
 namespace {
@@ -25,14 +26,16 @@ class NLEChromeKeyLut3dEffect final : public NLEDynamicEffect {
     const double offset = ParamDouble(kOffset);
     tables_.KeepCurrent(red, green, blue, contrast, offset);
 
+    const int mode = ParamInt(kMode);
+    const tfx::TetraPlan* plan =
+        mode == 1 ? &tables_.BeautyPlan() : (mode == 0 ? &tables_.AlphaPlan() : nullptr);
+    if (plan && CopyThroughTable(*plan, dst, dstWidth, dstHeight, dstPitch, src, srcWidth,
+                                 srcHeight, srcPitch)) {
+      return 0;
+    }
     // Never more rows than both frames hold: a foreground larger than the output is cut.
     myCopy(src, dst, srcWidth, srcHeight < dstHeight ? srcHeight : dstHeight, srcPitch, dstPitch);
-    const int mode = ParamInt(kMode);
-    if (mode == 1) {
-      tables_.Beauty().doLUT(dst, dstWidth, dstHeight, dstPitch, 4);
-    } else if (mode == 0) {
-      tables_.Alpha().doLUT(dst, dstWidth, dstHeight, dstPitch, 4);
-    }
+    if (plan) tfx::TetraImage(*plan, dst, dstPitch, dst, dstWidth, dstHeight, dstPitch, 4);
     return 0;
   }
 

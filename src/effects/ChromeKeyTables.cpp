@@ -6,6 +6,11 @@ namespace {
 
 uint8_t KeyByte(int v) { return static_cast<uint8_t>(v < 0 ? 0 : (v > 255 ? 255 : v)); }
 
+void PreparePlan(CubeLut& lut, tfx::TetraPlan& plan) {
+  plan.Prepare(tfx::TetraTable{lut.getLut3DData(nullptr, nullptr, nullptr, nullptr),
+                               lut.getFTData(nullptr), lut.getGTData(nullptr), lut.getLutSize()});
+}
+
 }  // namespace
 
 ChromeKeyTables::ChromeKeyTables() : beauty_(new OwnedCubeLut()), alpha_(new OwnedCubeLut()) {
@@ -32,7 +37,9 @@ ChromeKeyTables::Rebuilt ChromeKeyTables::KeepCurrent(int red, int green, int bl
                                                                   KeyByte(blue), contrast, offset));
   if (keyChanged) {
     generator_.getBeautyLut(beauty_->getLut3DData(nullptr, nullptr, nullptr, nullptr));
+    PreparePlan(*beauty_, beautyPlan_);
   }
   generator_.getAlphaLut(alpha_->getLut3DData(nullptr, nullptr, nullptr, nullptr));
+  PreparePlan(*alpha_, alphaPlan_);
   return {keyChanged, true};
 }

@@ -6,6 +6,7 @@
 #include <memory>
 
 #include "lut/ChromeKeyLut3dGenerator.h"
+#include "lut/CubeLutApply.h"
 #include "tessarofx/CubeLut.h"
 
 class ChromeKeyTables {
@@ -24,10 +25,15 @@ class ChromeKeyTables {
 
   CubeLut& Beauty() { return *beauty_; }
   CubeLut& Alpha() { return *alpha_; }
+  // The tables packed for the CPU rows, kept in step with every rebuild. The alpha table is grey
+  // and packs to one float a point.
+  const tfx::TetraPlan& BeautyPlan() const { return beautyPlan_; }
+  const tfx::TetraPlan& AlphaPlan() const { return alphaPlan_; }
 
  private:
   std::unique_ptr<CubeLut> beauty_;
   std::unique_ptr<CubeLut> alpha_;
+  tfx::TetraPlan beautyPlan_, alphaPlan_;
   NLEChromeKeyLut3dGenerator generator_;
   // -1 never matches a parameter, so the first frame builds both tables.
   int32_t lastRed_ = -1, lastGreen_ = -1, lastBlue_ = -1;

@@ -21,9 +21,14 @@ class NLEColorLut3dAdjustEffect final : public NLEDynamicEffect {
     lut_.Refresh(path);
 
     if (lut_.Loaded()) {
+      if (CopyThroughTable(lut_.Plan(), dst, dstWidth, dstHeight, dstPitch, src, srcWidth,
+                           srcHeight, srcPitch)) {
+        return 0;
+      }
       // Never more rows than both frames hold: a foreground larger than the output is cut.
       myCopy(src, dst, srcWidth, srcHeight < dstHeight ? srcHeight : dstHeight, srcPitch, dstPitch);
-      lut_.Table().doLUT(dst, dstWidth, dstHeight, dstPitch, 4);  // a refused table leaves the copy
+      // A refused table leaves the copy.
+      tfx::TetraImage(lut_.Plan(), dst, dstPitch, dst, dstWidth, dstHeight, dstPitch, 4);
       return 0;
     }
     // One block of the output's size, as the frames are packed; cut to what both buffers hold.

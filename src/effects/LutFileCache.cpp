@@ -1,5 +1,7 @@
 #include "effects/LutFileCache.h"
 
+#include <climits>
+#include <cstdint>
 #include <cwchar>
 
 #include "lut/OwnedCubeLut.h"
@@ -39,5 +41,20 @@ bool LutFileCache::Refresh(const std::wstring& path) {
   loadedPath_ = TranslatePath(path);
   loaded_ = false;
   loaded_ = table_->loadFile(loadedPath_.c_str());
+  if (loaded_) {
+    plan_.Prepare(tfx::TetraTable{table_->getLut3DData(nullptr, nullptr, nullptr, nullptr),
+                                  table_->getFTData(nullptr), table_->getGTData(nullptr),
+                                  table_->getLutSize()});
+  }
+  return true;
+}
+
+bool CopyThroughTable(const tfx::TetraPlan& plan, uint8_t* dst, int dstWidth, int dstHeight,
+                      int dstPitch, const uint8_t* src, int srcWidth, int srcHeight, int srcPitch) {
+  if (!plan.Usable() || !dst || !src || dst == src || dstWidth < 1 || dstHeight < 1) return false;
+  if (srcWidth != dstWidth || srcHeight < dstHeight || srcPitch != dstPitch) return false;
+  const int64_t bytes = int64_t{dstWidth} * 4;
+  if (dstPitch != bytes || bytes * dstHeight > INT_MAX) return false;
+  tfx::TetraImage(plan, src, srcPitch, dst, dstWidth, dstHeight, dstPitch, 4);
   return true;
 }

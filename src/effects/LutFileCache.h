@@ -5,6 +5,7 @@
 #include <memory>
 #include <string>
 
+#include "lut/CubeLutApply.h"
 #include "tessarofx/CubeLut.h"
 
 class LutFileCache {
@@ -20,9 +21,18 @@ class LutFileCache {
   // Created on first use, so that an effect whose path is never set holds no lattice.
   CubeLut& Table();
   bool Loaded() const { return loaded_; }
+  // The table as last read, packed for the CPU rows.
+  const tfx::TetraPlan& Plan() const { return plan_; }
 
  private:
+  tfx::TetraPlan plan_;
   std::wstring loadedPath_;
   std::unique_ptr<CubeLut> table_;
   bool loaded_ = false;
 };
+
+// The common case of the LUT effects' copy-then-apply, done in one pass: frames of one size with
+// no padding between rows, so that the copy would be exactly the pixels the table rewrites.
+// False (and nothing written) for any other shape, which the caller copies and applies itself.
+bool CopyThroughTable(const tfx::TetraPlan& plan, uint8_t* dst, int dstWidth, int dstHeight,
+                      int dstPitch, const uint8_t* src, int srcWidth, int srcHeight, int srcPitch);

@@ -36,7 +36,8 @@ void TetraRowReference(const TetraTable& t, uint8_t* row, int width, int bytesPe
 void TetraPlan::Prepare(const TetraTable& table) {
   table_ = table;
   const int n = table.size;
-  packed_ = n >= 1 && n <= 64;
+  usable_ = n >= 1 && n <= 64;
+  packed_ = usable_;
   for (int v = 0; v < 256 && packed_; ++v) packed_ = table.gt[v] >= 0 && table.gt[v] < n;
   if (!packed_) return;
   std::memcpy(ft_, table.ft, sizeof ft_);
@@ -99,7 +100,7 @@ void TetraRow(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width,
 
 void TetraImage(const TetraPlan& plan, const uint8_t* in, int inPitch, uint8_t* pixels, int width,
                 int height, int pitch, int bytesPerPixel) {
-  if (height < 1 || !in || !pixels || width < 1 || bytesPerPixel < 3) return;
+  if (!plan.Usable() || height < 1 || !in || !pixels || width < 1 || bytesPerPixel < 3) return;
   // Rows closer together than a row's bytes would run past the end of the caller's buffer; one
   // row needs no pitch at all.
   const int64_t rowBytes = int64_t{width} * bytesPerPixel;

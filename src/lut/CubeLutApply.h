@@ -73,6 +73,8 @@ class TetraPlan {
   void Prepare(const TetraTable& table);
 
   const TetraTable& Table() const { return table_; }
+  // False for a size outside 1..64, which doLUT refuses; such a plan leaves pixels alone.
+  bool Usable() const { return usable_; }
   // False when an index table entry lies outside the lattice's N points: only the reference
   // reads such a table the way doLUT always has.
   bool Packed() const { return packed_; }
@@ -85,6 +87,7 @@ class TetraPlan {
 
  private:
   TetraTable table_{};
+  bool usable_ = false;
   bool packed_ = false;
   bool grey_ = false;
   size_t capacity_ = 0;  // floats
@@ -99,7 +102,7 @@ class TetraPlan {
 void TetraRow(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width, int bytesPerPixel);
 
 // doLUT's checks and rows over a whole image, in place or from `in` (with its own pitch) to
-// `pixels`; images its arguments cannot describe are left alone.
+// `pixels`; images its arguments cannot describe, and plans that are not Usable, are left alone.
 void TetraImage(const TetraPlan& plan, const uint8_t* in, int inPitch, uint8_t* pixels, int width,
                 int height, int pitch, int bytesPerPixel);
 

@@ -80,6 +80,22 @@ HWY_INLINE VU ComponentBytes(VF v) {
   return hn::And(hn::BitCast(du, rounded), hn::Set(du, 255u));
 }
 
+// Lanes whose byte is the truncation of the float sum v + 0.5f: from 0 up, where the sum rounds
+// across an integer only for the largest float below 0.5 (it rounds to 1). Above 0.5 the sum has
+// at most one more bit than v, and lies less than 0.5 above a power of two it crossed, so a
+// rounding never reaches the next integer. NaN fails the comparison.
+HWY_INLINE MF Plain(VF v) {
+  const DF df;
+  return hn::And(hn::Ge(v, hn::Zero(df)), hn::Ne(v, hn::Set(df, 0.49999997f)));
+}
+
+// ComponentBytes for lanes that pass Plain.
+HWY_INLINE VU PlainBytes(VF v) {
+  const DF df;
+  const VF c = hn::Min(v, hn::Set(df, 254.5f));
+  return hn::BitCast(DU(), hn::ConvertTo(DI(), hn::Add(c, hn::Set(df, 0.5f))));
+}
+
 // What the first pass leaves for the second, per pixel of a block.
 struct Prepared {
   HWY_ALIGN float weight[4][kBlock];    // of C000, Ca, Cb, C111
@@ -210,14 +226,22 @@ HWY_INLINE VU Finish(const Kernel& kernel, VU p, const Prepared& prepared, size_
     for (int k = 0; k < 4; ++k) {
       c[k] = hn::GatherIndex(df, kernel.points, hn::Load(di, prepared.corner[k] + at));
     }
-    const VU v8 = ComponentBytes(Blend(w, c[0], c[1], c[2], c[3]));
+    const VF v = Blend(w, c[0], c[1], c[2], c[3]);
+    const VU v8 = hn::AllTrue(df, Plain(v)) ? PlainBytes(v) : ComponentBytes(v);
     return hn::Or(alpha, hn::Or(hn::Or(v8, hn::ShiftLeft<8>(v8)), hn::ShiftLeft<16>(v8)));
   } else {
     Corner c[4];
     for (int k = 0; k < 4; ++k) c[k] = LoadCorner(kernel.points, prepared.corner[k] + at);
-    const VU r8 = ComponentBytes(Blend(w, c[0].red, c[1].red, c[2].red, c[3].red));
-    const VU g8 = ComponentBytes(Blend(w, c[0].green, c[1].green, c[2].green, c[3].green));
-    const VU b8 = ComponentBytes(Blend(w, c[0].blue, c[1].blue, c[2].blue, c[3].blue));
+    const VF r = Blend(w, c[0].red, c[1].red, c[2].red, c[3].red);
+    const VF g = Blend(w, c[0].green, c[1].green, c[2].green, c[3].green);
+    const VF b = Blend(w, c[0].blue, c[1].blue, c[2].blue, c[3].blue);
+    VU r8, g8, b8;
+    // Lattices stay within 0..255 in practice; the general conversion is for the others.
+    if (hn::AllTrue(df, hn::And(Plain(r), hn::And(Plain(g), Plain(b))))) {
+      r8 = PlainBytes(r), g8 = PlainBytes(g), b8 = PlainBytes(b);
+    } else {
+      r8 = ComponentBytes(r), g8 = ComponentBytes(g), b8 = ComponentBytes(b);
+    }
     // Red to byte 2, green to byte 1, blue to byte 0.
     return hn::Or(hn::Or(alpha, b8), hn::Or(hn::ShiftLeft<8>(g8), hn::ShiftLeft<16>(r8)));
   }
