@@ -1,6 +1,8 @@
-// CubeLut::doLUT on random BGRA frames beside memcpy of the same frame, with a 33- and a 64-point
-// lattice, and the per-pixel reference rows for comparison. Random pixels scatter the lattice
-// reads as widely as any picture can, and every iteration starts again from the same frame.
+// CubeLut::doLUT beside memcpy of the same frame, with a 33- and a 64-point lattice, on random
+// pixels, which scatter the lattice reads as widely as any picture can, and on a photo-like
+// frame, whose neighbouring pixels fall in the same or nearby cells; and the per-pixel reference
+// rows on random pixels for comparison. Every iteration starts again from the same frame.
+#include <algorithm>
 #include <cmath>
 #include <memory>
 #include <string>
@@ -31,10 +33,36 @@ std::unique_ptr<CubeLut> MakeLut(int n) {
   return lut;
 }
 
+// Soft gradients in every channel, a few large blobs of colour and a little grain: what a camera
+// frame looks like to a lattice, which sees only how far apart neighbouring colours are.
+std::vector<uint8_t> PhotoBgra(int width, int height) {
+  std::vector<uint8_t> px(static_cast<size_t>(width) * height * 4);
+  std::mt19937 rng(11);
+  uint8_t* p = px.data();
+  for (int y = 0; y < height; ++y) {
+    const double v = static_cast<double>(y) / height;
+    for (int x = 0; x < width; ++x, p += 4) {
+      const double u = static_cast<double>(x) / width;
+      const double blob = std::exp(-40.0 * ((u - 0.3) * (u - 0.3) + (v - 0.6) * (v - 0.6)));
+      const double sky = 1.0 - v;
+      const double c[3] = {90 + 120 * sky * (1 - u) + 60 * blob + 20 * std::sin(9 * u + 4 * v),
+                           70 + 80 * sky + 110 * blob * u + 25 * std::sin(13 * v),
+                           50 + 170 * sky * sky + 30 * std::cos(7 * u - 5 * v)};
+      for (int k = 0; k < 3; ++k) {
+        const double grain = static_cast<double>(rng() % 7) - 3.0;
+        p[2 - k] = static_cast<uint8_t>(std::clamp(c[k] + grain, 0.0, 255.0));
+      }
+      p[3] = 255;
+    }
+  }
+  return px;
+}
+
 // Runs `apply` on a fresh copy of the frame each iteration; the copy is not timed.
 template <class Apply>
-void RunFrames(benchmark::State& state, BenchSize size, Apply apply) {
-  const std::vector<uint8_t> source = RandomBgra(size.width, size.height);
+void RunFrames(benchmark::State& state, BenchSize size, Apply apply, bool photo = false) {
+  const std::vector<uint8_t> source =
+      photo ? PhotoBgra(size.width, size.height) : RandomBgra(size.width, size.height);
   std::vector<uint8_t> frame = source;
   for (auto _ : state) {
     state.PauseTiming();
@@ -46,13 +74,16 @@ void RunFrames(benchmark::State& state, BenchSize size, Apply apply) {
   state.SetItemsProcessed(state.iterations() * size.width * size.height);
 }
 
-void BM_DoLut(benchmark::State& state, BenchSize size, int n) {
+void BM_DoLut(benchmark::State& state, BenchSize size, int n, bool photo) {
   const std::unique_ptr<CubeLut> lut = MakeLut(n);
-  RunFrames(state, size, [&](uint8_t* frame) {
-    if (lut->doLUT(frame, size.width, size.height, size.width * 4, 4) != 0) {
-      state.SkipWithError("doLUT failed");
-    }
-  });
+  RunFrames(
+      state, size,
+      [&](uint8_t* frame) {
+        if (lut->doLUT(frame, size.width, size.height, size.width * 4, 4) != 0) {
+          state.SkipWithError("doLUT failed");
+        }
+      },
+      photo);
 }
 
 void BM_ReferenceRows(benchmark::State& state, BenchSize size, int n) {
@@ -72,7 +103,8 @@ const struct Registrar {
       RegisterMemcpy(size);
       for (const int n : {33, 64}) {
         const std::string suffix = std::string("/") + size.label + "/" + std::to_string(n);
-        RegisterTimed("BM_CubeLutDoLUT" + suffix, BM_DoLut, size, n);
+        RegisterTimed("BM_CubeLutDoLUT" + suffix + "/random", BM_DoLut, size, n, false);
+        RegisterTimed("BM_CubeLutDoLUT" + suffix + "/photo", BM_DoLut, size, n, true);
         RegisterTimed("BM_CubeLutReference" + suffix, BM_ReferenceRows, size, n);
       }
     }
