@@ -85,6 +85,15 @@ class TetraPlan {
   int32_t Stride(int axis) const { return stride_[axis]; }       // floats between points
   int32_t Last(int axis) const { return stride_[axis] * (table_.size - 1); }
 
+  // A packed lattice too large for a core's second-level cache is applied a slab at a time:
+  // pixels are sorted by the range of red cells they fall in, each slab's pixels go through
+  // together while its planes stay cached, and the results are put back in order. 1 where the
+  // lattice fits (or the index table does not rise with the byte, so that slabs have no bytes).
+  static constexpr int kMaxSlabs = 4;
+  int Slabs() const { return slabs_; }
+  // The first red byte of slab s, 1 <= s < Slabs(); a byte's slab is how many of these it reaches.
+  int SlabStart(int s) const { return slabStart_[s]; }
+
  private:
   TetraTable table_{};
   bool usable_ = false;
@@ -95,6 +104,8 @@ class TetraPlan {
   float ft_[256] = {};
   int32_t lower_[3][256] = {};
   int32_t stride_[3] = {};
+  int slabs_ = 1;
+  int slabStart_[kMaxSlabs] = {};
 };
 
 // Applies the table to `width` pixels of `bytesPerPixel` bytes (blue, green, red first) from `in`

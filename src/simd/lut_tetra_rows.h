@@ -3,6 +3,7 @@
 // lattices included.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 
 namespace tfx {
@@ -14,6 +15,14 @@ class TetraPlan;
 // is the fast one.
 void TetraRowVector(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width,
                     int bytesPerPixel);
+
+// The uint32_t elements one slab of a band of `rows` rows of `width` pixels may need.
+size_t TetraBandCapacity(int width, int rows);
+
+// `rows` rows of 4-byte pixels (4-byte aligned, pitches in bytes) through a plan with Slabs() > 1,
+// a slab at a time; `scratch` holds Slabs() * TetraBandCapacity(width, rows) elements.
+void TetraBandVector(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
+                     ptrdiff_t pitch, int width, int rows, uint32_t* scratch, size_t capacity);
 
 // The name of the instruction set TetraRowVector would run now.
 const char* TetraRowVectorTarget();

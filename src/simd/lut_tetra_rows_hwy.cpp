@@ -319,19 +319,125 @@ void Rows(const Kernel& kernel, const uint8_t* in, uint8_t* out, int width, int 
   }
 }
 
+Kernel MakeKernel(const TetraPlan& plan) {
+  return {plan.Points(),
+          plan.Fractions(),
+          {plan.Lower(0), plan.Lower(1), plan.Lower(2)},
+          {plan.Stride(0), plan.Stride(1), plan.Stride(2)},
+          {plan.Last(0), plan.Last(1), plan.Last(2)}};
+}
+
 void TetraRowOfTarget(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width,
                       int bytesPerPixel) {
   if (width <= 0) return;
-  const Kernel kernel{plan.Points(),
-                      plan.Fractions(),
-                      {plan.Lower(0), plan.Lower(1), plan.Lower(2)},
-                      {plan.Stride(0), plan.Stride(1), plan.Stride(2)},
-                      {plan.Last(0), plan.Last(1), plan.Last(2)}};
+  const Kernel kernel = MakeKernel(plan);
   if (plan.Grey()) {
     Rows<true>(kernel, in, out, width, bytesPerPixel);
   } else {
     Rows<false>(kernel, in, out, width, bytesPerPixel);
   }
+}
+
+constexpr int kSlabs = TetraPlan::kMaxSlabs;
+using MU = hn::Mask<DU>;
+
+// The slabs of a band: which slab each pixel's red byte falls in, the slab's pixels in the order
+// they were met, and how far each slab has been filled or read back.
+struct Slabs {
+  int32_t start[kSlabs];
+  uint32_t* pixels[kSlabs];
+  size_t count[kSlabs];
+
+  HWY_INLINE VU Of(VU p) const {
+    const DI di;
+    const VI r = hn::And(hn::BitCast(di, hn::ShiftRight<16>(p)), hn::Set(di, 255));
+    VI slab = hn::Zero(di);
+    for (int k = 1; k < kSlabs; ++k) {
+      slab = hn::Sub(slab, hn::VecFromMask(di, hn::Gt(r, hn::Set(di, start[k] - 1))));
+    }
+    return hn::BitCast(DU(), slab);
+  }
+
+  HWY_INLINE void Sort(VU p) {
+    const DU du;
+    const VU slab = Of(p);
+    for (int k = 0; k < kSlabs; ++k) {
+      count[k] += hn::CompressStore(p, hn::Eq(slab, hn::Set(du, k)), du, pixels[k] + count[k]);
+    }
+  }
+
+  // The next lanes of every slab, each to where its pixel came from.
+  HWY_INLINE VU Gather(VU p) {
+    const DU du;
+    const VU slab = Of(p);
+    VU result = hn::Zero(du);
+    for (int k = 0; k < kSlabs; ++k) {
+      const MU m = hn::Eq(slab, hn::Set(du, k));
+      result = hn::Or(result, ExpandLoad(m, pixels[k] + count[k]));
+      count[k] += hn::CountTrue(du, m);
+    }
+    return result;
+  }
+
+  // Consecutive values from `from` into the lanes of `m`, zero elsewhere.
+  static HWY_INLINE VU ExpandLoad(MU m, const uint32_t* from) {
+#if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
+    return VU{_mm512_maskz_expandloadu_epi32(m.raw, from)};
+#else
+    const DU du;
+    HWY_ALIGN uint32_t lanes[HWY_MAX_BYTES / sizeof(uint32_t)];
+    HWY_ALIGN uint32_t take[HWY_MAX_BYTES / sizeof(uint32_t)];
+    hn::Store(hn::VecFromMask(du, m), du, take);
+    for (size_t i = 0, j = 0; i < hn::Lanes(du); ++i) lanes[i] = take[i] ? from[j++] : 0;
+    return hn::Load(du, lanes);
+#endif
+  }
+};
+
+// Every row of the band, in whole vectors; a row's last partial vector goes through a
+// zero-padded copy, in both passes alike, so both meet the same pixels in the same order.
+template <class Visit>
+HWY_INLINE void EveryVector(const uint8_t* in, ptrdiff_t inPitch, uint8_t* out, ptrdiff_t pitch,
+                            size_t width, int rows, Visit visit) {
+  const DU du;
+  const size_t lanes = hn::Lanes(du);
+  const size_t whole = width / lanes * lanes;
+  for (int y = 0; y < rows; ++y) {
+    const uint32_t* from = reinterpret_cast<const uint32_t*>(in + y * inPitch);
+    uint32_t* to = out ? reinterpret_cast<uint32_t*>(out + y * pitch) : nullptr;
+    for (size_t x = 0; x < whole; x += lanes) visit(from + x, to ? to + x : nullptr);
+    if (whole < width) {
+      HWY_ALIGN uint32_t tail[HWY_MAX_BYTES / sizeof(uint32_t)] = {};
+      std::memcpy(tail, from + whole, (width - whole) * 4);
+      visit(tail, to ? tail : nullptr);
+      if (to) std::memcpy(to + whole, tail, (width - whole) * 4);
+    }
+  }
+}
+
+void TetraBandOfTarget(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
+                       ptrdiff_t pitch, int width, int rows, uint32_t* scratch, size_t capacity) {
+  if (width <= 0 || rows <= 0) return;
+  const DU du;
+  const Kernel kernel = MakeKernel(plan);
+  Slabs slabs;
+  for (int k = 0; k < kSlabs; ++k) {
+    slabs.start[k] = plan.SlabStart(k);
+    slabs.pixels[k] = scratch + k * capacity;
+    slabs.count[k] = 0;
+  }
+  const size_t w = static_cast<size_t>(width);
+  EveryVector(in, inPitch, nullptr, 0, w, rows,
+              [&](const uint32_t* from, uint32_t*) { slabs.Sort(hn::LoadU(du, from)); });
+  for (int k = 0; k < kSlabs; ++k) {
+    uint8_t* const pixels = reinterpret_cast<uint8_t*>(slabs.pixels[k]);
+    Rows4<false>(kernel, pixels, pixels, slabs.count[k]);
+    slabs.count[k] = 0;
+  }
+  // In place, each vector of pixels is read before its results are stored over it.
+  EveryVector(in, inPitch, out, pitch, w, rows, [&](const uint32_t* from, uint32_t* to) {
+    hn::StoreU(slabs.Gather(hn::LoadU(du, from)), du, to);
+  });
 }
 
 const char* TargetOfThisTarget() { return hwy::TargetName(HWY_TARGET); }
@@ -344,7 +450,21 @@ HWY_AFTER_NAMESPACE();
 namespace tfx {
 
 HWY_EXPORT(TetraRowOfTarget);
+HWY_EXPORT(TetraBandOfTarget);
 HWY_EXPORT(TargetOfThisTarget);
+
+size_t TetraBandCapacity(int width, int rows) {
+  // Whole vectors of every row, and one more that CompressStore may write past the last.
+  constexpr size_t kLanes = HWY_MAX_BYTES / sizeof(uint32_t);
+  const size_t padded = (static_cast<size_t>(width) + kLanes - 1) / kLanes * kLanes;
+  return padded * static_cast<size_t>(rows) + kLanes;
+}
+
+void TetraBandVector(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
+                     ptrdiff_t pitch, int width, int rows, uint32_t* scratch, size_t capacity) {
+  HWY_DYNAMIC_DISPATCH(TetraBandOfTarget)
+  (plan, in, inPitch, out, pitch, width, rows, scratch, capacity);
+}
 
 void TetraRowVector(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width,
                     int bytesPerPixel) {

@@ -131,6 +131,51 @@ TEST(CubeLutApply, RandomAndHostileLatticesMatchTheReference) {
   }
 }
 
+// A lattice too large for the cache goes through whole images a slab of red cells at a time: two
+// bands (the second partial), rows whose width is no whole number of vectors, a padded pitch, in
+// place and from a separate image; and a rising index table altered so that its slabs no longer
+// hold whole bytes.
+TEST(CubeLutApply, ImagesThroughSlabsMatchTheReference) {
+  constexpr int kWidth = 1001, kHeight = 300, kPitch = kWidth * 4 + 12;
+  for (const int n : {50, 64}) {
+    Lattice lattice(n);
+    std::mt19937 rng(static_cast<uint32_t>(n));
+    std::uniform_real_distribution<float> value(-20.0f, 280.0f);
+    lattice.Fill([&] { return value(rng); });
+    std::vector<uint8_t> source(static_cast<size_t>(kPitch) * kHeight);
+    for (auto& b : source) b = static_cast<uint8_t>(rng());
+    std::vector<uint8_t> expected = source;
+    for (int y = 0; y < kHeight; ++y) {
+      tfx::TetraRowReference(lattice.Table(), expected.data() + y * kPitch, kWidth, 4);
+    }
+    // The padding between rows is the caller's and stays as it was.
+    for (int y = 0; y < kHeight; ++y) {
+      std::memcpy(expected.data() + y * kPitch + kWidth * 4,
+                  source.data() + y * kPitch + kWidth * 4, kPitch - kWidth * 4);
+    }
+    tfx::TetraPlan plan;
+    plan.Prepare(lattice.Table());
+    ASSERT_GT(plan.Slabs(), 1);
+    ForEveryTarget([&] {
+      std::vector<uint8_t> inPlace = source, copied(source.size(), 0);
+      tfx::TetraImage(plan, inPlace.data(), kPitch, inPlace.data(), kWidth, kHeight, kPitch, 4);
+      EXPECT_EQ(inPlace, expected) << n << " in place";
+      std::vector<uint8_t> dense(static_cast<size_t>(kWidth) * 4 * kHeight);
+      tfx::TetraImage(plan, source.data(), kPitch, dense.data(), kWidth, kHeight, kWidth * 4, 4);
+      for (int y = 0; y < kHeight; ++y) {
+        ASSERT_EQ(
+            0, std::memcmp(dense.data() + y * kWidth * 4, expected.data() + y * kPitch, kWidth * 4))
+            << n << " row " << y;
+      }
+    });
+  }
+  Lattice lattice(64);
+  lattice.lut->getGTData(nullptr)[200] = 3;
+  tfx::TetraPlan plan;
+  plan.Prepare(lattice.Table());
+  EXPECT_EQ(plan.Slabs(), 1);
+}
+
 // With N = 52 every multiple of 5 falls on a lattice point and gives C000 weight 1 and the other
 // corners weight 0. Those corners have an odd index, so keeping odd points at 0 lets every even
 // point's value reach the byte conversion unmixed, NaN and infinities included.
