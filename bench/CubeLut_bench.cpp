@@ -1,9 +1,11 @@
 // CubeLut::doLUT beside memcpy of the same frame, with a 33- and a 64-point lattice, on random
 // pixels, which scatter the lattice reads as widely as any picture can, and on a photo-like
 // frame, whose neighbouring pixels fall in the same or nearby cells; and the per-pixel reference
-// rows on random pixels for comparison. Every iteration starts again from the same frame.
+// rows on random pixels for comparison. With TFX_BENCH_CUBE naming a ".cube" file, doLUT with that
+// file too. Every iteration starts again from the same frame.
 #include <algorithm>
 #include <cmath>
+#include <cstdlib>
 #include <memory>
 #include <string>
 #include <vector>
@@ -86,6 +88,18 @@ void BM_DoLut(benchmark::State& state, BenchSize size, int n, bool photo) {
       photo);
 }
 
+// A ".cube" file read through loadFile, on random pixels: the peers script hands the same file
+// to FFmpeg and OpenColorIO.
+void BM_DoLutFile(benchmark::State& state, BenchSize size, std::string path) {
+  auto lut = std::make_unique<CubeLut>();
+  if (!lut->loadFile(std::wstring(path.begin(), path.end()).c_str())) {
+    state.SkipWithError("cannot read the .cube file");
+    return;
+  }
+  RunFrames(state, size,
+            [&](uint8_t* frame) { lut->doLUT(frame, size.width, size.height, size.width * 4, 4); });
+}
+
 void BM_ReferenceRows(benchmark::State& state, BenchSize size, int n) {
   const std::unique_ptr<CubeLut> lut = MakeLut(n);
   const tfx::TetraTable table{lut->getLut3DData(nullptr, nullptr, nullptr, nullptr),
@@ -106,6 +120,10 @@ const struct Registrar {
         RegisterTimed("BM_CubeLutDoLUT" + suffix + "/random", BM_DoLut, size, n, false);
         RegisterTimed("BM_CubeLutDoLUT" + suffix + "/photo", BM_DoLut, size, n, true);
         RegisterTimed("BM_CubeLutReference" + suffix, BM_ReferenceRows, size, n);
+      }
+      if (const char* path = std::getenv("TFX_BENCH_CUBE")) {
+        RegisterTimed(std::string("BM_CubeLutDoLUT/") + size.label + "/file", BM_DoLutFile, size,
+                      std::string(path));
       }
     }
   }

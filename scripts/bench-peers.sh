@@ -1,0 +1,209 @@
+#!/usr/bin/env bash
+# Our filters against their nearest peers in FFmpeg, OpenColorIO and OpenCV, on the same frames in
+# the same run, every program on one thread pinned to one core. Prints one table: Mpixel/s of
+# each at 1080p and 4K, and ours divided by the peer's.
+#
+#   scripts/bench-peers.sh            (after scripts/setup.sh; builds what it needs)
+#   BENCH_CORE=1 FFMPEG_FRAMES=8 MIN_TIME=0.3 scripts/bench-peers.sh
+#
+# How each side is timed:
+#  - Ours: the Google Benchmark binaries, pixels divided by CPU time per iteration.
+#  - FFmpeg: raw BGRA frames in (-f rawvideo -pix_fmt bgra), -threads 1 -filter_threads 1
+#    -filter_complex_threads 1, the user CPU time -benchmark reports (utime) for N frames through
+#    the filter minus N frames through -vf null, so reading and demuxing the frames cancel out.
+#    Where FFmpeg converts the frames for a filter (it inserts a scaler), that conversion is part
+#    of its figure, and the table names the format it converted to.
+#  - OpenColorIO: bench_peer_ocio_lut, a FileTransform with tetrahedral interpolation through the
+#    optimized CPU processor, 8-bit packed BGRA in and out, CPU time per frame.
+#  - OpenCV: measured by bench_blur in the same run as our blurs (cv::setNumThreads(1)).
+# Every frame is random: the one bench_cube_lut uses (its generator is shared with the OCIO peer,
+# which writes the file FFmpeg reads); the other benches draw theirs the same way.
+set -euo pipefail
+cd "$(dirname "$0")/.."
+
+core=${BENCH_CORE:-1}
+ffmpeg_frames=${FFMPEG_FRAMES:-6}
+min_time=${MIN_TIME:-0.3}
+pin=(taskset -c "$core")
+
+for tool in cmake ffmpeg python3 taskset; do
+  command -v "$tool" >/dev/null || { echo "bench-peers: $tool is missing (scripts/setup.sh)" >&2; exit 1; }
+done
+
+[ -f build/release/CMakeCache.txt ] || cmake --preset release >/dev/null
+benches=(bench_color_adjust bench_white_balance bench_hsl_adjust bench_vignette bench_lens_adjust
+         bench_cube_lut bench_lut_effects bench_denoise bench_blur bench_peer_ocio_lut)
+cmake --build build/release -j "$(nproc)" --target "${benches[@]}" >/dev/null
+bin=build/release/bin
+
+work=$(mktemp -d)
+trap 'rm -rf "$work"' EXIT
+
+# The 33-point look the LUT pairs share: a gentle S-curve with a warm shift.
+python3 - "$work/look33.cube" <<'PY'
+import sys
+n = 33
+with open(sys.argv[1], "w") as f:
+    f.write("LUT_3D_SIZE %d\n" % n)
+    for b in range(n):
+        for g in range(n):
+            for r in range(n):
+                c = [v / (n - 1) for v in (r, g, b)]
+                c = [0.8 * v + 0.2 * v * v * (3 - 2 * v) for v in c]
+                f.write("%.6f %.6f %.6f\n" % (c[0] * 0.97 + 0.03, c[1], c[2] * 0.95))
+PY
+
+sizes=("1080p 1920 1080" "4K 3840 2160")
+for s in "${sizes[@]}"; do
+  read -r label w h <<<"$s"
+  "$bin/bench_peer_ocio_lut" --write-frame "$work/$label.raw" "$w" "$h"
+done
+
+# --- ours ---------------------------------------------------------------------------------------
+ours() {  # BINARY FILTER
+  TFX_BENCH_CUBE="$work/look33.cube" "${pin[@]}" "$bin/$1" --benchmark_filter="$2" \
+    --benchmark_min_time="$min_time" --benchmark_out="$work/$1.json" --benchmark_out_format=json \
+    >/dev/null 2>&1
+}
+echo "bench-peers: our benchmarks on core $core" >&2
+ours bench_color_adjust '^BM_ColorAdjust/[^/]+/vibrance/'
+ours bench_white_balance '^BM_WhiteBalanceAdjust/'
+ours bench_hsl_adjust '^BM_HSLAdjust/[^/]+/all8/'
+ours bench_vignette '^BM_Vignette/[^/]+/darken/'
+ours bench_lens_adjust '^BM_Lens/[^/]+/distortion/'
+ours bench_cube_lut '^BM_CubeLutDoLUT/[^/]+/file/'
+ours bench_lut_effects '^BM_ChromeKeyLut3d/[^/]+/mask/'
+ours bench_denoise '^BM_DeNoiseRGB/'
+ours bench_blur '^BM_(GaussianBlur|CvGaussianBlur)/[^/]+/bgra|^BM_(FastAverageBlur|CvBlur)/[^/]+/bgr/r7/|^BM_(FastFilter|CvMedianBlur)/[^/]+/r7/'
+
+# --- OpenColorIO --------------------------------------------------------------------------------
+echo "bench-peers: OpenColorIO" >&2
+for s in "${sizes[@]}"; do
+  read -r label w h <<<"$s"
+  echo "$label $("${pin[@]}" "$bin/bench_peer_ocio_lut" "$work/look33.cube" "$w" "$h" 2)" \
+    >>"$work/ocio.txt"
+done
+
+# --- FFmpeg -------------------------------------------------------------------------------------
+# FILTER_ID SIZE FRAMES GRAPH: utime of the graph minus utime of null, and the format FFmpeg
+# converted the frames to, if it did.
+ffmpeg_run() {  # SIZE FRAMES GRAPH -> utime in seconds
+  local label=$1 frames=$2 graph=$3 w h
+  read -r _ w h <<<"$(printf '%s\n' "${sizes[@]}" | grep "^$label ")"
+  "${pin[@]}" ffmpeg -hide_banner -nostdin -benchmark -threads 1 -filter_threads 1 \
+    -filter_complex_threads 1 -f rawvideo -pix_fmt bgra -s "${w}x${h}" \
+    -stream_loop $((frames - 1)) -i "$work/$label.raw" -vf "$graph" -f null - 2>&1 |
+    sed -n 's/.*utime=\([0-9.]*\)s.*/\1/p'
+}
+ffmpeg_format() {  # GRAPH -> the format FFmpeg converts BGRA to for it, or nothing
+  ffmpeg -hide_banner -nostdin -v verbose -f rawvideo -pix_fmt bgra -s 64x64 \
+    -i "$work/1080p.raw" -vf "$1" -frames:v 1 -f null - 2>&1 |
+    sed -n 's/.*auto_scale.*fmt:bgra.*-> .*fmt:\([a-z0-9]*\).*/\1/p' | head -1
+}
+peer() {  # ID GRAPH [FRAMES]
+  local id=$1 graph=$2 frames
+  local format
+  format=$(ffmpeg_format "$graph")
+  for s in "${sizes[@]}"; do
+    read -r label w h <<<"$s"
+    frames=${3:-$ffmpeg_frames}
+    local with without
+    with=$(ffmpeg_run "$label" "$frames" "$graph")
+    without=$(ffmpeg_run "$label" "$frames" null)
+    echo "$id $label $w $h $frames $with $without ${format:--}" >>"$work/ffmpeg.txt"
+  done
+}
+echo "bench-peers: FFmpeg, $ffmpeg_frames frames a case" >&2
+peer vibrance 'vibrance=intensity=0.4'
+peer colortemperature 'colortemperature=temperature=5000'
+peer huesaturation 'huesaturation=hue=20:saturation=-0.2:intensity=0.1'
+peer vignette 'vignette=angle=PI/4'
+peer lenscorrection 'lenscorrection=k1=-0.2:k2=0.05'
+peer lut3d "lut3d=file=$work/look33.cube:interp=tetrahedral"
+peer colorkey 'colorkey=color=0x28C83C:similarity=0.3:blend=0.1'
+peer dctdnoiz 'dctdnoiz=sigma=4.5' 1
+peer gblur 'gblur=sigma=5'
+peer avgblur 'avgblur=sizeX=7'
+
+# --- the table ----------------------------------------------------------------------------------
+python3 - "$work" <<'PY'
+import json, os, sys
+
+work = sys.argv[1]
+ours = {}  # benchmark name without /real_time -> Mpixel/s by CPU time
+for name in os.listdir(work):
+    if not name.endswith(".json"):
+        continue
+    with open(os.path.join(work, name)) as f:
+        for b in json.load(f).get("benchmarks", []):
+            if b.get("error_occurred") or "items_per_second" not in b:
+                continue
+            # Items per second are by real time; the two times share a unit.
+            rate = b["items_per_second"] * b["real_time"] / b["cpu_time"] / 1e6
+            ours[b["run_name"].replace("/real_time", "")] = rate
+
+ffmpeg = {}
+with open(os.path.join(work, "ffmpeg.txt")) as f:
+    for line in f:
+        fid, size, w, h, frames, with_t, without_t, fmt = line.split()
+        seconds = float(with_t) - float(without_t)
+        rate = int(frames) * int(w) * int(h) / seconds / 1e6 if seconds > 0 else float("nan")
+        ffmpeg[(fid, size)] = (rate, fmt)
+ocio = {}
+with open(os.path.join(work, "ocio.txt")) as f:
+    for line in f:
+        size, rate = line.split()
+        ocio[size] = float(rate)
+
+pairs = [  # ours, its benchmark (size in {}), peer, how the peer is found
+    ("ColorAdjust vibrance", "BM_ColorAdjust/{}/vibrance", "FFmpeg vibrance", ("ff", "vibrance")),
+    ("WhiteBalanceAdjust", "BM_WhiteBalanceAdjust/{}", "FFmpeg colortemperature",
+     ("ff", "colortemperature")),
+    ("HSLAdjust, all bands", "BM_HSLAdjust/{}/all8", "FFmpeg huesaturation",
+     ("ff", "huesaturation")),
+    ("VignetteAdjust", "BM_Vignette/{}/darken", "FFmpeg vignette", ("ff", "vignette")),
+    ("DistortionFringingAdjust", "BM_Lens/{}/distortion", "FFmpeg lenscorrection",
+     ("ff", "lenscorrection")),
+    ("doLUT 33 (tetrahedral)", "BM_CubeLutDoLUT/{}/file", "FFmpeg lut3d tetrahedral",
+     ("ff", "lut3d")),
+    ("doLUT 33 (tetrahedral)", "BM_CubeLutDoLUT/{}/file", "OpenColorIO CPU, tetrahedral",
+     ("ocio", None)),
+    ("ChromeKeyLut3d mask", "BM_ChromeKeyLut3d/{}/mask", "FFmpeg colorkey", ("ff", "colorkey")),
+    ("deNoiseRGB", "BM_DeNoiseRGB/{}", "FFmpeg dctdnoiz", ("ff", "dctdnoiz")),
+    ("GaussianBlur r10", "BM_GaussianBlur/{}/bgra/r10", "FFmpeg gblur sigma 5", ("ff", "gblur")),
+    ("GaussianBlur r10", "BM_GaussianBlur/{}/bgra/r10", "OpenCV GaussianBlur sigma 5",
+     ("cv", "BM_CvGaussianBlur/{}/bgra/sigma5")),
+    ("fastAverageBlur r7 (BGR)", "BM_FastAverageBlur/{}/bgr/r7", "FFmpeg avgblur 7",
+     ("ff", "avgblur")),
+    ("fastAverageBlur r7 (BGR)", "BM_FastAverageBlur/{}/bgr/r7", "OpenCV blur 15x15",
+     ("cv", "BM_CvBlur/{}/bgr/r7")),
+    ("fastFilter r7 (median)", "BM_FastFilter/{}/r7", "OpenCV medianBlur 15",
+     ("cv", "BM_CvMedianBlur/{}/r7")),
+]
+
+def fmt(v):
+    return "n/a" if v is None or v != v else ("%.1f" % v if v < 1000 else "%.0f" % v)
+
+rows = []
+for size in ("1080p", "4K"):
+    for name, bench, peer_name, (kind, key) in pairs:
+        mine = ours.get(bench.format(size))
+        note = ""
+        if kind == "ff":
+            theirs, conv = ffmpeg.get((key, size), (None, "-"))
+            if conv != "-":
+                note = "converts to " + conv
+        elif kind == "ocio":
+            theirs = ocio.get(size)
+        else:
+            theirs = ours.get(key.format(size))
+        ratio = mine / theirs if mine and theirs and theirs == theirs else None
+        rows.append((size, name, fmt(mine), peer_name, fmt(theirs),
+                     "n/a" if ratio is None else "%.2f" % ratio, note))
+
+head = ("size", "ours", "Mpx/s", "peer", "Mpx/s", "ours/peer", "note")
+print("| " + " | ".join(head) + " |")
+print("|" + "|".join(["---"] * len(head)) + "|")
+for r in rows:
+    print("| " + " | ".join(r) + " |")
+PY
