@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <climits>
+#include <cmath>
 #include <cstring>
 #include <initializer_list>
 #include <vector>
@@ -64,6 +65,14 @@ void TetraPlan::Prepare(const TetraTable& table) {
   for (int v = 0; v < 256 && packed_; ++v) packed_ = table.gt[v] >= 0 && table.gt[v] < n;
   if (!packed_) return;
   std::memcpy(ft_, table.ft, sizeof ft_);
+  positional_ = true;
+  for (int v = 0; v < 256; ++v) {
+    const float lower = static_cast<float>(table.gt[v]);
+    position_[v] = lower + table.ft[v];
+    const float floor = std::floor(position_[v]), rest = position_[v] - floor;
+    positional_ =
+        positional_ && floor == lower && std::memcmp(&rest, &table.ft[v], sizeof rest) == 0;
+  }
 
   const auto point = [&](int i, int j, int k) {
     return table.lattice + ((i * 64 + j) * 64 + k) * 3;

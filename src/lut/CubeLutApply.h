@@ -81,6 +81,10 @@ class TetraPlan {
   bool Grey() const { return grey_; }
   const float* Points() const { return points_.get(); }
   const float* Fractions() const { return ft_; }
+  // Where each byte lies along an axis, in lattice points: its lower index plus its fraction, when
+  // that sum gives both back exactly (floor and remainder), as for the tables doLUT builds; then
+  // one look-up a byte does for two. Null otherwise.
+  const float* Positions() const { return positional_ ? position_ : nullptr; }
   const int32_t* Lower(int axis) const { return lower_[axis]; }  // red 0, green 1, blue 2
   int32_t Stride(int axis) const { return stride_[axis]; }       // floats between points
   int32_t Last(int axis) const { return stride_[axis] * (table_.size - 1); }
@@ -102,6 +106,8 @@ class TetraPlan {
   size_t capacity_ = 0;  // floats
   hwy::AlignedFreeUniquePtr<float[]> points_;
   float ft_[256] = {};
+  float position_[256] = {};
+  bool positional_ = false;
   int32_t lower_[3][256] = {};
   int32_t stride_[3] = {};
   int slabs_ = 1;

@@ -105,9 +105,11 @@ struct Prepared {
 struct Kernel {
   const float* points;
   const float* ft;
+  const float* position;  // or null
   const int32_t* lower[3];
   int32_t stride[3];
   int32_t last[3];
+  int32_t lastIndex;
 
   // The weights and corners of the pixels `p` (32-bit lanes, blue in the low byte) into lane
   // `at` onwards of `prepared`.
@@ -120,15 +122,38 @@ struct Kernel {
     const VI g = hn::And(hn::ShiftRight<8>(pi), mask8);
     const VI r = hn::And(hn::ShiftRight<16>(pi), mask8);
 
-    const VI ro = hn::GatherIndex(di, lower[0], r);
-    const VI go = hn::GatherIndex(di, lower[1], g);
-    const VI bo = hn::GatherIndex(di, lower[2], b);
-    const auto step = [&](VI lo, int axis) {
-      return hn::Sub(hn::Min(hn::Add(lo, hn::Set(di, stride[axis])), hn::Set(di, last[axis])), lo);
-    };
-    const Axis red{hn::GatherIndex(df, ft, r), step(ro, 0)};
-    const Axis green{hn::GatherIndex(df, ft, g), step(go, 1)};
-    const Axis blue{hn::GatherIndex(df, ft, b), step(bo, 2)};
+    Axis red, green, blue;
+    VI p000;
+    if (position) {
+      // Gathers cost the most here: one a byte gives the lower index (its floor) and the
+      // fraction (the rest). Index times stride and their sum stay far below 2^24, so float
+      // arithmetic is exact.
+      const VF last_index = hn::Set(df, static_cast<float>(lastIndex));
+      VF offset = hn::Zero(df);
+      const VI channel[3] = {r, g, b};
+      Axis* const axes[3] = {&red, &green, &blue};
+      for (int axis = 0; axis < 3; ++axis) {
+        const VF where = hn::GatherIndex(df, position, channel[axis]);
+        const VF index = hn::Floor(where);
+        offset = hn::Add(offset, hn::Mul(index, hn::Set(df, static_cast<float>(stride[axis]))));
+        const MF inside = hn::Lt(index, last_index);
+        *axes[axis] = {hn::Sub(where, index),
+                       hn::IfThenElseZero(hn::RebindMask(di, inside), hn::Set(di, stride[axis]))};
+      }
+      p000 = hn::ConvertTo(di, offset);
+    } else {
+      const VI ro = hn::GatherIndex(di, lower[0], r);
+      const VI go = hn::GatherIndex(di, lower[1], g);
+      const VI bo = hn::GatherIndex(di, lower[2], b);
+      const auto step = [&](VI lo, int axis) {
+        return hn::Sub(hn::Min(hn::Add(lo, hn::Set(di, stride[axis])), hn::Set(di, last[axis])),
+                       lo);
+      };
+      red = {hn::GatherIndex(df, ft, r), step(ro, 0)};
+      green = {hn::GatherIndex(df, ft, g), step(go, 1)};
+      blue = {hn::GatherIndex(df, ft, b), step(bo, 2)};
+      p000 = hn::Add(hn::Add(ro, go), bo);
+    }
 
     // The reference's comparison chain, as masks.
     const MF rg = hn::Gt(red.fraction, green.fraction);
@@ -149,7 +174,6 @@ struct Kernel {
     hn::Store(hn::Sub(second.fraction, third), df, prepared.weight[2] + at);
     hn::Store(third, df, prepared.weight[3] + at);
 
-    const VI p000 = hn::Add(hn::Add(ro, go), bo);
     const VI pa = hn::Add(p000, first.step);
     hn::Store(p000, di, prepared.corner[0] + at);
     hn::Store(pa, di, prepared.corner[1] + at);
@@ -322,9 +346,11 @@ void Rows(const Kernel& kernel, const uint8_t* in, uint8_t* out, int width, int 
 Kernel MakeKernel(const TetraPlan& plan) {
   return {plan.Points(),
           plan.Fractions(),
+          plan.Positions(),
           {plan.Lower(0), plan.Lower(1), plan.Lower(2)},
           {plan.Stride(0), plan.Stride(1), plan.Stride(2)},
-          {plan.Last(0), plan.Last(1), plan.Last(2)}};
+          {plan.Last(0), plan.Last(1), plan.Last(2)},
+          plan.Table().size - 1};
 }
 
 void TetraRowOfTarget(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width,

@@ -105,7 +105,8 @@ TEST(CubeLutApply, DispatchFollowsTheTargetsInForce) {
 }
 
 // Random lattices, and hostile ones: mostly ordinary values, so that some corners mix with an
-// edge value and some do not; each also grey, which takes the one-float-a-point rows.
+// edge value and some do not; each also grey, which takes the one-float-a-point rows. The hostile
+// ones also have fraction tables the rows cannot read as positions.
 TEST(CubeLutApply, RandomAndHostileLatticesMatchTheReference) {
   const std::vector<float> edges = EdgeValues();
   for (const int n : {2, 3, 5, 17, 33, 64}) {
@@ -123,6 +124,11 @@ TEST(CubeLutApply, RandomAndHostileLatticesMatchTheReference) {
                                   : std::ldexp(static_cast<float>(rng() % 4096) - 1024.0f, -2);
           },
           grey);
+      if (hostile) {
+        // Fractions whose sum with their index no longer gives them back.
+        lattice.lut->getFTData(nullptr)[17] = -0.0f;
+        lattice.lut->getFTData(nullptr)[200] = 1.5f;
+      }
       ForEveryTarget([&] {
         ExpectSameRows(lattice.Table(), 4, 1);
         ExpectSameRows(lattice.Table(), 3, 2);
