@@ -73,6 +73,11 @@ void TetraPlan::Prepare(const TetraTable& table) {
     positional_ =
         positional_ && floor == lower && std::memcmp(&rest, &table.ft[v], sizeof rest) == 0;
   }
+  divisor_ = positional_ ? 255.0f / static_cast<float>(n - 1) : 0.0f;
+  for (int v = 0; v < 256 && divisor_ != 0.0f; ++v) {
+    const float quotient = static_cast<float>(v) / divisor_;
+    if (std::memcmp(&quotient, &position_[v], sizeof quotient) != 0) divisor_ = 0.0f;
+  }
 
   const auto point = [&](int i, int j, int k) {
     return table.lattice + ((i * 64 + j) * 64 + k) * 3;

@@ -85,6 +85,9 @@ class TetraPlan {
   // that sum gives both back exactly (floor and remainder), as for the tables doLUT builds; then
   // one look-up a byte does for two. Null otherwise.
   const float* Positions() const { return positional_ ? position_ : nullptr; }
+  // The float that every byte divided by gives its position, as doLUT's own tables are made; 0
+  // where the positions are not such quotients. A division costs less than a gather.
+  float Divisor() const { return divisor_; }
   const int32_t* Lower(int axis) const { return lower_[axis]; }  // red 0, green 1, blue 2
   int32_t Stride(int axis) const { return stride_[axis]; }       // floats between points
   int32_t Last(int axis) const { return stride_[axis] * (table_.size - 1); }
@@ -108,6 +111,7 @@ class TetraPlan {
   float ft_[256] = {};
   float position_[256] = {};
   bool positional_ = false;
+  float divisor_ = 0.0f;
   int32_t lower_[3][256] = {};
   int32_t stride_[3] = {};
   int slabs_ = 1;

@@ -106,6 +106,7 @@ struct Kernel {
   const float* points;
   const float* ft;
   const float* position;  // or null
+  float divisor;          // or 0
   const int32_t* lower[3];
   int32_t stride[3];
   int32_t last[3];
@@ -133,7 +134,10 @@ struct Kernel {
       const VI channel[3] = {r, g, b};
       Axis* const axes[3] = {&red, &green, &blue};
       for (int axis = 0; axis < 3; ++axis) {
-        const VF where = hn::GatherIndex(df, position, channel[axis]);
+        const VF where =
+            divisor != 0.0f
+                ? hn::Div(hn::ConvertTo(df, channel[axis]), hn::Set(df, divisor))
+                : hn::GatherIndex(df, position, channel[axis]);
         const VF index = hn::Floor(where);
         offset = hn::Add(offset, hn::Mul(index, hn::Set(df, static_cast<float>(stride[axis]))));
         const MF inside = hn::Lt(index, last_index);
@@ -347,6 +351,7 @@ Kernel MakeKernel(const TetraPlan& plan) {
   return {plan.Points(),
           plan.Fractions(),
           plan.Positions(),
+          plan.Divisor(),
           {plan.Lower(0), plan.Lower(1), plan.Lower(2)},
           {plan.Stride(0), plan.Stride(1), plan.Stride(2)},
           {plan.Last(0), plan.Last(1), plan.Last(2)},
