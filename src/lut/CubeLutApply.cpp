@@ -5,7 +5,7 @@
 #include <cmath>
 #include <cstring>
 #include <initializer_list>
-#include <vector>
+#include <memory>
 
 #include "simd/lut_tetra_rows.h"
 
@@ -165,13 +165,16 @@ void TetraImage(const TetraPlan& plan, const uint8_t* in, int inPitch, uint8_t* 
                        reinterpret_cast<uintptr_t>(pixels) % 4 == 0 && inPitch % 4 == 0 &&
                        pitch % 4 == 0;
   if (plan.Packed() && plan.Slabs() > 1 && bytesPerPixel == 4 && aligned) {
-    // Bands of about a quarter of a million pixels: each reads the whole lattice into the cache
-    // once, slab by slab, and its sorted pixels stay a few MiB.
-    const int bandRows = std::max(1, (1 << 18) / width);
+    // Bands of about a million pixels: each reads the whole lattice into the cache once, slab by
+    // slab, which is then a few bytes a pixel, and its sorted pixels stream through in order.
+    // The storage is left uninitialised, so that only the part the pixels fill is ever touched.
+    const int bandRows = std::max(1, (1 << 20) / width);
     const size_t capacity = TetraBandCapacity(width, bandRows);
-    thread_local std::vector<uint32_t> scratch;
-    if (scratch.size() < capacity * TetraPlan::kMaxSlabs) {
-      scratch.resize(capacity * TetraPlan::kMaxSlabs);
+    thread_local std::unique_ptr<uint32_t[]> scratch;
+    thread_local size_t scratchSize = 0;
+    if (scratchSize < capacity * TetraPlan::kMaxSlabs) {
+      scratchSize = capacity * TetraPlan::kMaxSlabs;
+      scratch.reset(new uint32_t[scratchSize]);
     }
     for (int y = 0; y < height; y += bandRows) {
       const int rows = std::min(bandRows, height - y);
@@ -180,7 +183,7 @@ void TetraImage(const TetraPlan& plan, const uint8_t* in, int inPitch, uint8_t* 
       if (Coherent(plan.Table(), from, inPitch, width, rows)) {
         for (int r = 0; r < rows; ++r) TetraRow(plan, from + r * inPitch, to + r * pitch, width, 4);
       } else {
-        TetraBandVector(plan, from, inPitch, to, pitch, width, rows, scratch.data(), capacity);
+        TetraBandVector(plan, from, inPitch, to, pitch, width, rows, scratch.get(), capacity);
       }
     }
     return;

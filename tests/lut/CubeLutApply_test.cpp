@@ -142,7 +142,7 @@ TEST(CubeLutApply, RandomAndHostileLatticesMatchTheReference) {
 // place and from a separate image; and a rising index table altered so that its slabs no longer
 // hold whole bytes.
 TEST(CubeLutApply, ImagesThroughSlabsMatchTheReference) {
-  constexpr int kWidth = 1001, kHeight = 300, kPitch = kWidth * 4 + 12;
+  constexpr int kWidth = 1001, kHeight = 1100, kPitch = kWidth * 4 + 12;
   for (const int n : {50, 64}) {
     Lattice lattice(n);
     std::mt19937 rng(static_cast<uint32_t>(n));
