@@ -134,10 +134,9 @@ struct Kernel {
       const VI channel[3] = {r, g, b};
       Axis* const axes[3] = {&red, &green, &blue};
       for (int axis = 0; axis < 3; ++axis) {
-        const VF where =
-            divisor != 0.0f
-                ? hn::Div(hn::ConvertTo(df, channel[axis]), hn::Set(df, divisor))
-                : hn::GatherIndex(df, position, channel[axis]);
+        const VF where = divisor != 0.0f
+                             ? hn::Div(hn::ConvertTo(df, channel[axis]), hn::Set(df, divisor))
+                             : hn::GatherIndex(df, position, channel[axis]);
         const VF index = hn::Floor(where);
         offset = hn::Add(offset, hn::Mul(index, hn::Set(df, static_cast<float>(stride[axis]))));
         const MF inside = hn::Lt(index, last_index);
