@@ -15,6 +15,10 @@
 // arithmetic that made them (a compiler handed the offsets in a register pulls them out lane by
 // lane through the shuffle port, which the transposes need too), and lets many of them wait on
 // the cache at once.
+//
+// Tables as doLUT builds them (each byte's position, lower index plus fraction, a quotient by one
+// float) take a division instead of the per-byte look-ups, which as gathers cost the most; lattices
+// too large for the cache go through whole bands sorted into slabs of red cells (TetraBand).
 #include <cstring>
 
 #include "lut/CubeLutApply.h"
@@ -296,7 +300,7 @@ void Rows4(const Kernel& kernel, const uint8_t* in, uint8_t* out, size_t width) 
   const size_t whole = width / lanes * lanes;
   for (size_t start = 0; start < whole; start += kBlock) {
     const size_t count = whole - start < kBlock ? whole - start : kBlock;
-    // The rows of a frame are 4-byte aligned in practice; a copy keeps an odd one well defined.
+    // Rows only reaches here with both rows 4-byte aligned; odd ones go through RowsN.
     Block<kGrey>(kernel, reinterpret_cast<const uint32_t*>(in + 4 * start),
                  reinterpret_cast<uint32_t*>(out + 4 * start), count);
   }
