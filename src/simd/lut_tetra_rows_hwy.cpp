@@ -18,7 +18,7 @@
 //
 // Tables as doLUT builds them (each byte's position, lower index plus fraction, a quotient by one
 // float) take a division instead of the per-byte look-ups, which as gathers cost the most; lattices
-// too large for the cache go through whole bands sorted into slabs of red cells (TetraBand).
+// too large for the cache go through whole bands sorted into slabs of red cells (TetraBandVector).
 #include <cstring>
 
 #include "lut/CubeLutApply.h"
