@@ -199,7 +199,7 @@ void VignetteRow(uint8_t* bgra, const float* mask, size_t count, const VignetteB
 
 VignettePlan::VignettePlan(int width, int height, float amount, float feather, float highlights,
                            float size, float roundness, float exposure)
-    : width_(width), height_(height) {
+    : height_(height) {
   if (width <= 0 || height <= 0 || (amount == 0.0f && exposure == 0.0f)) return;
   const std::unique_ptr<float[]> quadrant =
       GradientQuadrant(width, height, feather / 100.0f, size / 100.0f, roundness / 100.0f);

@@ -63,7 +63,7 @@ class VignettePlan {
     size_t start, end;
     size_t mask;  // into masks_, for blended runs
   };
-  int width_, height_;
+  int height_;
   bool active_ = false;
   VignetteBlend blend_ = {};
   std::vector<size_t> firstRun_;  // per quadrant row, and one past the last
