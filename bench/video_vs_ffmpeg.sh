@@ -5,7 +5,7 @@
 # the wall time splits between decoding, the filters and encoding.
 #   video_vs_ffmpeg.sh TOOL [SECONDS]
 set -euo pipefail
-tool=$1
+tool=$(realpath "$1")
 seconds=${2:-4}
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
