@@ -2,8 +2,9 @@
 // effect on OpenCV matrices.
 //
 // Every per-channel step becomes a 256-entry table built with the per-pixel arithmetic. The
-// temperature's HSL round trip runs inline on packed pixels with the same float expressions as
-// CxImage::RGBtoHSL/HSLtoRGB, so the row loops give the bytes of the per-pixel forms.
+// temperature's HSL round trip runs on packed pixels in vector kernels with the same float
+// expressions as CxImage::RGBtoHSL/HSLtoRGB, so the row loops give the bytes of the per-pixel
+// forms.
 #include "tessarofx/WhiteBalance.h"
 
 #include <algorithm>
@@ -17,6 +18,7 @@
 #include "adjust/ImageWalk.h"
 #include "adjust/WhiteBalanceFormulas.h"
 #include "simd/color_adjust_rows.h"
+#include "simd/hsl_relight.h"
 
 namespace {
 
@@ -131,79 +133,6 @@ uint8_t TemperatureChannel(int ch, float tch, float w) {
   const auto tinted =
       static_cast<uint8_t>(static_cast<int>(tfx::TintedChannel(static_cast<float>(ch), tch)));
   return MixChannel(ch, tinted, w);
-}
-
-// The conversions of CxImage::RGBtoHSL and HSLtoRGB that depend on one byte or one divisor.
-struct HslTables {
-  float hue[256];   // H * 360 / 255
-  float unit[256];  // S / 255 and L / 255
-  // n / d == (n * inverse[d]) >> 32 for the numerators of RGBtoHSL (n <= 255 * 255 + 255) and
-  // d <= 510: inverse[d] * d = 2^32 + e with 0 < e <= d, so the product overshoots n / d by
-  // n * e / (d * 2^32) < 1 / d, too little to carry any fraction of n / d past the next integer.
-  // inverse[0] = 0 sends a grey to saturation 0 without a branch.
-  uint64_t inverse[511];
-
-  HslTables() {
-    for (int v = 0; v < 256; ++v) {
-      hue[v] = static_cast<float>(v * 360) / 255.0f;
-      unit[v] = v / 255.0f;
-    }
-    inverse[0] = 0;
-    for (uint64_t d = 1; d < 511; ++d) inverse[d] = (uint64_t{1} << 32) / d + 1;
-  }
-
-  int Divide(int n, int d) const {
-    return static_cast<int>((static_cast<uint64_t>(n) * inverse[d]) >> 32);
-  }
-};
-
-// Four floats (blue, green, red, unused) in one register. Each lane does exactly the float
-// operations the scalar code does, so the results are the same bits; the selections replace the
-// hue branches, which random colours mispredict.
-using Float4 = float __attribute__((vector_size(16)));
-using Int4 = int32_t __attribute__((vector_size(16)));
-
-// CxImage::HSLtoRGB's three channels from p, q and the hue in degrees: HueToRGB on hue - 120,
-// hue and hue + 120, then trunc(v * 255).
-void HueBytes(float p, float q, float hue, uint8_t* blue, uint8_t* green, uint8_t* red) {
-  const Float4 ps = {p, p, p, p};
-  const Float4 qs = {q, q, q, q};
-  Float4 h = {hue - 120.0f, hue, hue + 120.0f, hue};
-  h = h > 360.0f ? h - 360.0f : h < 0.0f ? h + 360.0f : h;
-  // The rising edge p + (q - p) * h / 60 below 60 and the falling one p + (q - p) * (240 - h) /
-  // 60 below 240 differ only in the product, so one division serves both.
-  const Float4 ramp = ps + (h < 60.0f ? (qs - ps) * h : (qs - ps) * (240.0f - h)) / 60.0f;
-  const Float4 v = h < 60.0f ? ramp : h < 180.0f ? qs : h < 240.0f ? ramp : ps;
-  const Int4 bytes = __builtin_convertvector(v * 255.0f, Int4);
-  *blue = static_cast<uint8_t>(bytes[0]);
-  *green = static_cast<uint8_t>(bytes[1]);
-  *red = static_cast<uint8_t>(bytes[2]);
-}
-
-// CxImage::RGBtoHSL's hue and saturation of (r, g, b) with its lightness replaced by `l`, then
-// CxImage::HSLtoRGB, written into p (packing pk): the same integer and float steps as the
-// members. A grey needs no branch of its own: its saturation comes out 0, which makes p = q = l
-// and every channel trunc(l * 255), the members' grey.
-void RelightPixel(int r, int g, int b, int l, const HslTables& t, const Packing& pk, uint8_t* p) {
-  const int cMax = Max3(r, g, b);
-  const int cMin = Min3(r, g, b);
-  const int sum = cMax + cMin;
-  const int d = cMax - cMin;
-  const int ownL = (sum * 255 + 255) / 510;
-  const int den = ownL <= 127 ? sum : 510 - sum;
-  const int s = t.Divide(d * 255 + den / 2, den);
-  const int rDelta = t.Divide((cMax - r) * 42 + d / 2, d);
-  const int gDelta = t.Divide((cMax - g) * 42 + d / 2, d);
-  const int bDelta = t.Divide((cMax - b) * 42 + d / 2, d);
-  const int h = r == cMax   ? bDelta - gDelta
-                : g == cMax ? 85 + rDelta - bDelta
-                            : 170 + gDelta - rDelta;
-  const float lf = t.unit[l];
-  const float sf = t.unit[s];
-  const float q = lf <= 0.5f ? (1.0f + sf) * lf : lf + sf - lf * sf;
-  const float hf = t.hue[h & 255];
-  const float pf = 2.0f * lf - q;
-  HueBytes(pf, q, hf, &p[pk.blue], &p[1], &p[pk.red]);
 }
 
 // ---- tint ----------------------------------------------------------------------------------
@@ -353,14 +282,11 @@ CxImage* temperatureAdjustment(CxImage* image, long t) {
 
   Packing pk;
   if (PackedPixels(*image, &pk)) {
-    const HslTables tables;
-    ForEachRow(image, [&](uint8_t* p, size_t count) {
-      for (size_t i = 0; i < count; ++i, p += 4) {
-        const int r = p[pk.red], g = p[1], b = p[pk.blue];
-        const int l = (Max3(r, g, b) + Min3(r, g, b)) >> 1;
-        RelightPixel(mixRed[r], mixGreen[g], mixBlue[b], l, tables, pk, p);
-      }
-    });
+    int32_t red[256], green[256], blue[256];
+    for (int v = 0; v < 256; ++v) red[v] = mixRed[v], green[v] = mixGreen[v], blue[v] = mixBlue[v];
+    const tfx::HslRelightRows& rows = tfx::BestHslRelightRows();
+    ForEachRow(image,
+               [&](uint8_t* p, size_t count) { rows.relight(p, count, pk.red, red, green, blue); });
   } else {
     ForEachPixel(image, [&](tagRGBQUAD c) {
       const tagRGBQUAD mixed{mixBlue[c.rgbBlue], mixGreen[c.rgbGreen], mixRed[c.rgbRed], 0};

@@ -14,6 +14,7 @@
 #include <string>
 #include <vector>
 
+#include "simd/hsl_relight.h"
 #include "support/ImageBuilders.h"
 
 namespace {
@@ -48,20 +49,32 @@ tagRGBQUAD RefBlackBody(long kelvin) {
   return tagRGBQUAD{uint8_t(int(b)), uint8_t(int(g)), uint8_t(int(r)), 0};
 }
 
+// The temperature's blend of each channel value, red, green and blue (t not 11500).
+struct TemperatureMix {
+  int32_t channel[3][256];
+
+  explicit TemperatureMix(long t) {
+    const long k = t < 11500 ? 26000 - t : std::max(18100 - t, 1700L);
+    const tagRGBQUAD tc = RefBlackBody(k);
+    const float target[3] = {tc.rgbRed / 255.0f, tc.rgbGreen / 255.0f, tc.rgbBlue / 255.0f};
+    const float w = float(std::fabs(1.0 - k / 11500.0) * 1.7);
+    for (int i = 0; i < 3; ++i) {
+      for (int ch = 0; ch < 256; ++ch) {
+        const int m = uint8_t(int(ch / 255.0f * target[i] * 255.0f));
+        channel[i][ch] = RefClamp(m * w + ch * (1.0f - w));
+      }
+    }
+  }
+};
+
 void RefTemperature(CxImage* image, long t) {
   if (t == 11500) return;
-  const long k = t < 11500 ? 26000 - t : std::max(18100 - t, 1700L);
-  const tagRGBQUAD tc = RefBlackBody(k);
-  const float tr = tc.rgbRed / 255.0f, tg = tc.rgbGreen / 255.0f, tb = tc.rgbBlue / 255.0f;
-  const float w = float(std::fabs(1.0 - k / 11500.0) * 1.7);
-  const auto mix = [&](int ch, float tch) {
-    const int m = uint8_t(int(ch / 255.0f * tch * 255.0f));
-    return RefClamp(m * w + ch * (1.0f - w));
-  };
+  const TemperatureMix mix(t);
   for (unsigned long y = 0; y < image->GetHeight(); ++y) {
     for (unsigned long x = 0; x < image->GetWidth(); ++x) {
       const tagRGBQUAD c = image->GetPixelColor(x, y, true);
-      const tagRGBQUAD m{mix(c.rgbBlue, tb), mix(c.rgbGreen, tg), mix(c.rgbRed, tr), 0};
+      const tagRGBQUAD m{uint8_t(mix.channel[2][c.rgbBlue]), uint8_t(mix.channel[1][c.rgbGreen]),
+                         uint8_t(mix.channel[0][c.rgbRed]), 0};
       tagRGBQUAD hsl = CxImage::RGBtoHSL(m);
       hsl.rgbBlue = uint8_t((std::max({c.rgbRed, c.rgbGreen, c.rgbBlue}) +
                              std::min({c.rgbRed, c.rgbGreen, c.rgbBlue})) >>
@@ -177,6 +190,31 @@ INSTANTIATE_TEST_SUITE_P(EveryColour, WhiteBalanceSweep, testing::ValuesIn(kOper
                          [](const testing::TestParamInfo<const Operation*>& p) {
                            return std::string(p.param->name);
                          });
+
+// The image function runs the best kernel set only; every set, over every colour and in both
+// channel orders.
+TEST(WhiteBalance, TemperatureKernelsOfEverySetMatchThePerPixelForm) {
+  for (const long t : {4000L, -30000L, 11501L}) {
+    SCOPED_TRACE(t);
+    const TemperatureMix mix(t);
+    const Image expected = Clone(EveryColour());
+    RefTemperature(expected.get(), t);
+    const Image expectedRgba = NoiseImage(67, 9, 32, IPF_RGBA, 268, 5);
+    const Image rgba = Clone(*expectedRgba);
+    RefTemperature(expectedRgba.get(), t);
+    for (const tfx::HslRelightRows* rows : tfx::SupportedHslRelightRows()) {
+      SCOPED_TRACE(rows->name);
+      const Image actual = Clone(EveryColour());
+      rows->relight(actual->GetBits(), actual->GetSize() / 4, 2, mix.channel[0], mix.channel[1],
+                    mix.channel[2]);
+      EXPECT_TRUE(SameBuffer(*expected, *actual));
+      const Image actualRgba = Clone(*rgba);
+      rows->relight(actualRgba->GetBits(), actualRgba->GetSize() / 4, 0, mix.channel[0],
+                    mix.channel[1], mix.channel[2]);
+      EXPECT_TRUE(SameBuffer(*expectedRgba, *actualRgba));
+    }
+  }
+}
 
 TEST(WhiteBalance, OtherLayoutsAndPaddedRowsMatchThePerPixelForm) {
   const struct {
