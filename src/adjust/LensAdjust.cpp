@@ -23,6 +23,7 @@
 
 #include "adjust/LensMaps.h"
 #include "image/ImageLayout.h"
+#include "simd/lens_resample.h"
 
 namespace tfx {
 namespace {
@@ -45,12 +46,6 @@ MapCache& FringingCache() {
 }
 
 std::atomic<uint64_t> g_builds{0};
-
-// Toward zero; values outside int, and NaN, give INT_MIN instead of being undefined.
-int TruncToInt(double v) {
-  if (v > -2147483649.0 && v < 2147483648.0) return static_cast<int>(v);
-  return INT_MIN;
-}
 
 // The low 16 bits, as a two's-complement value.
 int16_t Low16(int v) { return static_cast<int16_t>(static_cast<uint16_t>(v)); }
@@ -110,37 +105,96 @@ void Direction(float u, float v, float r, float* cosT, float* sinT) {
   *sinT = r == 0.0f ? 0.0f : v / r;
 }
 
-// All in float but r^e, which is taken in double and rounded to float.
+// What a distortion map takes from the frame size and the sign of k alone, per quadrant point:
+// the radius, r^e (taken in double, rounded to float) and the direction. A strength that changes
+// every frame keeps its sign, so only the cheap per-strength step is redone.
+struct DistortBasis {
+  int width = 0;
+  int height = 0;
+  int kind = -1;  // 0 for k < 0, 1 for k > 0, 2 otherwise
+  std::unique_ptr<float[]> r, power, cosT, sinT;
+};
+
+struct BasisCache {
+  std::mutex mutex;  // held while a build reads the basis
+  DistortBasis basis;
+};
+
+BasisCache& DistortBasisCache() {
+  static BasisCache cache;
+  return cache;
+}
+
+// All in float. The basis's rows are qw points apart.
+bool FillBasis(DistortBasis* b, int width, int height, int kind, int qw, float nx, float ny,
+               double power) {
+  const size_t count = size_t(qw) * size_t((height >> 1) + 1);
+  b->kind = -1;
+  for (auto* plane : {&b->r, &b->power, &b->cosT, &b->sinT}) {
+    plane->reset(new (std::nothrow) float[count]);
+    if (!*plane) return false;
+  }
+  for (int j = 0; j <= (height >> 1); ++j) {
+    for (int i = 0; i < qw; ++i) {
+      const float u = static_cast<float>(i) / nx;
+      const float v = static_cast<float>(j) / ny;
+      const float r = std::sqrt(u * u + v * v);
+      const size_t q = size_t(j) * size_t(qw) + size_t(i);
+      Direction(u, v, r, &b->cosT[q], &b->sinT[q]);
+      b->r[q] = r;
+      b->power[q] = static_cast<float>(std::pow(static_cast<double>(r), power));
+    }
+  }
+  b->width = width;
+  b->height = height;
+  b->kind = kind;
+  return true;
+}
+
+// All in float but r^e, which is taken in double and rounded to float. Each quadrant row gives
+// the map rows at that distance above and below the centre.
 LensMapsRef BuildDistort(float d, int width, int height) {
   std::unique_ptr<LensMaps> maps = NewMaps(d, width, height, 1);
-  Quadrant<float> o;
-  if (!maps || !o.Alloc(width, height)) return LensMapsRef();
+  const int qw = (width >> 1) + 1;
+  std::unique_ptr<float[]> rowX(new (std::nothrow) float[size_t(qw)]);
+  std::unique_ptr<float[]> rowY(new (std::nothrow) float[size_t(qw)]);
+  if (!maps || !rowX || !rowY) return LensMapsRef();
   const float k = d / 100.0f;
-  const float cx = static_cast<float>(width >> 1);
-  const float cy = static_cast<float>(height >> 1);
-  const float diagonal = std::sqrt(cx * cx + cy * cy);
+  const int cx = width >> 1;
+  const int cy = height >> 1;
+  const float fcx = static_cast<float>(cx);
+  const float fcy = static_cast<float>(cy);
+  const float diagonal = std::sqrt(fcx * fcx + fcy * fcy);
   const float nx = k < 0.0f ? static_cast<float>(width) : diagonal;
   const float ny = k < 0.0f ? static_cast<float>(height) : diagonal;
   const double power = k > 0.0f ? 3.0 : 6.0;
   const float rescale = k >= 0.0f ? 1.0f / (k + 1.0f) : 1.0f;
-  for (int j = 0; j <= (height >> 1); ++j) {
-    for (int i = 0; i < o.qw; ++i) {
-      const float u = static_cast<float>(i) / nx;
-      const float v = static_cast<float>(j) / ny;
-      const float r = std::sqrt(u * u + v * v);
-      float cosT, sinT;
-      Direction(u, v, r, &cosT, &sinT);
-      const float rp =
-          (static_cast<float>(std::pow(static_cast<double>(r), power)) * k + r) * rescale;
-      const size_t q = size_t(j) * size_t(o.qw) + size_t(i);
-      o.x[q] = cosT * rp * nx;
-      o.y[q] = sinT * rp * ny;
-    }
+  const int kind = k < 0.0f ? 0 : k > 0.0f ? 1 : 2;
+  const float scale[4] = {k, rescale, nx, ny};
+
+  const LensResampleRows& rows = BestLensResampleRows();
+  BasisCache& cache = DistortBasisCache();
+  std::lock_guard<std::mutex> lock(cache.mutex);
+  DistortBasis& b = cache.basis;
+  if ((b.width != width || b.height != height || b.kind != kind) &&
+      !FillBasis(&b, width, height, kind, qw, nx, ny, power)) {
+    return LensMapsRef();
   }
   // No clamping.
-  Assemble(o, width, height, maps->plane[0].get(), [](float sx, float sy) {
-    return LensPoint{Low16(TruncToInt(sx)), Low16(TruncToInt(sy))};
-  });
+  LensPoint* out = maps->plane[0].get();
+  for (int j = 0; j <= cy; ++j) {
+    const size_t q = size_t(j) * size_t(qw);
+    rows.distortOffsets(&b.r[q], &b.power[q], &b.cosT[q], &b.sinT[q], size_t(qw), scale, rowX.get(),
+                        rowY.get());
+    if (cy + j < height) {
+      rows.assembleRow(rowX.get(), rowY.get(), false, width, cx, fcx, fcy,
+                       out + size_t(cy + j) * size_t(width));
+    }
+    if (j > 0) {
+      rows.assembleRow(rowX.get(), rowY.get(), true, width, cx, fcx, fcy,
+                       out + size_t(cy - j) * size_t(width));
+    }
+  }
   return LensMapsRef(maps.release());
 }
 
@@ -278,7 +332,10 @@ bool DistortFrom(const CxImage& source, CxImage* target, float d) {
   const size_t count = pixels < fits ? pixels : fits;
   const size_t rowBytes = size_t(width) * pixelBytes;
   const LensPoint* map = maps->plane[0].get();
-  if (pixelBytes == 4) {
+  if (pixelBytes == 4 && rowBytes <= 65535 && source.GetSize() <= INT32_MAX) {
+    BestLensResampleRows().distort(map, count, static_cast<int32_t>(rowBytes), source.GetBits(),
+                                   static_cast<int32_t>(source.GetSize()), target->GetBits());
+  } else if (pixelBytes == 4) {
     ResampleBytes<4>(map, count, rowBytes, source.GetBits(), source.GetSize(), target->GetBits(),
                      4);
   } else {
@@ -324,6 +381,15 @@ bool FringeFrom(const CxImage& source, CxImage* target, float f) {
     return w;
   };
   const bool checked = width > 32768 || height > 32768;
+  if (!checked && source.GetSize() <= INT32_MAX) {
+    const LensResampleRows& rows = BestLensResampleRows();
+    for (int y = 0; y < height; ++y) {
+      const size_t i0 = size_t(y) * size_t(width);
+      rows.fringe(blue + i0, green + i0, red + i0, size_t(width), src, static_cast<int32_t>(stride),
+                  target->GetBits() + size_t(y) * target->GetEffWidth());
+    }
+    return true;
+  }
   const auto checkedWord = [&](LensPoint p) -> uint32_t {
     if (p.x < 0 || p.y < 0 || p.x >= width || p.y >= height) return 0;
     return word(p);
@@ -362,6 +428,11 @@ CxImage* fringingFilter(CxImage* img, float f) {
 }
 
 void releaseLensVariables() {
+  {
+    tfx::DistortBasis dropped;
+    std::lock_guard<std::mutex> lock(tfx::DistortBasisCache().mutex);
+    std::swap(dropped, tfx::DistortBasisCache().basis);
+  }
   for (tfx::MapCache* cache : {&tfx::DistortCache(), &tfx::FringingCache()}) {
     tfx::LensMapsRef dropped[tfx::kSlots];
     {

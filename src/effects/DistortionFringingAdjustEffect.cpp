@@ -29,10 +29,14 @@ class NLEDistortionFringingAdjustEffect final : public NLEDynamicEffect {
       const CxImage source(&in, static_cast<unsigned>(srcWidth), static_cast<unsigned>(srcHeight),
                            32, static_cast<unsigned>(srcStride), IPF_BGRA);
       if (fringing != 0.0f && distortion != 0.0f) {
-        CxImage distorted(static_cast<unsigned>(dstWidth), static_cast<unsigned>(dstHeight), 32,
-                          IPF_BGRA);
-        if (tfx::DistortFrom(source, &distorted, distortion) &&
-            tfx::FringeFrom(distorted, &image, fringing)) {
+        // Kept between frames: a fresh frame-sized buffer costs its page faults every frame.
+        if (!distorted_.GetBits() || distorted_.GetWidth() != unsigned(dstWidth) ||
+            distorted_.GetHeight() != unsigned(dstHeight)) {
+          distorted_.Create(static_cast<unsigned>(dstWidth), static_cast<unsigned>(dstHeight), 32,
+                            IPF_BGRA);
+        }
+        if (tfx::DistortFrom(source, &distorted_, distortion) &&
+            tfx::FringeFrom(distorted_, &image, fringing)) {
           return 0;
         }
       } else if (tfx::DistortFrom(source, &image, distortion) ||
@@ -46,6 +50,9 @@ class NLEDistortionFringingAdjustEffect final : public NLEDynamicEffect {
     fringingFilter(&image, fringing);
     return 0;
   }
+
+ private:
+  CxImage distorted_;
 };
 
 const NLEDistortionFringingAdjustEffect::_auto_register s_register(

@@ -5,9 +5,12 @@
 #include <cmath>
 #include <cstdint>
 #include <cstring>
+#include <limits>
+#include <random>
 #include <vector>
 
 #include "adjust/LensMaps.h"
+#include "simd/lens_resample.h"
 #include "support/ImageBuilders.h"
 
 namespace {
@@ -190,6 +193,84 @@ TEST(LensCache, ReusesMapsUntilStrengthSizeOrReleaseChanges) {
   EXPECT_NE(tfx::FringingMaps(10.0f, 40, 30), fringing);
   EXPECT_EQ(builds(), 7u);
   EXPECT_EQ(changed->plane[0][0].x, ReferenceDistortMap(10.5f, 40, 30)[0].x);
+}
+
+// The image functions run the best kernel set only; every set against the per-point forms, on
+// row lengths with a partial last vector, sources outside the buffer, and offsets that overflow
+// int or are NaN.
+TEST(LensResampleRows, EverySetMatchesThePerPointForms) {
+  const int w = 67, h = 23;
+  std::mt19937 rng(5);
+  const auto uniform = [&](int lo, int hi) {
+    return std::uniform_int_distribution<int>(lo, hi)(rng);
+  };
+  const std::vector<uint8_t> src = tfx_test::NoiseBytes(size_t(w) * h * 4 + 12 * h, 4);
+  Map wild(size_t(w) * h), inside[3];
+  for (auto& p : wild) p = {int16_t(uniform(-400, 700)), int16_t(uniform(-3, h + 3))};
+  for (Map& plane : inside) {
+    for (int i = 0; i < w * h; ++i)
+      plane.push_back({int16_t(uniform(0, w - 1)), int16_t(uniform(0, h - 1))});
+  }
+  const int srcSize = w * h * 4;
+  std::vector<uint8_t> distorted(static_cast<size_t>(srcSize));
+  for (size_t i = 0; i < wild.size(); ++i) {
+    const int pos = wild[i].y * w * 4 + wild[i].x;
+    const bool in = pos >= 0 && pos + 4 <= srcSize;
+    std::memcpy(&distorted[i * 4], &src[in ? size_t(pos) : i * 4], 4);
+  }
+  const int stride = w * 4 + 12;
+  const auto word = [&](tfx::LensPoint p) {
+    uint32_t v;
+    std::memcpy(&v, &src[size_t(p.y) * stride + size_t(p.x) * 4], 4);
+    return v;
+  };
+
+  const int qw = w / 2 + 1;
+  std::vector<float> basis[4], x(qw), y(qw);
+  const float special[] = {3e9f, -3e9f, std::numeric_limits<float>::quiet_NaN(), -0.0f};
+  for (auto& plane : basis) {
+    for (int i = 0; i < qw; ++i) plane.push_back(float(uniform(-4000, 4000)) / 7.0f);
+  }
+  for (int i = 0; i < 4; ++i) basis[1][size_t(5 + i)] = special[i];
+  const float scale[4] = {0.3f, 1.0f / 1.3f, 37.1f, 37.1f};
+  const auto truncated = [](float v) {
+    return int16_t(uint16_t(v >= -2147483648.0f && v < 2147483648.0f ? int(v) : INT32_MIN));
+  };
+
+  for (const tfx::LensResampleRows* rows : tfx::SupportedLensResampleRows()) {
+    SCOPED_TRACE(rows->name);
+    std::vector<uint8_t> out(static_cast<size_t>(srcSize));
+    rows->distort(wild.data(), wild.size(), w * 4, src.data(), srcSize, out.data());
+    EXPECT_EQ(out, distorted);
+    for (int row = 0; row < h; ++row) {
+      const size_t i0 = size_t(row) * w;
+      rows->fringe(&inside[0][i0], &inside[1][i0], &inside[2][i0], size_t(w), src.data(), stride,
+                   out.data());
+      for (int i = 0; i < w; ++i) {
+        const uint32_t expected = (word(inside[0][i0 + i]) & 0xffu) |
+                                  (word(inside[1][i0 + i]) & 0xff00ff00u) |
+                                  (word(inside[2][i0 + i]) & 0xff0000u);
+        uint32_t actual;
+        std::memcpy(&actual, &out[size_t(i) * 4], 4);
+        ASSERT_EQ(actual, expected) << "row " << row << " column " << i;
+      }
+    }
+    rows->distortOffsets(basis[0].data(), basis[1].data(), basis[2].data(), basis[3].data(),
+                         size_t(qw), scale, x.data(), y.data());
+    for (const bool above : {false, true}) {
+      Map points(static_cast<size_t>(w));
+      rows->assembleRow(x.data(), y.data(), above, w, w / 2, float(w / 2), 11.0f, points.data());
+      for (int column = 0; column < w; ++column) {
+        const size_t q = size_t(std::abs(column - w / 2));
+        const float rp = (basis[1][q] * scale[0] + basis[0][q]) * scale[1];
+        const float ox = basis[2][q] * rp * scale[2], oy = basis[3][q] * rp * scale[3];
+        const tfx::LensPoint e = {truncated((column < w / 2 ? -ox : ox) + float(w / 2)),
+                                  truncated((above ? -oy : oy) + 11.0f)};
+        ASSERT_TRUE(points[size_t(column)].x == e.x && points[size_t(column)].y == e.y)
+            << "column " << column << (above ? " above" : " below");
+      }
+    }
+  }
 }
 
 }  // namespace

@@ -1,0 +1,232 @@
+// The lens resampling walks as gathers, compiled once per instruction set by foreach_target.h.
+// Integer work only: offsets, bounds and byte masks as the per-pixel walks compute them.
+#include <cstdint>
+#include <cstring>
+
+#include "simd/lens_resample.h"
+
+#undef HWY_TARGET_INCLUDE
+#define HWY_TARGET_INCLUDE "simd/lens_resample_hwy.cpp"
+#include <hwy/foreach_target.h>  // IWYU pragma: keep
+#include <hwy/highway.h>
+
+HWY_BEFORE_NAMESPACE();
+namespace tfx {
+namespace HWY_NAMESPACE {
+
+namespace hn = hwy::HWY_NAMESPACE;
+
+// Internal linkage: other kernel files define helpers of the same names.
+namespace {
+
+using DI = hn::ScalableTag<int32_t>;
+using VI = hn::Vec<DI>;
+
+static_assert(sizeof(LensPoint) == 4, "points are read as 32-bit words");
+
+// The points' x (low half) and y (high half), sign-extended.
+HWY_INLINE VI PointX(VI p) { return hn::ShiftRight<16>(hn::ShiftLeft<16>(p)); }
+HWY_INLINE VI PointY(VI p) { return hn::ShiftRight<16>(p); }
+
+HWY_INLINE VI LoadPoints(const LensPoint* points) {
+  return hn::LoadU(DI(), reinterpret_cast<const int32_t*>(points));
+}
+
+HWY_INLINE VI DistortLanes(VI points, VI own, VI rowBytes, VI last, const int32_t* src) {
+  const VI pos = hn::Add(hn::Mul(PointY(points), rowBytes), PointX(points));
+  // pos >= 0 and pos + 4 <= srcSize, i.e. pos <= srcSize - 4, without overflow.
+  const auto inside = hn::And(hn::Not(hn::Lt(pos, hn::Zero(DI()))), hn::Not(hn::Lt(last, pos)));
+  return hn::GatherOffset(DI(), src, hn::IfThenElse(inside, pos, own));
+}
+
+void DistortRow(const LensPoint* map, size_t count, int32_t rowBytes, const uint8_t* src,
+                int32_t srcSize, uint8_t* dst) {
+  const DI di;
+  const size_t lanes = hn::Lanes(di);
+  const int32_t* base = reinterpret_cast<const int32_t*>(src);
+  const VI row = hn::Set(di, rowBytes);
+  const VI last = hn::Set(di, srcSize - 4);
+  const VI step = hn::Set(di, static_cast<int32_t>(4 * lanes));
+  VI own = hn::ShiftLeft<2>(hn::Iota(di, 0));
+  size_t i = 0;
+  // The sources follow curves across rows that the hardware prefetcher does not foresee: ask for
+  // the first source of a vector a few vectors ahead.
+  const size_t ahead = 8 * lanes;
+  for (; i + lanes <= count; i += lanes, own = hn::Add(own, step)) {
+    if (i + ahead < count) {
+      const int64_t pos = int64_t{map[i + ahead].y} * rowBytes + map[i + ahead].x;
+      if (pos >= 0 && pos < srcSize) __builtin_prefetch(src + pos);
+    }
+    hn::StoreU(DistortLanes(LoadPoints(map + i), own, row, last, base), di,
+               reinterpret_cast<int32_t*>(dst + 4 * i));
+  }
+  if (i < count) {
+    // Points past the end read as (0, 0), offset 0, which every source holds.
+    HWY_ALIGN int32_t tail[HWY_MAX_BYTES / 4] = {};
+    std::memcpy(tail, map + i, 4 * (count - i));
+    hn::Store(DistortLanes(hn::Load(di, tail), own, row, last, base), di, tail);
+    std::memcpy(dst + 4 * i, tail, 4 * (count - i));
+  }
+}
+
+HWY_INLINE VI WordOffsets(VI points, VI stride) {
+  return hn::Add(hn::Mul(PointY(points), stride), hn::ShiftLeft<2>(PointX(points)));
+}
+
+HWY_INLINE VI FringeLanes(VI blue, VI green, VI red, VI stride, const int32_t* src) {
+  const DI di;
+  const VI b = hn::GatherOffset(di, src, WordOffsets(blue, stride));
+  const VI g = hn::GatherOffset(di, src, WordOffsets(green, stride));
+  const VI r = hn::GatherOffset(di, src, WordOffsets(red, stride));
+  return hn::Or(hn::Or(hn::And(b, hn::Set(di, 0x000000ff)),
+                       hn::And(g, hn::Set(di, static_cast<int32_t>(0xff00ff00u)))),
+                hn::And(r, hn::Set(di, 0x00ff0000)));
+}
+
+void FringeRow(const LensPoint* blue, const LensPoint* green, const LensPoint* red, size_t count,
+               const uint8_t* src, int32_t stride, uint8_t* dst) {
+  const DI di;
+  const size_t lanes = hn::Lanes(di);
+  const int32_t* base = reinterpret_cast<const int32_t*>(src);
+  const VI s = hn::Set(di, stride);
+  size_t i = 0;
+  // As in DistortRow; the three planes' sources lie close together.
+  const size_t ahead = 8 * lanes;
+  for (; i + lanes <= count; i += lanes) {
+    if (i + ahead < count) {
+      __builtin_prefetch(src + size_t(green[i + ahead].y) * size_t(stride) +
+                         size_t(green[i + ahead].x) * 4);
+    }
+    hn::StoreU(
+        FringeLanes(LoadPoints(blue + i), LoadPoints(green + i), LoadPoints(red + i), s, base), di,
+        reinterpret_cast<int32_t*>(dst + 4 * i));
+  }
+  if (i < count) {
+    // Points past the end read as (0, 0), the first pixel.
+    HWY_ALIGN int32_t b[HWY_MAX_BYTES / 4] = {};
+    HWY_ALIGN int32_t g[HWY_MAX_BYTES / 4] = {};
+    HWY_ALIGN int32_t r[HWY_MAX_BYTES / 4] = {};
+    std::memcpy(b, blue + i, 4 * (count - i));
+    std::memcpy(g, green + i, 4 * (count - i));
+    std::memcpy(r, red + i, 4 * (count - i));
+    hn::Store(FringeLanes(hn::Load(di, b), hn::Load(di, g), hn::Load(di, r), s, base), di, b);
+    std::memcpy(dst + 4 * i, b, 4 * (count - i));
+  }
+}
+
+using DF = hn::RebindToFloat<DI>;
+using VF = hn::Vec<DF>;
+
+// scale = {k, rescale, nx, ny}. The lanes past the last whole vector take the same float
+// operations one by one.
+void DistortOffsetsRow(const float* r, const float* power, const float* cosT, const float* sinT,
+                       size_t count, const float scale[4], float* x, float* y) {
+  const DF df;
+  const size_t lanes = hn::Lanes(df);
+  const VF k = hn::Set(df, scale[0]);
+  const VF rescale = hn::Set(df, scale[1]);
+  const VF nx = hn::Set(df, scale[2]);
+  const VF ny = hn::Set(df, scale[3]);
+  size_t i = 0;
+  for (; i + lanes <= count; i += lanes) {
+    const VF rp =
+        hn::Mul(hn::Add(hn::Mul(hn::LoadU(df, power + i), k), hn::LoadU(df, r + i)), rescale);
+    hn::StoreU(hn::Mul(hn::Mul(hn::LoadU(df, cosT + i), rp), nx), df, x + i);
+    hn::StoreU(hn::Mul(hn::Mul(hn::LoadU(df, sinT + i), rp), ny), df, y + i);
+  }
+  for (; i < count; ++i) {
+    const float rp = (power[i] * scale[0] + r[i]) * scale[1];
+    x[i] = cosT[i] * rp * scale[2];
+    y[i] = sinT[i] * rp * scale[3];
+  }
+}
+
+// Toward zero; out-of-range values and NaN give INT_MIN, as the per-point form's double test
+// v > -2^31 - 1 && v < 2^31 does for a float v.
+HWY_INLINE VI TruncToInt(VF v) {
+  const DF df;
+  const DI di;
+  const auto inRange =
+      hn::And(hn::Ge(v, hn::Set(df, -2147483648.0f)), hn::Lt(v, hn::Set(df, 2147483648.0f)));
+  return hn::IfThenElse(hn::RebindMask(di, inRange),
+                        hn::ConvertTo(di, hn::IfThenElseZero(inRange, v)),
+                        hn::Set(di, hwy::LimitsMin<int32_t>()));
+}
+
+int32_t TruncToInt(float v) {
+  if (v >= -2147483648.0f && v < 2147483648.0f) return static_cast<int32_t>(v);
+  return INT32_MIN;
+}
+
+HWY_INLINE VI PackPoint(VF ox, VF oy, VF fcx, VF fcy) {
+  const DI di;
+  const VI px = TruncToInt(hn::Add(ox, fcx));
+  const VI py = TruncToInt(hn::Add(oy, fcy));
+  return hn::Or(hn::And(px, hn::Set(di, 0xffff)), hn::ShiftLeft<16>(py));
+}
+
+LensPoint PackPoint(float ox, float oy, float fcx, float fcy) {
+  return LensPoint{static_cast<int16_t>(static_cast<uint16_t>(TruncToInt(ox + fcx))),
+                   static_cast<int16_t>(static_cast<uint16_t>(TruncToInt(oy + fcy)))};
+}
+
+void AssembleRow(const float* x, const float* y, bool above, int width, int cx, float fcx,
+                 float fcy, LensPoint* out) {
+  const DF df;
+  const DI di;
+  const size_t lanes = hn::Lanes(df);
+  const VF vcx = hn::Set(df, fcx);
+  const VF vcy = hn::Set(df, fcy);
+  // Negation flips the sign bit, exactly as the per-point form's unary minus does.
+  const VF flipY = hn::Set(df, above ? -0.0f : 0.0f);
+  const auto sy = [&](float v) { return above ? -v : v; };
+  int32_t* dst = reinterpret_cast<int32_t*>(out);
+  // Right of the centre column cx + i reads entry i; left of it column cx - 1 - i reads entry
+  // i + 1, negated: both walk away from the centre.
+  const size_t right = static_cast<size_t>(width - cx);
+  const size_t left = static_cast<size_t>(cx);
+  size_t i = 0;
+  for (; i + lanes <= right; i += lanes) {
+    const VF oy = hn::Xor(hn::LoadU(df, y + i), flipY);
+    hn::StoreU(PackPoint(hn::LoadU(df, x + i), oy, vcx, vcy), di, dst + cx + i);
+  }
+  for (; i < right; ++i) out[size_t(cx) + i] = PackPoint(x[i], sy(y[i]), fcx, fcy);
+  for (i = 0; i + lanes <= left; i += lanes) {
+    const VF ox = hn::Neg(hn::LoadU(df, x + i + 1));
+    const VF oy = hn::Xor(hn::LoadU(df, y + i + 1), flipY);
+    // Lane j belongs to column cx - 1 - i - j: reversed, the lanes fill columns
+    // cx - i - lanes .. cx - i - 1 in order.
+    hn::StoreU(hn::Reverse(di, PackPoint(ox, oy, vcx, vcy)), di, dst + (left - i - lanes));
+  }
+  for (; i < left; ++i) out[left - 1 - i] = PackPoint(-x[i + 1], sy(y[i + 1]), fcx, fcy);
+}
+
+const LensResampleRows* LensRowsOfThisTarget() {
+  static const LensResampleRows rows = {hwy::TargetName(HWY_TARGET), &DistortRow, &FringeRow,
+                                        &DistortOffsetsRow, &AssembleRow};
+  return &rows;
+}
+
+}  // namespace
+}  // namespace HWY_NAMESPACE
+}  // namespace tfx
+HWY_AFTER_NAMESPACE();
+
+#if HWY_ONCE
+#include "simd/dispatch.h"
+
+namespace tfx {
+
+HWY_EXPORT(LensRowsOfThisTarget);
+
+const LensResampleRows& BestLensResampleRows() {
+  static const LensResampleRows* const best = HWY_DYNAMIC_DISPATCH(LensRowsOfThisTarget)();
+  return *best;
+}
+
+std::vector<const LensResampleRows*> SupportedLensResampleRows() {
+  return EverySupportedSet(HWY_DISPATCH_TABLE(LensRowsOfThisTarget));
+}
+
+}  // namespace tfx
+#endif  // HWY_ONCE
