@@ -23,6 +23,17 @@ class NLEHSLAdjustEffect final : public NLEDynamicEffect {
       }
     }
 
+    // Band by band, each adjusted while its copy is still in cache.
+    if (CopyInBands(dst, dstWidth, dstHeight, dstStride, src, srcHeight, srcStride,
+                    [&](uint8_t* pixels, int, int rows) {
+                      CxImage band(&pixels, static_cast<unsigned>(dstWidth),
+                                   static_cast<unsigned>(rows), 32,
+                                   static_cast<unsigned>(dstStride), IPF_BGRA);
+                      hslAdjustment(&band, bands);
+                    })) {
+      return 0;
+    }
+
     // Never more rows than both frames hold: a foreground larger than the output is cut.
     myCopy(src, dst, srcWidth, srcHeight < dstHeight ? srcHeight : dstHeight, srcStride, dstStride);
     CxImage image(&dst, static_cast<unsigned>(dstWidth), static_cast<unsigned>(dstHeight), 32,
