@@ -19,6 +19,10 @@ struct HslRelightRows {
                   const int32_t mixGreen[256], const int32_t mixBlue[256]);
 };
 
+// RGBtoHSL's saturation as HSLtoRGB reads it, s / 255 in float, at max * 256 + min (min <=
+// max): it depends on nothing else. Built on first use; every set reads it.
+const float* HslSaturationByMaxMin();
+
 // The set Highway's dispatch picks for this CPU, chosen on the first call.
 const HslRelightRows& BestHslRelightRows();
 // One set per instruction set both compiled in and run by this CPU, best first.

@@ -62,7 +62,7 @@ HWY_INLINE VI HueByte(VF p, VF q, VF h) {
 
 template <int kRed>
 HWY_INLINE VU RelightLanes(VU px, const int32_t* mixRed, const int32_t* mixGreen,
-                           const int32_t* mixBlue) {
+                           const int32_t* mixBlue, const float* saturation) {
   const DU du;
   const DI di;
   const DF df;
@@ -75,33 +75,31 @@ HWY_INLINE VU RelightLanes(VU px, const int32_t* mixRed, const int32_t* mixGreen
   const VI g = hn::GatherIndex(di, mixGreen, g0);
   const VI b = hn::GatherIndex(di, mixBlue, b0);
 
-  // RGBtoHSL's saturation and hue. A grey (d = 0) divides by 1 instead of 0: its numerators are
-  // then below the divisor, giving the 0 the members give.
+  // RGBtoHSL's saturation from its table, and its hue: h is the sextant's base plus the delta of
+  // the channel after the largest minus that of the one before it (the largest channel's own
+  // delta is 0). A grey (d = 0) divides by 1 instead of 0: the numerators are then 0, giving the
+  // 0 the members give.
   const VI cMax = hn::Max(r, hn::Max(g, b));
   const VI cMin = hn::Min(r, hn::Min(g, b));
-  const VI sum = hn::Add(cMax, cMin);
   const VI d = hn::Sub(cMax, cMin);
-  const VI k255 = hn::Set(di, 255);
-  const VI ownL =
-      hn::ConvertTo(di, DivideBy<510>(df, hn::ConvertTo(df, hn::Add(hn::Mul(sum, k255), k255))));
-  const VI den =
-      hn::IfThenElse(hn::Lt(ownL, hn::Set(di, 128)), sum, hn::Sub(hn::Set(di, 510), sum));
-  const VI one = hn::Set(di, 1);
-  const VI s = IntDivide(hn::Add(hn::Mul(d, k255), hn::ShiftRight<1>(den)), hn::Max(den, one));
+  const VF sf = hn::GatherIndex(df, saturation, hn::Add(hn::ShiftLeft<8>(cMax), cMin));
   const VI dHalf = hn::ShiftRight<1>(d);
-  const VI dSafe = hn::Max(d, one);
+  const VI dSafe = hn::Max(d, hn::Set(di, 1));
   const VI k42 = hn::Set(di, 42);
-  const VI rDelta = IntDivide(hn::Add(hn::Mul(hn::Sub(cMax, r), k42), dHalf), dSafe);
-  const VI gDelta = IntDivide(hn::Add(hn::Mul(hn::Sub(cMax, g), k42), dHalf), dSafe);
-  const VI bDelta = IntDivide(hn::Add(hn::Mul(hn::Sub(cMax, b), k42), dHalf), dSafe);
-  const VI h = hn::IfThenElse(
-      hn::Eq(r, cMax), hn::Sub(bDelta, gDelta),
-      hn::IfThenElse(hn::Eq(g, cMax), hn::Add(hn::Set(di, 85), hn::Sub(rDelta, bDelta)),
-                     hn::Add(hn::Set(di, 170), hn::Sub(gDelta, rDelta))));
+  const auto redMax = hn::Eq(r, cMax);
+  const auto greenMax = hn::AndNot(redMax, hn::Eq(g, cMax));
+  // (plus, minus, base): red largest (b, g, 0), green (r, b, 85), blue (g, r, 170).
+  const VI plus = hn::IfThenElse(redMax, b, hn::IfThenElse(greenMax, r, g));
+  const VI minus = hn::IfThenElse(redMax, g, hn::IfThenElse(greenMax, b, r));
+  const VI base = hn::IfThenElse(redMax, hn::Zero(di),
+                                 hn::IfThenElse(greenMax, hn::Set(di, 85), hn::Set(di, 170)));
+  const VI plusDelta = IntDivide(hn::Add(hn::Mul(hn::Sub(cMax, plus), k42), dHalf), dSafe);
+  const VI minusDelta = IntDivide(hn::Add(hn::Mul(hn::Sub(cMax, minus), k42), dHalf), dSafe);
+  const VI h = hn::Add(base, hn::Sub(plusDelta, minusDelta));
+  const VI k255 = hn::Set(di, 255);
 
   // HSLtoRGB with the lightness replaced.
   const VF lf = DivideBy<255>(df, hn::ConvertTo(df, l));
-  const VF sf = DivideBy<255>(df, hn::ConvertTo(df, s));
   const VF onef = hn::Set(df, 1.0f);
   const VF q =
       hn::IfThenElse(hn::Gt(lf, hn::Set(df, 0.5f)), hn::Sub(hn::Add(lf, sf), hn::Mul(lf, sf)),
@@ -123,16 +121,20 @@ void RelightOf(uint8_t* pixels, size_t count, const int32_t* mixRed, const int32
                const int32_t* mixBlue) {
   const DU du;
   const size_t lanes = hn::Lanes(du);
+  const float* saturation = HslSaturationByMaxMin();
   size_t i = 0;
   for (; i + lanes <= count; i += lanes) {
     uint32_t* p = reinterpret_cast<uint32_t*>(pixels + 4 * i);
-    hn::StoreU(RelightLanes<kRed>(hn::LoadU(du, p), mixRed, mixGreen, mixBlue), du, p);
+    // A frame far beyond the caches streams in faster when asked for well ahead of use.
+    __builtin_prefetch(pixels + 4 * i + 4096, 1);
+    hn::StoreU(RelightLanes<kRed>(hn::LoadU(du, p), mixRed, mixGreen, mixBlue, saturation), du, p);
   }
   if (i < count) {
     // The tail through a full vector, so that it sees the very same operations.
     HWY_ALIGN uint32_t tail[HWY_MAX_BYTES / 4] = {};
     std::memcpy(tail, pixels + 4 * i, 4 * (count - i));
-    hn::Store(RelightLanes<kRed>(hn::Load(du, tail), mixRed, mixGreen, mixBlue), du, tail);
+    hn::Store(RelightLanes<kRed>(hn::Load(du, tail), mixRed, mixGreen, mixBlue, saturation), du,
+              tail);
     std::memcpy(pixels + 4 * i, tail, 4 * (count - i));
   }
 }
@@ -162,6 +164,26 @@ HWY_AFTER_NAMESPACE();
 namespace tfx {
 
 HWY_EXPORT(RelightRowsOfThisTarget);
+
+const float* HslSaturationByMaxMin() {
+  struct Table {
+    float units[256 * 256];
+    Table() {
+      for (int cMax = 0; cMax < 256; ++cMax) {
+        for (int cMin = 0; cMin <= cMax; ++cMin) {
+          const int sum = cMax + cMin;
+          const int d = cMax - cMin;
+          const int l = (sum * 255 + 255) / 510;
+          const int den = l <= 127 ? sum : 510 - sum;
+          const int s = d == 0 ? 0 : (d * 255 + den / 2) / den;
+          units[cMax * 256 + cMin] = static_cast<float>(s) / 255.0f;
+        }
+      }
+    }
+  };
+  static const Table table;
+  return table.units;
+}
 
 const HslRelightRows& BestHslRelightRows() {
   static const HslRelightRows* const best = HWY_DYNAMIC_DISPATCH(RelightRowsOfThisTarget)();
