@@ -78,6 +78,8 @@ void RotatePixels(uint8_t* pixels, size_t count, const float* m) {
   size_t i = 0;
   for (; i + lanes <= count; i += lanes) {
     uint32_t* p = reinterpret_cast<uint32_t*>(pixels + 4 * i);
+    // A frame far beyond the caches streams in faster when asked for well ahead of use.
+    __builtin_prefetch(pixels + 4 * i + 4096, 1);
     hn::StoreU(RotateLanes(hn::LoadU(du, p), m), du, p);
   }
   if (i < count) {
