@@ -23,6 +23,17 @@ struct HslRelightRows {
 // max): it depends on nothing else. Built on first use; every set reads it.
 const float* HslSaturationByMaxMin();
 
+// HSLtoRGB's choice per hue byte h, which fixes the hue in degrees and so, for each channel
+// (hue - 120, hue, hue + 120 for blue, green, red), whether it takes p, q or the ramp
+// p + (q - p) * along / 60: code holds 0 (p), 1 (q) or 2 (ramp) in bits 0-1 for blue, 2-3 for
+// green and 4-5 for red. Built on first use from HueToRGB's own float steps; no hue byte puts
+// two channels on the ramp, so `along` is that of the one channel that is.
+struct HslHueChoice {
+  float along[256];
+  int32_t code[256];
+};
+const HslHueChoice& HslHueChoices();
+
 // The set Highway's dispatch picks for this CPU, chosen on the first call.
 const HslRelightRows& BestHslRelightRows();
 // One set per instruction set both compiled in and run by this CPU, best first.

@@ -43,26 +43,24 @@ HWY_INLINE VI IntDivide(VI n, VI d) {
   return hn::ConvertTo(DI(), hn::Div(hn::ConvertTo(df, n), hn::ConvertTo(df, d)));
 }
 
-// HueToRGB on one hue (degrees, before wrapping), then trunc(v * 255) as a byte.
-HWY_INLINE VI HueByte(VF p, VF q, VF h) {
-  const DF df;
-  const VF full = hn::Set(df, 360.0f);
-  h = hn::IfThenElse(hn::Gt(h, full), hn::Sub(h, full),
-                     hn::IfThenElse(hn::Lt(h, hn::Zero(df)), hn::Add(h, full), h));
-  const auto rising = hn::Lt(h, hn::Set(df, 60.0f));
-  const VF span = hn::Sub(q, p);
-  const VF along = hn::IfThenElse(rising, h, hn::Sub(hn::Set(df, 240.0f), h));
-  const VF ramp = hn::Add(p, DivideBy<60>(df, hn::Mul(span, along)));
-  const VF v =
-      hn::IfThenElse(rising, ramp,
-                     hn::IfThenElse(hn::Lt(h, hn::Set(df, 180.0f)), q,
-                                    hn::IfThenElse(hn::Lt(h, hn::Set(df, 240.0f)), ramp, p)));
-  return hn::And(hn::ConvertTo(DI(), hn::Mul(v, hn::Set(df, 255.0f))), hn::Set(DI(), 255));
+// trunc(v * 255) as a byte.
+HWY_INLINE VI ToByte(VF v) {
+  return hn::And(hn::ConvertTo(DI(), hn::Mul(v, hn::Set(DF(), 255.0f))), hn::Set(DI(), 255));
+}
+
+// The channel whose code sits at bit kShift.
+template <int kShift>
+HWY_INLINE VI Choose(VI code, VI pByte, VI qByte, VI rampByte) {
+  const DI di;
+  const VI which = hn::And(hn::ShiftRight<kShift>(code), hn::Set(di, 3));
+  return hn::IfThenElse(hn::Eq(which, hn::Set(di, 2)), rampByte,
+                        hn::IfThenElse(hn::Eq(which, hn::Set(di, 1)), qByte, pByte));
 }
 
 template <int kRed>
 HWY_INLINE VU RelightLanes(VU px, const int32_t* mixRed, const int32_t* mixGreen,
-                           const int32_t* mixBlue, const float* saturation) {
+                           const int32_t* mixBlue, const float* saturation,
+                           const HslHueChoice& hue) {
   const DU du;
   const DI di;
   const DF df;
@@ -104,12 +102,16 @@ HWY_INLINE VU RelightLanes(VU px, const int32_t* mixRed, const int32_t* mixGreen
   const VF q =
       hn::IfThenElse(hn::Gt(lf, hn::Set(df, 0.5f)), hn::Sub(hn::Add(lf, sf), hn::Mul(lf, sf)),
                      hn::Mul(hn::Add(onef, sf), lf));
-  const VF hf = DivideBy<255>(df, hn::ConvertTo(df, hn::Mul(hn::And(h, k255), hn::Set(di, 360))));
   const VF p = hn::Sub(hn::Mul(hn::Set(df, 2.0f), lf), q);
-  const VF third = hn::Set(df, 120.0f);
-  const VI blue = HueByte(p, q, hn::Sub(hf, third));
-  const VI green = HueByte(p, q, hf);
-  const VI red = HueByte(p, q, hn::Add(hf, third));
+  const VI hue8 = hn::And(h, k255);
+  const VF along = hn::GatherIndex(df, hue.along, hue8);
+  const VI code = hn::GatherIndex(di, hue.code, hue8);
+  const VI pByte = ToByte(p);
+  const VI qByte = ToByte(q);
+  const VI rampByte = ToByte(hn::Add(p, DivideBy<60>(df, hn::Mul(hn::Sub(q, p), along))));
+  const VI blue = Choose<0>(code, pByte, qByte, rampByte);
+  const VI green = Choose<2>(code, pByte, qByte, rampByte);
+  const VI red = Choose<4>(code, pByte, qByte, rampByte);
   return hn::Or(
       hn::Or(hn::And(px, hn::Set(du, 0xff000000u)), hn::ShiftLeft<8>(hn::BitCast(du, green))),
       hn::Or(hn::ShiftLeft<kRed>(hn::BitCast(du, red)),
@@ -122,19 +124,21 @@ void RelightOf(uint8_t* pixels, size_t count, const int32_t* mixRed, const int32
   const DU du;
   const size_t lanes = hn::Lanes(du);
   const float* saturation = HslSaturationByMaxMin();
+  const HslHueChoice& hue = HslHueChoices();
   size_t i = 0;
   for (; i + lanes <= count; i += lanes) {
     uint32_t* p = reinterpret_cast<uint32_t*>(pixels + 4 * i);
     // A frame far beyond the caches streams in faster when asked for well ahead of use.
     __builtin_prefetch(pixels + 4 * i + 4096, 1);
-    hn::StoreU(RelightLanes<kRed>(hn::LoadU(du, p), mixRed, mixGreen, mixBlue, saturation), du, p);
+    hn::StoreU(RelightLanes<kRed>(hn::LoadU(du, p), mixRed, mixGreen, mixBlue, saturation, hue), du,
+               p);
   }
   if (i < count) {
     // The tail through a full vector, so that it sees the very same operations.
     HWY_ALIGN uint32_t tail[HWY_MAX_BYTES / 4] = {};
     std::memcpy(tail, pixels + 4 * i, 4 * (count - i));
-    hn::Store(RelightLanes<kRed>(hn::Load(du, tail), mixRed, mixGreen, mixBlue, saturation), du,
-              tail);
+    hn::Store(RelightLanes<kRed>(hn::Load(du, tail), mixRed, mixGreen, mixBlue, saturation, hue),
+              du, tail);
     std::memcpy(pixels + 4 * i, tail, 4 * (count - i));
   }
 }
@@ -183,6 +187,36 @@ const float* HslSaturationByMaxMin() {
   };
   static const Table table;
   return table.units;
+}
+
+const HslHueChoice& HslHueChoices() {
+  struct Table : HslHueChoice {
+    Table() {
+      for (int h = 0; h < 256; ++h) {
+        const float degrees = static_cast<float>(h * 360) / 255.0f;
+        const float hues[3] = {degrees - 120.0f, degrees, degrees + 120.0f};
+        along[h] = 0.0f;
+        code[h] = 0;
+        for (int c = 0; c < 3; ++c) {
+          float x = hues[c];
+          x = x > 360.0f ? x - 360.0f : x < 0.0f ? x + 360.0f : x;
+          int choice = 0;
+          if (x < 60.0f) {
+            choice = 2;
+            along[h] = x;
+          } else if (x < 180.0f) {
+            choice = 1;
+          } else if (x < 240.0f) {
+            choice = 2;
+            along[h] = 240.0f - x;
+          }
+          code[h] |= choice << (2 * c);
+        }
+      }
+    }
+  };
+  static const Table table;
+  return table;
 }
 
 const HslRelightRows& BestHslRelightRows() {

@@ -216,6 +216,16 @@ TEST(WhiteBalance, TemperatureKernelsOfEverySetMatchThePerPixelForm) {
   }
 }
 
+// The kernels keep one ramp value per pixel.
+TEST(WhiteBalance, NoHueByteRampsTwoChannels) {
+  const tfx::HslHueChoice& hue = tfx::HslHueChoices();
+  for (int h = 0; h < 256; ++h) {
+    int ramps = 0;
+    for (int c = 0; c < 3; ++c) ramps += (hue.code[h] >> (2 * c) & 3) == 2;
+    EXPECT_LE(ramps, 1) << "hue " << h;
+  }
+}
+
 TEST(WhiteBalance, OtherLayoutsAndPaddedRowsMatchThePerPixelForm) {
   const struct {
     unsigned bpp, effWidth;
