@@ -20,6 +20,7 @@
 #include <memory>
 
 #include "image/ImageLayout.h"
+#include "simd/hsl_adjust_rows.h"
 
 namespace tfx {
 namespace {
@@ -179,34 +180,38 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
 }
 
 template <int kRed>
-void AdjustRowsOf(uint8_t* bits, size_t rows, size_t count, size_t stride, const float* table) {
+void AdjustRowsOf(uint8_t* dst, size_t dstStride, const uint8_t* src, size_t srcStride, size_t rows,
+                  size_t count, const float* table) {
   const DU du;
   const size_t lanes = hn::Lanes(du);
   for (size_t y = 0; y < rows; ++y) {
-    uint8_t* row = bits + y * stride;
+    const uint8_t* in = src + y * srcStride;
+    uint8_t* out = dst + y * dstStride;
     size_t i = 0;
     for (; i + lanes <= count; i += lanes) {
-      uint32_t* p = reinterpret_cast<uint32_t*>(row + 4 * i);
-      hn::StoreU(AdjustPixels<kRed>(hn::LoadU(du, p), table), du, p);
+      // A frame far beyond the caches streams in faster when asked for well ahead of use.
+      __builtin_prefetch(in + 4 * i + 4096);
+      const VU px = hn::LoadU(du, reinterpret_cast<const uint32_t*>(in + 4 * i));
+      hn::StoreU(AdjustPixels<kRed>(px, table), du, reinterpret_cast<uint32_t*>(out + 4 * i));
     }
     if (i < count) {
       // The tail through a full vector, so that it sees the very same operations.
       alignas(64) uint32_t tail[HWY_MAX_BYTES / 4] = {};
-      std::memcpy(tail, row + 4 * i, 4 * (count - i));
+      std::memcpy(tail, in + 4 * i, 4 * (count - i));
       hn::Store(AdjustPixels<kRed>(hn::Load(du, tail), table), du, tail);
-      std::memcpy(row + 4 * i, tail, 4 * (count - i));
+      std::memcpy(out + 4 * i, tail, 4 * (count - i));
     }
   }
 }
 
-// `rows` rows of `count` packed 4-byte pixels, `stride` bytes apart; red is byte 0 in RGBA
-// order, byte 2 otherwise.
-void AdjustRows(uint8_t* bits, size_t rows, size_t count, size_t stride, const float* table,
-                bool rgba) {
+// `rows` rows of `count` packed 4-byte pixels from `src` into `dst` (which may be `src`), each
+// `stride` bytes after the last; red is byte 0 in RGBA order, byte 2 otherwise.
+void AdjustRows(uint8_t* dst, size_t dstStride, const uint8_t* src, size_t srcStride, size_t rows,
+                size_t count, const float* table, bool rgba) {
   if (rgba) {
-    AdjustRowsOf<0>(bits, rows, count, stride, table);
+    AdjustRowsOf<0>(dst, dstStride, src, srcStride, rows, count, table);
   } else {
-    AdjustRowsOf<16>(bits, rows, count, stride, table);
+    AdjustRowsOf<16>(dst, dstStride, src, srcStride, rows, count, table);
   }
 }
 
@@ -373,6 +378,16 @@ bool AdjustPixel(uint8_t& red, uint8_t& green, uint8_t& blue, const Tables& t) {
 }
 
 }  // namespace
+
+void HslAdjustInto(uint8_t* dst, const uint8_t* src, size_t count, const HSLBands& bands) {
+  const Tables& t = TablesFor(bands);
+  if (!t.active) {
+    if (dst != src) std::memmove(dst, src, 4 * count);
+    return;
+  }
+  HWY_DYNAMIC_DISPATCH(AdjustRows)(dst, 0, src, 0, 1, count, t.hue, false);
+}
+
 }  // namespace tfx
 
 CxImage* hslAdjustment(CxImage* image, const HSLBands& bands) {
@@ -387,8 +402,8 @@ CxImage* hslAdjustment(CxImage* image, const HSLBands& bands) {
     const size_t stride = image->GetEffWidth();
     const bool packed = stride == width * 4;
     HWY_DYNAMIC_DISPATCH(tfx::AdjustRows)
-    (image->GetBits(), packed ? 1 : height, packed ? width * height : width, stride, t.hue,
-     format == IPF_RGBA);
+    (image->GetBits(), stride, image->GetBits(), stride, packed ? 1 : height,
+     packed ? width * height : width, t.hue, format == IPF_RGBA);
     return image;
   }
   for (unsigned long y = 0; y < image->GetHeight(); ++y) {

@@ -1,5 +1,6 @@
 // HSLAdjust: per-colour hue, saturation and lightness in eight bands.
 #include "plugin/NLEDynamicEffect.h"
+#include "simd/hsl_adjust_rows.h"
 #include "tessarofx/CxImage.h"
 #include "tessarofx/HSLAdjust.h"
 
@@ -23,14 +24,11 @@ class NLEHSLAdjustEffect final : public NLEDynamicEffect {
       }
     }
 
-    // Band by band, each adjusted while its copy is still in cache.
-    if (CopyInBands(dst, dstWidth, dstHeight, dstStride, src, srcHeight, srcStride,
-                    [&](uint8_t* pixels, int, int rows) {
-                      CxImage band(&pixels, static_cast<unsigned>(dstWidth),
-                                   static_cast<unsigned>(rows), 32,
-                                   static_cast<unsigned>(dstStride), IPF_BGRA);
-                      hslAdjustment(&band, bands);
-                    })) {
+    // Packed frames alike go straight from the foreground into the output, without a copy.
+    if (dstWidth > 0 && dstHeight > 0 && srcStride == dstStride &&
+        static_cast<int64_t>(dstStride) == int64_t{dstWidth} * 4 && srcHeight >= dstHeight) {
+      tfx::HslAdjustInto(dst, src, static_cast<size_t>(dstWidth) * static_cast<size_t>(dstHeight),
+                         bands);
       return 0;
     }
 

@@ -4,6 +4,7 @@
 #include <vector>
 
 #include "support/EffectHarness.h"
+#include "support/EveryTarget.h"
 #include "tessarofx/CxImage.h"
 #include "tessarofx/HSLAdjust.h"
 #include "tessarofx/NLEHost.h"
@@ -42,6 +43,20 @@ TEST(HSLAdjustEffect, ReadsEveryBandValueByItsName) {
                                        [&](CxImage* image) { hslAdjustment(image, bands); });
     }
   }
+}
+
+// Packed frames skip the copy: every target, with a tail shorter than a vector.
+TEST(HSLAdjustEffect, PackedFramesMatchTheImageFormOnEveryTarget) {
+  NLEComPtr<INLECGFilter> filter = CreateEffect(
+      kHSLAdjust, Settings({{L"u_red_hue", 40}, {L"u_aqua_sat", -70}, {L"u_blue_light", 55}}));
+  HSLBands bands{};
+  bands.band[kHSLRed].hue = 40;
+  bands.band[kHSLAqua].sat = -70;
+  bands.band[kHSLBlue].light = 55;
+  tfx_test::ForEveryTarget([&] {
+    tfx_test::ExpectMatchesImageForm(filter.get(), 67, 5, 0,
+                                     [&](CxImage* image) { hslAdjustment(image, bands); });
+  });
 }
 
 TEST(HSLAdjustEffect, FollowsParameterChanges) {
