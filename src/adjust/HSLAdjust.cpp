@@ -62,6 +62,13 @@ HWY_INLINE VI Byte(VU p, int shift) {
   return hn::BitCast(DI(), hn::And(shifted, hn::Set(DU(), 255u)));
 }
 
+// trunc(v) for 0 <= v < 2^22: plus 1.5 * 2^23 it is exact and holds the integer in its low
+// mantissa bits. ConvertTo would add an overflow fix-up these values never need.
+HWY_INLINE VI TruncSmall(VF v) {
+  const VF shifted = hn::Add(hn::Trunc(v), hn::Set(DF(), 12582912.0f));
+  return hn::Sub(hn::BitCast(DI(), shifted), hn::Set(DI(), 0x4b400000));
+}
+
 // One vector of pixels; red at bit kRed, blue at bit 16 - kRed.
 template <int kRed>
 HWY_INLINE VU AdjustPixels(VU px, const float* table) {
@@ -86,7 +93,7 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
   // Greys divide by 1 instead and are kept below.
   const VF cf = hn::ConvertTo(df, c);
   const VF divisor = hn::ConvertTo(df, hn::Max(c, hn::Set(di, 1)));
-  const VI j = hn::ConvertTo(di, hn::Div(hn::ConvertTo(df, hn::ShiftLeft<8>(p)), divisor));
+  const VI j = TruncSmall(hn::Div(hn::ConvertTo(df, hn::ShiftLeft<8>(p)), divisor));
   const VI index = hn::ShiftLeft<2>(j);
   const VF shift = hn::GatherIndex(df, table, index);
   const VF k = hn::GatherIndex(df, table + 1, index);
@@ -171,11 +178,12 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
   }
   const auto round = [&](VF v) {
     const VF rounded = hn::Add(v, hn::Set(df, 0.5f));
-    return hn::BitCast(du, hn::ConvertTo(di, hn::Min(hn::Max(rounded, zero), hn::Set(df, 255.0f))));
+    return hn::BitCast(di, TruncSmall(hn::Min(hn::Max(rounded, zero), hn::Set(df, 255.0f))));
   };
-  const VU out =
-      hn::Or(hn::Or(hn::And(px, hn::Set(du, 0xff000000u)), hn::ShiftLeft<8>(round(vg))),
-             hn::Or(hn::ShiftLeft<kRed>(round(vr)), hn::ShiftLeft<16 - kRed>(round(vb))));
+  const VU out = hn::BitCast(
+      du, hn::Or(hn::Or(hn::BitCast(di, hn::And(px, hn::Set(du, 0xff000000u))),
+                        hn::ShiftLeft<8>(round(vg))),
+                 hn::Or(hn::ShiftLeft<kRed>(round(vr)), hn::ShiftLeft<16 - kRed>(round(vb)))));
   return hn::IfThenElse(hn::RebindMask(du, keep), px, out);
 }
 
