@@ -409,6 +409,67 @@ bool FringeFrom(const CxImage& source, CxImage* target, float f) {
   return true;
 }
 
+namespace {
+
+bool PackedBgra(const CxImage& image, int width, int height) {
+  return image.GetBits() && image.GetBpp() == 32 && image.getFormat() == IPF_BGRA &&
+         image.GetWidth() == unsigned(width) && image.GetHeight() == unsigned(height) &&
+         image.GetEffWidth() == unsigned(width) * 4 &&
+         image.GetSize() == size_t(width) * size_t(height) * 4;
+}
+
+}  // namespace
+
+bool ComposeLens(float d, float f, int width, int height, LensComposite* out) {
+  *out = LensComposite();
+  // Rows of at most 32764 bytes keep DistortFrom on its int32 walk and every offset in range.
+  if (d == 0.0f || f == 0.0f || width <= 0 || height <= 0 || width > 8191 || height > 8191) {
+    return false;
+  }
+  const LensMapsRef distort = DistortMaps(d, width, height);
+  const LensMapsRef fringe = FringingMaps(f, width, height);
+  if (!distort || !fringe) return false;
+  const size_t count = size_t(width) * size_t(height);
+  for (auto& plane : out->offset) {
+    plane.reset(new (std::nothrow) int32_t[count]);
+    if (!plane) {
+      *out = LensComposite();
+      return false;
+    }
+  }
+  // A fringing point is a pixel j of the distorted frame (always inside it), which holds the
+  // source's bytes at the distortion's offset, or the source's own pixel j when that offset
+  // leaves the buffer.
+  const int64_t rowBytes = int64_t{width} * 4;
+  const int64_t size = int64_t(count) * 4;
+  const LensPoint* d0 = distort->plane[0].get();
+  for (int p = 0; p < 3; ++p) {
+    const LensPoint* points = fringe->plane[p].get();
+    int32_t* offsets = out->offset[p].get();
+    for (size_t i = 0; i < count; ++i) {
+      const size_t j = size_t(points[i].y) * size_t(width) + size_t(points[i].x);
+      const int64_t pos = int64_t{d0[j].y} * rowBytes + d0[j].x;
+      offsets[i] = static_cast<int32_t>(pos >= 0 && pos + 4 <= size ? pos : int64_t(j) * 4);
+    }
+  }
+  out->distortion = d;
+  out->fringing = f;
+  out->width = width;
+  out->height = height;
+  return true;
+}
+
+bool DistortFringeFrom(const CxImage& source, CxImage* target, const LensComposite& composite) {
+  if (!composite.offset[0] || !PackedBgra(source, composite.width, composite.height) ||
+      !PackedBgra(*target, composite.width, composite.height)) {
+    return false;
+  }
+  BestLensResampleRows().fringeOffsets(
+      composite.offset[0].get(), composite.offset[1].get(), composite.offset[2].get(),
+      size_t(composite.width) * size_t(composite.height), source.GetBits(), target->GetBits());
+  return true;
+}
+
 }  // namespace tfx
 
 CxImage* distortFilter(CxImage* img, float d) {

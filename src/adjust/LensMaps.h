@@ -72,4 +72,26 @@ uint64_t LensMapBuilds();
 bool DistortFrom(const CxImage& source, CxImage* target, float d);
 bool FringeFrom(const CxImage& source, CxImage* target, float f);
 
+// Distortion followed by fringing on packed BGRA frames, in one pass: for each output pixel, the
+// byte offsets into the source that its blue, its green and alpha, and its red come from after
+// both steps. Built for one setting and size; large (three ints per pixel), so kept by the
+// caller that runs the setting frame after frame.
+struct LensComposite {
+  float distortion = 0.0f;
+  float fringing = 0.0f;
+  int width = 0;
+  int height = 0;
+  std::unique_ptr<int32_t[]> offset[3];  // blue, green (and alpha), red
+};
+
+// Builds `out` for both (non-zero) strengths and a packed BGRA frame of this size; false, with
+// `out` emptied, for a frame the single pass does not cover (a side over 8191 pixels, more than
+// INT32_MAX bytes) or memory that cannot be had.
+bool ComposeLens(float d, float f, int width, int height, LensComposite* out);
+
+// What DistortFrom into a frame laid out like `target` and FringeFrom out of it into `target`
+// give, reading `source` once. False, with `target` untouched, unless both are packed BGRA
+// frames of the composite's size.
+bool DistortFringeFrom(const CxImage& source, CxImage* target, const LensComposite& composite);
+
 }  // namespace tfx

@@ -29,6 +29,19 @@ class NLEDistortionFringingAdjustEffect final : public NLEDynamicEffect {
       const CxImage source(&in, static_cast<unsigned>(srcWidth), static_cast<unsigned>(srcHeight),
                            32, static_cast<unsigned>(srcStride), IPF_BGRA);
       if (fringing != 0.0f && distortion != 0.0f) {
+        // Settings held for a second frame get the single pass; its offsets take longer to build
+        // than a frame of two passes, which is what strengths that change every frame keep.
+        const bool held = distortion == lastDistortion_ && fringing == lastFringing_;
+        lastDistortion_ = distortion;
+        lastFringing_ = fringing;
+        if (held && (composite_.distortion != distortion || composite_.fringing != fringing ||
+                     composite_.width != dstWidth || composite_.height != dstHeight)) {
+          tfx::ComposeLens(distortion, fringing, dstWidth, dstHeight, &composite_);
+        }
+        if (held && tfx::DistortFringeFrom(source, &image, composite_)) {
+          distorted_.Destroy();
+          return 0;
+        }
         // Kept between frames: a fresh frame-sized buffer costs its page faults every frame.
         if (!distorted_.GetBits() || distorted_.GetWidth() != unsigned(dstWidth) ||
             distorted_.GetHeight() != unsigned(dstHeight)) {
@@ -53,6 +66,9 @@ class NLEDistortionFringingAdjustEffect final : public NLEDynamicEffect {
 
  private:
   CxImage distorted_;
+  tfx::LensComposite composite_;
+  float lastDistortion_ = 0.0f;
+  float lastFringing_ = 0.0f;
 };
 
 const NLEDistortionFringingAdjustEffect::_auto_register s_register(

@@ -23,6 +23,10 @@ struct LensResampleRows {
   // whose last byte sits below offset INT32_MAX; `stride` is its row length in bytes.
   void (*fringe)(const LensPoint* blue, const LensPoint* green, const LensPoint* red, size_t count,
                  const uint8_t* src, int32_t stride, uint8_t* dst);
+  // `count` pixels of `dst`: blue from the four bytes of `src` at byte offset blue[i], red from
+  // those at red[i], green and alpha from those at green[i]. Every offset leaves four bytes.
+  void (*fringeOffsets)(const int32_t* blue, const int32_t* green, const int32_t* red, size_t count,
+                        const uint8_t* src, uint8_t* dst);
   // The distortion map's step from the strength-independent values of each quadrant point
   // (radius r, power = r^e rounded to float, direction cosT, sinT) to its offset from the
   // centre, in float: rp = (power * k + r) * rescale, x = cosT * rp * nx, y = sinT * rp * ny.

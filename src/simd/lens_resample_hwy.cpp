@@ -114,6 +114,37 @@ void FringeRow(const LensPoint* blue, const LensPoint* green, const LensPoint* r
   }
 }
 
+HWY_INLINE VI MergeChannels(VI b, VI g, VI r) {
+  const DI di;
+  return hn::Or(hn::Or(hn::And(b, hn::Set(di, 0x000000ff)),
+                       hn::And(g, hn::Set(di, static_cast<int32_t>(0xff00ff00u)))),
+                hn::And(r, hn::Set(di, 0x00ff0000)));
+}
+
+void FringeOffsetsRow(const int32_t* blue, const int32_t* green, const int32_t* red, size_t count,
+                      const uint8_t* src, uint8_t* dst) {
+  const DI di;
+  const size_t lanes = hn::Lanes(di);
+  const int32_t* base = reinterpret_cast<const int32_t*>(src);
+  const size_t ahead = 8 * lanes;  // as in DistortRow
+  size_t i = 0;
+  for (; i + lanes <= count; i += lanes) {
+    if (i + ahead < count) __builtin_prefetch(src + green[i + ahead]);
+    const VI b = hn::GatherOffset(di, base, hn::LoadU(di, blue + i));
+    const VI g = hn::GatherOffset(di, base, hn::LoadU(di, green + i));
+    const VI r = hn::GatherOffset(di, base, hn::LoadU(di, red + i));
+    hn::StoreU(MergeChannels(b, g, r), di, reinterpret_cast<int32_t*>(dst + 4 * i));
+  }
+  for (; i < count; ++i) {
+    uint32_t b, g, r;
+    std::memcpy(&b, src + blue[i], 4);
+    std::memcpy(&g, src + green[i], 4);
+    std::memcpy(&r, src + red[i], 4);
+    const uint32_t pixel = (b & 0x000000ffu) | (g & 0xff00ff00u) | (r & 0x00ff0000u);
+    std::memcpy(dst + 4 * i, &pixel, 4);
+  }
+}
+
 using DF = hn::RebindToFloat<DI>;
 using VF = hn::Vec<DF>;
 
@@ -202,8 +233,9 @@ void AssembleRow(const float* x, const float* y, bool above, int width, int cx, 
 }
 
 const LensResampleRows* LensRowsOfThisTarget() {
-  static const LensResampleRows rows = {hwy::TargetName(HWY_TARGET), &DistortRow, &FringeRow,
-                                        &DistortOffsetsRow, &AssembleRow};
+  static const LensResampleRows rows = {
+      hwy::TargetName(HWY_TARGET), &DistortRow,        &FringeRow,
+      &FringeOffsetsRow,           &DistortOffsetsRow, &AssembleRow};
   return &rows;
 }
 

@@ -195,6 +195,36 @@ TEST(LensCache, ReusesMapsUntilStrengthSizeOrReleaseChanges) {
   EXPECT_EQ(changed->plane[0][0].x, ReferenceDistortMap(10.5f, 40, 30)[0].x);
 }
 
+TEST(LensComposite, OnePassGivesTheTwoSteps) {
+  // -2000 sends distortion sources outside the buffer, where the distorted frame keeps the
+  // source's own pixel.
+  const struct {
+    int w, h;
+    float d, f;
+  } cases[] = {{64, 48, 40, 60}, {101, 37, -30, -80}, {50, 30, -2000, 30}, {3, 2, 250, 400}};
+  for (const auto& c : cases) {
+    SCOPED_TRACE(testing::Message() << c.w << 'x' << c.h << " " << c.d << " " << c.f);
+    const Image source = NoiseImage(c.w, c.h, 32, IPF_BGRA, c.w * 4, c.w);
+    const Image distorted = NoiseImage(c.w, c.h, 32, IPF_BGRA, c.w * 4, 1);
+    const Image expected = NoiseImage(c.w, c.h, 32, IPF_BGRA, c.w * 4, 2);
+    const Image actual = NoiseImage(c.w, c.h, 32, IPF_BGRA, c.w * 4, 3);
+    ASSERT_TRUE(tfx::DistortFrom(*source, distorted.get(), c.d));
+    ASSERT_TRUE(tfx::FringeFrom(*distorted, expected.get(), c.f));
+    tfx::LensComposite composite;
+    ASSERT_TRUE(tfx::ComposeLens(c.d, c.f, c.w, c.h, &composite));
+    ASSERT_TRUE(tfx::DistortFringeFrom(*source, actual.get(), composite));
+    EXPECT_TRUE(SameBuffer(*expected, *actual));
+    // Other layouts are refused untouched.
+    const Image padded = NoiseImage(c.w, c.h, 32, IPF_BGRA, c.w * 4 + 4, 4);
+    const Image untouched = Clone(*padded);
+    EXPECT_FALSE(tfx::DistortFringeFrom(*source, padded.get(), composite));
+    EXPECT_TRUE(SameBuffer(*untouched, *padded));
+  }
+  tfx::LensComposite none;
+  EXPECT_FALSE(tfx::ComposeLens(10, 0, 64, 48, &none));
+  EXPECT_FALSE(tfx::ComposeLens(10, 10, 9000, 2, &none));
+}
+
 // The image functions run the best kernel set only; every set against the per-point forms, on
 // row lengths with a partial last vector, sources outside the buffer, and offsets that overflow
 // int or are NaN.
@@ -254,6 +284,20 @@ TEST(LensResampleRows, EverySetMatchesThePerPointForms) {
         std::memcpy(&actual, &out[size_t(i) * 4], 4);
         ASSERT_EQ(actual, expected) << "row " << row << " column " << i;
       }
+    }
+    std::vector<int32_t> offsets[3];
+    for (int p = 0; p < 3; ++p) {
+      for (const tfx::LensPoint& point : inside[p])
+        offsets[p].push_back(point.y * stride + point.x * 4);
+    }
+    rows->fringeOffsets(offsets[0].data(), offsets[1].data(), offsets[2].data(), size_t(w * h),
+                        src.data(), out.data());
+    for (size_t i = 0; i < size_t(w * h); ++i) {
+      const uint32_t expected = (word(inside[0][i]) & 0xffu) | (word(inside[1][i]) & 0xff00ff00u) |
+                                (word(inside[2][i]) & 0xff0000u);
+      uint32_t actual;
+      std::memcpy(&actual, &out[i * 4], 4);
+      ASSERT_EQ(actual, expected) << "pixel " << i;
     }
     rows->distortOffsets(basis[0].data(), basis[1].data(), basis[2].data(), basis[3].data(),
                          size_t(qw), scale, x.data(), y.data());
