@@ -145,10 +145,11 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
     const VF hg =
         hn::IfThenElse(in0, rise, hn::IfThenElse(in3, fall, hn::IfThenElse(m4, mnf, mxf)));
     const VF hb = hn::IfThenElse(in2, rise, hn::IfThenElse(m5, fall, hn::IfThenElse(m3, mxf, mnf)));
-    const auto on = hn::Ne(shift, zero);
-    vr = hn::IfThenElse(on, hr, vr);
-    vg = hn::IfThenElse(on, hg, vg);
-    vb = hn::IfThenElse(on, hb, vb);
+    // A shift of 0 needs no lane of its own: every step above is then exact integer arithmetic
+    // that gives back the channels themselves.
+    vr = hr;
+    vg = hg;
+    vb = hb;
   }
   // Saturation around the lightness, no further than the chroma limit of that lightness.
   {
@@ -166,15 +167,12 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
   {
     const VF fade = hn::Min(one, hn::Mul(cf, hn::Set(df, 1.0f / 64.0f)));
     const VF l = hn::Mul(light, fade);
-    const auto on = hn::Ne(l, zero);
+    // l = 0 adds (255 - v) * 0 or v * 0, a zero, which leaves v as it is.
     const auto up = hn::Gt(l, zero);
     const VF white = hn::Set(df, 255.0f);
-    vr =
-        hn::IfThenElse(on, hn::Add(vr, hn::Mul(hn::IfThenElse(up, hn::Sub(white, vr), vr), l)), vr);
-    vg =
-        hn::IfThenElse(on, hn::Add(vg, hn::Mul(hn::IfThenElse(up, hn::Sub(white, vg), vg), l)), vg);
-    vb =
-        hn::IfThenElse(on, hn::Add(vb, hn::Mul(hn::IfThenElse(up, hn::Sub(white, vb), vb), l)), vb);
+    vr = hn::Add(vr, hn::Mul(hn::IfThenElse(up, hn::Sub(white, vr), vr), l));
+    vg = hn::Add(vg, hn::Mul(hn::IfThenElse(up, hn::Sub(white, vg), vg), l));
+    vb = hn::Add(vb, hn::Mul(hn::IfThenElse(up, hn::Sub(white, vb), vb), l));
   }
   const auto round = [&](VF v) {
     const VF rounded = hn::Add(v, hn::Set(df, 0.5f));
