@@ -9,6 +9,7 @@
 #include <cmath>
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 
 #include "adjust/ColorAdjustFormulas.h"
 #include "adjust/ColorAdjustRows.h"
@@ -233,11 +234,13 @@ bool ColorAdjustPlan::Fuse() {
   return true;
 }
 
-void ColorAdjustPlan::Apply(uint8_t* pixels, size_t count) const {
+void ColorAdjustPlan::ApplyInto(uint8_t* dst, const uint8_t* src, size_t count) const {
   if (Fused()) {
-    rows_->fusedColour(pixels, count, tables_);
+    rows_->fusedColour(dst, src, count, tables_);
     return;
   }
+  if (dst != src) std::memcpy(dst, src, count * 4);
+  uint8_t* pixels = dst;
   if (hasTone_) rows_->applyTable(pixels, count, tone_);
   if (hasVibrance_) rows_->vibrance(pixels, count, vibrance_);
   if (hasSaturation_) rows_->saturation(pixels, count, sigma_);

@@ -31,7 +31,9 @@ class ColorAdjustPlan {
   ColorAdjustPlan& operator=(const ColorAdjustPlan&) = delete;
   bool Empty() const { return !hasTone_ && !hasVibrance_ && !hasSaturation_; }
   bool Fused() const { return fused_; }
-  void Apply(uint8_t* pixels, size_t count) const;
+  void Apply(uint8_t* pixels, size_t count) const { ApplyInto(pixels, pixels, count); }
+  // The same on `count` pixels of `src` written to `dst` (which may be `src`).
+  void ApplyInto(uint8_t* dst, const uint8_t* src, size_t count) const;
 
  private:
   bool Fuse();

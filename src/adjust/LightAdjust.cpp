@@ -92,8 +92,9 @@ void ApplyTable(CxImage* image, const uint8_t* table) {
   if (HasPackedColour(*image)) {
     // M and the curve treat red, green and blue alike, so both packed orders qualify.
     const ColorAdjustRows& rows = BestColorAdjustRows();
-    ForEachRow(image,
-               [&](uint8_t* pixels, size_t count) { rows.brightestTable(pixels, count, table); });
+    ForEachRow(image, [&](uint8_t* pixels, size_t count) {
+      rows.brightestTable(pixels, pixels, count, table);
+    });
     return;
   }
   for (unsigned long y = 0; y < image->GetHeight(); ++y) {
@@ -159,9 +160,10 @@ LightAdjustPlan::LightAdjustPlan(float h, float s, float w, float k0)
   count_ = steps.size();
 }
 
-void LightAdjustPlan::Apply(uint8_t* pixels, size_t count) const {
-  for (size_t j = 0; j < count_; ++j) {
-    rows_->brightestTable(pixels, count, tables_.data() + j * kBrightestTableBytes);
+void LightAdjustPlan::ApplyInto(uint8_t* dst, const uint8_t* src, size_t count) const {
+  const uint8_t* from = src;
+  for (size_t j = 0; j < count_; ++j, from = dst) {
+    rows_->brightestTable(dst, from, count, tables_.data() + j * kBrightestTableBytes);
   }
 }
 

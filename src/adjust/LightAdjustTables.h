@@ -31,7 +31,10 @@ class LightAdjustPlan {
  public:
   LightAdjustPlan(float h, float s, float w, float k0);
   bool Empty() const { return count_ == 0; }
-  void Apply(uint8_t* pixels, size_t count) const;
+  void Apply(uint8_t* pixels, size_t count) const { ApplyInto(pixels, pixels, count); }
+  // The same on `count` pixels of `src` written to `dst` (which may be `src`); with nothing to
+  // do, `dst` is left as it is.
+  void ApplyInto(uint8_t* dst, const uint8_t* src, size_t count) const;
 
  private:
   const ColorAdjustRows* rows_;

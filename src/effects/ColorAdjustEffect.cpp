@@ -31,9 +31,10 @@ class NLEColorAdjustEffect final : public NLEDynamicEffect {
       std::memcpy(planned_, settings, sizeof settings);
     }
     const tfx::ColorAdjustPlan& plan = *plan_;
-    if (CopyInBands(dst, dstWidth, dstHeight, dstStride, src, srcHeight, srcStride,
-                    [&](uint8_t* pixels, int, int rows) {
-                      if (!plan.Empty()) plan.Apply(pixels, static_cast<size_t>(rows) * dstWidth);
+    if (ForEachBand(dst, dstWidth, dstHeight, dstStride, src, srcHeight, srcStride,
+                    [&](uint8_t* to, const uint8_t* from, int, int rows) {
+                      // With nothing to do, the plan copies.
+                      plan.ApplyInto(to, from, static_cast<size_t>(rows) * dstWidth);
                     })) {
       return 0;
     }

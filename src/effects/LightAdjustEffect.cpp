@@ -29,9 +29,16 @@ class NLELightAdjustEffect final : public NLEDynamicEffect {
       std::memcpy(planned_, strengths, sizeof strengths);
     }
     const tfx::LightAdjustPlan& plan = *plan_;
-    if (CopyInBands(dst, dstWidth, dstHeight, dstStride, src, srcHeight, srcStride,
-                    [&](uint8_t* pixels, int, int rows) {
-                      plan.Apply(pixels, static_cast<size_t>(rows) * dstWidth);
+    // An effect with nothing to do still passes its input through.
+    const bool copy = plan.Empty();
+    if (ForEachBand(dst, dstWidth, dstHeight, dstStride, src, srcHeight, srcStride,
+                    [&](uint8_t* to, const uint8_t* from, int, int rows) {
+                      const size_t count = static_cast<size_t>(rows) * dstWidth;
+                      if (copy) {
+                        if (to != from) std::memcpy(to, from, count * 4);
+                      } else {
+                        plan.ApplyInto(to, from, count);
+                      }
                     })) {
       return 0;
     }

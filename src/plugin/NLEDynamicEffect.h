@@ -56,12 +56,12 @@ class NLEDynamicEffect : public NLEBasicFilter {
 // callers rely on that addressing, so it stays. `width` is not used.
 bool myCopy(const uint8_t* src, uint8_t* dst, int width, int rows, int srcPitch, int dstPitch);
 
-// What myCopy(src, dst, .., min(srcHeight, dstHeight), srcStride, dstStride) does, in bands of
-// rows, each handed to band(pixels, firstRow, rows) right after its copy so that an effect working
-// in place finds it still in cache. Only for two frames of packed rows of dstWidth pixels where
-// src has at least dst's rows; otherwise returns false and touches nothing.
+// For two frames of packed rows of dstWidth pixels where src has at least dst's rows: calls
+// band(dstPixels, srcPixels, firstRow, rows) over cache-sized bands of rows, so that an effect
+// that reads src and writes dst does what myCopy followed by its in-place pass would. Otherwise
+// returns false and touches nothing.
 template <class Band>
-bool CopyInBands(uint8_t* dst, int dstWidth, int dstHeight, int dstStride, const uint8_t* src,
+bool ForEachBand(uint8_t* dst, int dstWidth, int dstHeight, int dstStride, const uint8_t* src,
                  int srcHeight, int srcStride, Band band) {
   if (dstWidth <= 0 || dstHeight <= 0 || srcStride != dstStride ||
       static_cast<int64_t>(dstStride) != int64_t{dstWidth} * 4 || srcHeight < dstHeight) {
@@ -72,11 +72,24 @@ bool CopyInBands(uint8_t* dst, int dstWidth, int dstHeight, int dstStride, const
   const int bandRows = rowBytes >= kBandBytes ? 1 : static_cast<int>(kBandBytes / rowBytes);
   for (int y = 0; y < dstHeight; y += bandRows) {
     const int rows = bandRows < dstHeight - y ? bandRows : dstHeight - y;
-    uint8_t* pixels = dst + static_cast<size_t>(y) * rowBytes;
-    if (src != dst) std::memcpy(pixels, src + static_cast<size_t>(y) * rowBytes, rows * rowBytes);
-    band(pixels, y, rows);
+    const size_t offset = static_cast<size_t>(y) * rowBytes;
+    band(dst + offset, src + offset, y, rows);
   }
   return true;
+}
+
+// ForEachBand for effects that work in place: each band is copied as myCopy copies it, then
+// handed to band(pixels, firstRow, rows) while it is still in cache.
+template <class Band>
+bool CopyInBands(uint8_t* dst, int dstWidth, int dstHeight, int dstStride, const uint8_t* src,
+                 int srcHeight, int srcStride, Band band) {
+  return ForEachBand(dst, dstWidth, dstHeight, dstStride, src, srcHeight, srcStride,
+                     [&](uint8_t* pixels, const uint8_t* from, int y, int rows) {
+                       if (from != pixels) {
+                         std::memcpy(pixels, from, static_cast<size_t>(rows) * dstStride);
+                       }
+                       band(pixels, y, rows);
+                     });
 }
 
 template <class Base>

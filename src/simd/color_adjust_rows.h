@@ -39,9 +39,11 @@ struct ColorAdjustRows {
   // float; alpha is copied. `dst` may be `src`.
   void (*scaleChannels)(uint8_t* dst, const uint8_t* src, size_t count, const float gain[3]);
   // Each colour byte c of a pixel whose largest colour byte is m becomes table[m * 256 + c]. The
-  // table is read four bytes at a time, so it holds kBrightestTableBytes.
-  void (*brightestTable)(uint8_t* pixels, size_t count, const uint8_t* table);
-  void (*fusedColour)(uint8_t* pixels, size_t count, const FusedColourTables& tables);
+  // table is read four bytes at a time, so it holds kBrightestTableBytes. `dst` may be `src`.
+  void (*brightestTable)(uint8_t* dst, const uint8_t* src, size_t count, const uint8_t* table);
+  // `dst` may be `src`.
+  void (*fusedColour)(uint8_t* dst, const uint8_t* src, size_t count,
+                      const FusedColourTables& tables);
 };
 
 inline constexpr size_t kBrightestTableBytes = 256 * 256 + 3;

@@ -441,8 +441,8 @@ void ScaleChannelsRow(uint8_t* dst, const uint8_t* src, size_t count, const floa
   ForEachVectorInto(DU(), dst, src, count, ScaleVector{gain[0], gain[1], gain[2]});
 }
 
-void BrightestTableRow(uint8_t* pixels, size_t count, const uint8_t* table) {
-  ForEachVector(DU(), pixels, count, BrightestTableVector{table});
+void BrightestTableRow(uint8_t* dst, const uint8_t* src, size_t count, const uint8_t* table) {
+  ForEachVectorInto(DU(), dst, src, count, BrightestTableVector{table});
 }
 
 #if HWY_TARGET == HWY_SCALAR
@@ -462,7 +462,8 @@ struct ToneVector {
 };
 #endif
 
-void FusedColourRow(uint8_t* pixels, size_t count, const FusedColourTables& tables) {
+void FusedColourRow(uint8_t* dst, const uint8_t* src, size_t count,
+                    const FusedColourTables& tables) {
 #if HWY_TARGET == HWY_SCALAR
   const ToneVector tone{tables.tone};
 #else
@@ -473,14 +474,14 @@ void FusedColourRow(uint8_t* pixels, size_t count, const FusedColourTables& tabl
   const auto run = [&](auto tone_flag) {
     constexpr bool kTone = decltype(tone_flag)::value;
     if (!tables.saturate) {
-      ForEachVector(DU(), pixels, count,
-                    FusedColourVector<kTone, false, true, ToneVector>{tone, &tables});
+      ForEachVectorInto(DU(), dst, src, count,
+                        FusedColourVector<kTone, false, true, ToneVector>{tone, &tables});
     } else if (tables.increase) {
-      ForEachVector(DU(), pixels, count,
-                    FusedColourVector<kTone, true, true, ToneVector>{tone, &tables});
+      ForEachVectorInto(DU(), dst, src, count,
+                        FusedColourVector<kTone, true, true, ToneVector>{tone, &tables});
     } else {
-      ForEachVector(DU(), pixels, count,
-                    FusedColourVector<kTone, true, false, ToneVector>{tone, &tables});
+      ForEachVectorInto(DU(), dst, src, count,
+                        FusedColourVector<kTone, true, false, ToneVector>{tone, &tables});
     }
   };
   if (tables.tone) {

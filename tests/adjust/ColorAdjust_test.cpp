@@ -96,8 +96,10 @@ TEST(ColorAdjustPlan, OnePassEqualsTheFiveOperationsInTurn) {
                                       << c.v << ' ' << c.s);
       const tfx::ColorAdjustPlan plan(c.e, c.b, c.c, c.v, c.s, *rows);
       EXPECT_TRUE(plan.Fused());
+      // From the source into another image, as the effect runs it.
       const Image actual = Clone(EveryColour());
-      plan.Apply(actual->GetBits(), size_t{actual->GetWidth()} * actual->GetHeight());
+      plan.ApplyInto(actual->GetBits(), EveryColour().GetBits(),
+                     size_t{actual->GetWidth()} * actual->GetHeight());
       ASSERT_TRUE(SameBuffer(*expected, *actual));
     }
   }
@@ -217,7 +219,10 @@ TEST(ColorAdjustRows, BrightestTableLooksUpInTheRowOfTheLargestChannel) {
             &table[256 * std::max({expected[i], expected[i + 1], expected[i + 2]})];
         for (size_t c = 0; c < 3; ++c) expected[i + c] = row[expected[i + c]];
       }
-      rows->brightestTable(pixels.data(), count, table.data());
+      std::vector<uint8_t> apart(pixels.size());
+      rows->brightestTable(apart.data(), pixels.data(), count, table.data());
+      ASSERT_EQ(apart, expected);
+      rows->brightestTable(pixels.data(), pixels.data(), count, table.data());
       ASSERT_EQ(pixels, expected);
     }
   }
