@@ -230,12 +230,12 @@ def _arg_name(text):
     return name + "_" if name in ("pass",) else name
 
 
-def _make_function(spec):
-    tool_name = spec["name"]
+def _make_function(entry):
+    tool_name = entry["name"]
     py_name = tool_name.replace("-", "_")
-    args = [(_arg_name(a[0]), a[1], a[2]) for a in spec["args"]]
-    images = ["image"] + ([spec["second"].lower() if spec["second"] else "second"]
-                          if spec["inputs"] > 1 else [])
+    args = [(_arg_name(a[0]), a[1], a[2]) for a in entry["args"]]
+    images = ["image"] + ([entry["second"].lower() if entry["second"] else "second"]
+                          if entry["inputs"] > 1 else [])
 
     if tool_name == "white-point":
         def call(image, *, order="bgra"):
@@ -256,28 +256,28 @@ def _make_function(spec):
             return _native.call_function(tool_name, bound.arguments["image"], texts, second,
                                          order)
         ranges = "\n".join(f"{a[0]}: {a[1]:g}..{a[2]:g}" for a in args)
-        doc = spec["meaning"] + "." + ("\n\n" + ranges if ranges else "")
-        if spec["also"]:
-            doc += "\nAlso calls " + ", ".join(spec["also"]) + "."
+        doc = entry["meaning"] + "." + ("\n\n" + ranges if ranges else "")
+        if entry["also"]:
+            doc += "\nAlso calls " + ", ".join(entry["also"]) + "."
 
     positional = inspect.Parameter.POSITIONAL_OR_KEYWORD
     signature = inspect.Signature(
         [inspect.Parameter(n, positional) for n in images]
-        + ([inspect.Parameter(a[0], positional) for a in args] if spec["writes"] else [])
+        + ([inspect.Parameter(a[0], positional) for a in args] if entry["writes"] else [])
         + [inspect.Parameter("order", inspect.Parameter.KEYWORD_ONLY, default="bgra")])
     call.__name__ = call.__qualname__ = py_name
     call.__signature__ = signature
-    call.__doc__ = f"{doc}\n\nThe library's {spec['function']}; ``tessarofx fx {tool_name}``."
+    call.__doc__ = f"{doc}\n\nThe library's {entry['function']}; ``tessarofx fx {tool_name}``."
     call.__module__ = __name__
-    _FUNCTIONS.append(FunctionInfo(py_name, spec["function"], tool_name,
-                                   tuple(spec["args"]), spec["meaning"]))
+    _FUNCTIONS.append(FunctionInfo(py_name, entry["function"], tool_name,
+                                   tuple(entry["args"]), entry["meaning"]))
     return call
 
 
 def _bind_functions(scope):
-    for spec in _native.functions():
-        fn = _make_function(spec)
-        for name in (fn.__name__, spec["function"]):
+    for entry in _native.functions():
+        fn = _make_function(entry)
+        for name in (fn.__name__, entry["function"]):
             scope[name] = fn
             __all__.append(name)
 
