@@ -50,24 +50,7 @@ namespace HWY_NAMESPACE {
 
 namespace hn = hwy::HWY_NAMESPACE;
 
-using DU = hn::ScalableTag<uint32_t>;
-using DI = hn::RebindToSigned<DU>;
-using DF = hn::RebindToFloat<DU>;
-using VU = hn::Vec<DU>;
-using VI = hn::Vec<DI>;
-using VF = hn::Vec<DF>;
-
-HWY_INLINE VI Byte(VU p, int shift) {
-  const VU shifted = shift == 0 ? p : shift == 8 ? hn::ShiftRight<8>(p) : hn::ShiftRight<16>(p);
-  return hn::BitCast(DI(), hn::And(shifted, hn::Set(DU(), 255u)));
-}
-
-// trunc(v) for 0 <= v < 2^22: plus 1.5 * 2^23 it is exact and holds the integer in its low
-// mantissa bits. ConvertTo would add an overflow fix-up these values never need.
-HWY_INLINE VI TruncSmall(VF v) {
-  const VF shifted = hn::Add(hn::Trunc(v), hn::Set(DF(), 12582912.0f));
-  return hn::Sub(hn::BitCast(DI(), shifted), hn::Set(DI(), 0x4b400000));
-}
+#include "simd/pixel_lanes-inl.h"
 
 // One vector of pixels; red at bit kRed, blue at bit 16 - kRed.
 template <int kRed>
@@ -75,9 +58,9 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
   const DU du;
   const DI di;
   const DF df;
-  const VI r = Byte(px, kRed);
-  const VI g = Byte(px, 8);
-  const VI b = Byte(px, 16 - kRed);
+  const VI r = ChannelAt(px, kRed);
+  const VI g = ChannelAt(px, 8);
+  const VI b = ChannelAt(px, 16 - kRed);
   const VI mx = hn::Max(r, hn::Max(g, b));
   const VI mn = hn::Min(r, hn::Min(g, b));
   const VI c = hn::Sub(mx, mn);
@@ -93,7 +76,7 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
   // Greys divide by 1 instead and are kept below.
   const VF cf = hn::ConvertTo(df, c);
   const VF divisor = hn::ConvertTo(df, hn::Max(c, hn::Set(di, 1)));
-  const VI j = TruncSmall(hn::Div(hn::ConvertTo(df, hn::ShiftLeft<8>(p)), divisor));
+  const VI j = SmallToInt(hn::Div(hn::ConvertTo(df, hn::ShiftLeft<8>(p)), divisor));
   const VI index = hn::ShiftLeft<2>(j);
   const VF shift = hn::GatherIndex(df, table, index);
   const VF k = hn::GatherIndex(df, table + 1, index);
@@ -176,7 +159,7 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
   }
   const auto round = [&](VF v) {
     const VF rounded = hn::Add(v, hn::Set(df, 0.5f));
-    return hn::BitCast(di, TruncSmall(hn::Min(hn::Max(rounded, zero), hn::Set(df, 255.0f))));
+    return hn::BitCast(di, SmallToInt(hn::Min(hn::Max(rounded, zero), hn::Set(df, 255.0f))));
   };
   const VU out = hn::BitCast(
       du, hn::Or(hn::Or(hn::BitCast(di, hn::And(px, hn::Set(du, 0xff000000u))),

@@ -24,12 +24,7 @@ namespace hn = hwy::HWY_NAMESPACE;
 
 // Vibrance and saturation see each pixel as a 32-bit lane, byte 0 being the low byte; the table
 // lookup sees bytes.
-using DU = hn::ScalableTag<uint32_t>;
-using DI = hn::RebindToSigned<DU>;
-using DF = hn::RebindToFloat<DU>;
-using VU = hn::Vec<DU>;
-using VI = hn::Vec<DI>;
-using VF = hn::Vec<DF>;
+#include "simd/pixel_lanes-inl.h"
 
 // ---- Table lookup ------------------------------------------------------------------------------
 
@@ -134,13 +129,9 @@ HWY_INLINE TableVector MakeTableVector(const uint8_t table[256], uint8_t* chunks
 
 // ---- Per-pixel arithmetic on 32-bit lanes ------------------------------------------------------
 
-HWY_INLINE VI Channel0(VU p) { return hn::BitCast(DI(), hn::And(p, hn::Set(DU(), 255u))); }
-HWY_INLINE VI Channel1(VU p) {
-  return hn::BitCast(DI(), hn::And(hn::ShiftRight<8>(p), hn::Set(DU(), 255u)));
-}
-HWY_INLINE VI Channel2(VU p) {
-  return hn::BitCast(DI(), hn::And(hn::ShiftRight<16>(p), hn::Set(DU(), 255u)));
-}
+HWY_INLINE VI Channel0(VU p) { return ChannelAt(p, 0); }
+HWY_INLINE VI Channel1(VU p) { return ChannelAt(p, 8); }
+HWY_INLINE VI Channel2(VU p) { return ChannelAt(p, 16); }
 
 HWY_INLINE VU Alpha(VU p) { return hn::And(p, hn::Set(DU(), 0xff000000u)); }
 
@@ -149,15 +140,6 @@ HWY_INLINE VU Pack(VU p, VI c0, VI c1, VI c2) {
   const DU du;
   return hn::Or3(hn::Or(Alpha(p), hn::BitCast(du, c0)), hn::ShiftLeft<8>(hn::BitCast(du, c1)),
                  hn::ShiftLeft<16>(hn::BitCast(du, c2)));
-}
-
-// An integer-valued float below 2^22 in magnitude plus 1.5 * 2^23 is exact and holds the integer
-// in its low mantissa bits: truncation without ConvertTo's overflow handling.
-HWY_INLINE VI SmallToInt(VF v) {
-  const DF df;
-  const DI di;
-  const VF shifted = hn::Add(hn::Trunc(v), hn::Set(df, 12582912.0f));
-  return hn::Sub(hn::BitCast(di, shifted), hn::Set(di, 0x4b400000));
 }
 
 // Toward zero; out-of-range values and NaN give INT_MIN as in the per-pixel form, where

@@ -23,17 +23,7 @@ namespace hn = hwy::HWY_NAMESPACE;
 // Internal linkage: other kernel files define helpers of the same names.
 namespace {
 
-using DU = hn::ScalableTag<uint32_t>;
-using DI = hn::RebindToSigned<DU>;
-using DF = hn::RebindToFloat<DU>;
-using VU = hn::Vec<DU>;
-using VI = hn::Vec<DI>;
-using VF = hn::Vec<DF>;
-
-HWY_INLINE VI ByteAt(VU p, int shift) {
-  const VU shifted = shift == 0 ? p : shift == 8 ? hn::ShiftRight<8>(p) : hn::ShiftRight<16>(p);
-  return hn::BitCast(DI(), hn::And(shifted, hn::Set(DU(), 255u)));
-}
+#include "simd/pixel_lanes-inl.h"
 
 // floor(n / d) for 0 <= n < 2^24 and d >= 1. A quotient that is not an integer lies at least 1/d
 // below the next one, while the float quotient is off by at most half an ulp, n / (d 2^24) < 1/d:
@@ -64,9 +54,9 @@ HWY_INLINE VU RelightLanes(VU px, const int32_t* mixRed, const int32_t* mixGreen
   const DU du;
   const DI di;
   const DF df;
-  const VI r0 = ByteAt(px, kRed);
-  const VI g0 = ByteAt(px, 8);
-  const VI b0 = ByteAt(px, 16 - kRed);
+  const VI r0 = ChannelAt(px, kRed);
+  const VI g0 = ChannelAt(px, 8);
+  const VI b0 = ChannelAt(px, 16 - kRed);
   const VI l =
       hn::ShiftRight<1>(hn::Add(hn::Max(r0, hn::Max(g0, b0)), hn::Min(r0, hn::Min(g0, b0))));
   const VI r = hn::GatherIndex(di, mixRed, r0);

@@ -17,13 +17,8 @@ namespace HWY_NAMESPACE {
 
 namespace hn = hwy::HWY_NAMESPACE;
 
-using DU = hn::ScalableTag<uint32_t>;
-using DI = hn::RebindToSigned<DU>;
-using DF = hn::RebindToFloat<DU>;
-using VU = hn::Vec<DU>;
-using VF = hn::Vec<DF>;
-
 #include "simd/exact_divide-inl.h"
+#include "simd/pixel_lanes-inl.h"
 
 // kZeroWeight: the blend's zeroWeight, where the curve's weight need not be computed.
 template <bool kZeroWeight>

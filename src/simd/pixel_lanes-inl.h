@@ -1,0 +1,23 @@
+// Packed 4-byte pixels as 32-bit lanes, for the Highway kernels. Included inside a kernel file's
+// HWY_NAMESPACE (or a namespace within it), once per target, after
+// `namespace hn = hwy::HWY_NAMESPACE;`.
+
+using DU = hn::ScalableTag<uint32_t>;
+using DI = hn::RebindToSigned<DU>;
+using DF = hn::RebindToFloat<DU>;
+using VU = hn::Vec<DU>;
+using VI = hn::Vec<DI>;
+using VF = hn::Vec<DF>;
+
+// The byte at bit `shift` (0, 8 or 16) of each pixel.
+HWY_INLINE VI ChannelAt(VU p, int shift) {
+  const VU shifted = shift == 0 ? p : shift == 8 ? hn::ShiftRight<8>(p) : hn::ShiftRight<16>(p);
+  return hn::BitCast(DI(), hn::And(shifted, hn::Set(DU(), 255u)));
+}
+
+// trunc(v) for |v| < 2^22: plus 1.5 * 2^23 it is exact and holds the integer in its low mantissa
+// bits. ConvertTo would add an overflow fix-up these values never need.
+HWY_INLINE VI SmallToInt(VF v) {
+  const VF shifted = hn::Add(hn::Trunc(v), hn::Set(DF(), 12582912.0f));
+  return hn::Sub(hn::BitCast(DI(), shifted), hn::Set(DI(), 0x4b400000));
+}
