@@ -15,9 +15,18 @@ HWY_INLINE VI ChannelAt(VU p, int shift) {
   return hn::BitCast(DI(), hn::And(shifted, hn::Set(DU(), 255u)));
 }
 
-// trunc(v) for |v| < 2^22: plus 1.5 * 2^23 it is exact and holds the integer in its low mantissa
-// bits. ConvertTo would add an overflow fix-up these values never need.
+// trunc(v) for |v| < 2^22. ConvertTo would add an overflow fix-up these values never need: x86
+// converts them directly; elsewhere, plus 1.5 * 2^23 the value is exact and holds the integer in
+// its low mantissa bits.
 HWY_INLINE VI SmallToInt(VF v) {
+#if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
+  return VI{_mm512_cvttps_epi32(v.raw)};
+#elif HWY_ARCH_X86 && HWY_TARGET == HWY_AVX2
+  return VI{_mm256_cvttps_epi32(v.raw)};
+#elif HWY_ARCH_X86 && (HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3)
+  return VI{_mm_cvttps_epi32(v.raw)};
+#else
   const VF shifted = hn::Add(hn::Trunc(v), hn::Set(DF(), 12582912.0f));
   return hn::Sub(hn::BitCast(DI(), shifted), hn::Set(DI(), 0x4b400000));
+#endif
 }
