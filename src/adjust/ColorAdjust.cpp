@@ -175,61 +175,58 @@ ColorAdjustPlan::ColorAdjustPlan(float e, float b, float c, float v, float s,
       vibrance_(hasVibrance_ ? VibranceStrength(v) : 0.0f),
       sigma_(s / 100.0f) {
   hasTone_ = ComposeTone(e, b, c, tone_);
-  if ((hasVibrance_ || hasSaturation_) && !Fuse()) {
-    centre_.clear();
-    gain_.clear();
+  if (!Empty() && !Fuse()) {
+    ends_.clear();
   }
 }
 
-// Saturation's gain per pair of largest and smallest channel after vibrance, as the per-pixel
-// form derives it; false where one pass could not give the operations' bytes.
+// What vibrance and saturation derive from each pair of largest and smallest channel, as the
+// per-pixel forms derive it; false where one pass could not give the operations' bytes.
 bool ColorAdjustPlan::Fuse() {
+  if (!hasVibrance_ && !hasSaturation_) {
+    tables_ = {tone_, 0.0f, false, true, nullptr, 1.0f};
+    fused_ = true;
+    return true;
+  }
   for (int i = 0; i < 255; ++i) {
     if (tone_[i] > tone_[i + 1]) return false;
   }
-  // Beyond this the kernels' products may wrap, which the fused pass does not follow.
-  if (!(std::fabs(255.0f * vibrance_) < 4194304.0f) || !std::isfinite(sigma_)) return false;
+  // Beyond this vibrance's k no longer fits the kernels' 16-bit products.
+  if (!(std::fabs(255.0f * vibrance_) < 32768.0f) || !std::isfinite(sigma_)) return false;
   // Below -256 vibrance would turn a channel's order round.
   for (int weight = 0; weight < 256; ++weight) {
     if (TruncToInt(static_cast<float>(weight) * vibrance_) < -256) return false;
   }
   const bool increase = sigma_ >= 0.0f;
-  if (hasSaturation_) {
-    centre_.assign(256 * 256, 0.0f);
-    gain_.assign(increase ? 256 * 256 : 0, 0.0f);
-    for (int mx = 0; mx < 256; ++mx) {
-      for (int mn = 0; mn <= mx; ++mn) {
-        // The pair after vibrance, which keeps the two channels largest and smallest.
-        const int luma = (mx + mn) >> 1;
-        const auto weight = static_cast<uint8_t>(-((mx - luma) >> 1));
-        const int k = TruncToInt(static_cast<float>(weight) * vibrance_);
-        const int top = MixChannel(mx, luma, k), bottom = MixChannel(mn, luma, k);
-        const size_t at = static_cast<size_t>(mx) * 256 + mn;
-        if (top == bottom) {
-          // A grey stays as it is: no gain, or the grey as the centre.
-          if (!increase) centre_[at] = static_cast<float>(top);
-          continue;
-        }
+  ends_.assign(256 * 256, 0);
+  for (int mx = 0; mx < 256; ++mx) {
+    for (int mn = 0; mn <= mx; ++mn) {
+      tagRGBQUAD ends{static_cast<uint8_t>(mn), static_cast<uint8_t>(mn), static_cast<uint8_t>(mx),
+                      0};
+      if (hasVibrance_) ends = VibrancePixel(ends, vibrance_);
+      // The pair after vibrance, which keeps the two channels largest and smallest.
+      const int top = ends.rgbRed, bottom = ends.rgbBlue;
+      if (hasSaturation_) ends = calNewColor(ends, sigma_);
+      uint64_t entry = ends.rgbRed | uint32_t{ends.rgbBlue} << 8 | uint32_t(top + bottom) << 16;
+      // A grey stays as it is, whatever the gain.
+      if (hasSaturation_ && increase && top != bottom) {
         const SaturationSpread spread =
             SpreadOf(static_cast<float>(top), static_cast<float>(bottom));
-        centre_[at] = spread.lv;
-        if (increase) {
-          const float sat =
-              spread.l < 0.5f ? spread.delta / spread.sum : spread.delta / (2.0f - spread.sum);
-          const float a = sat + sigma_ >= 1.0f ? 1.0f / sat - 1.0f : 1.0f / (1.0f - sigma_) - 1.0f;
-          if (!std::isfinite(a)) return false;
-          gain_[at] = a;
-        }
+        // The kernels take l * 255 as half the sum, which it is for every pair.
+        if (spread.lv != static_cast<float>(top + bottom) * 0.5f) return false;
+        const float sat =
+            spread.l < 0.5f ? spread.delta / spread.sum : spread.delta / (2.0f - spread.sum);
+        const float a = sat + sigma_ >= 1.0f ? 1.0f / sat - 1.0f : 1.0f / (1.0f - sigma_) - 1.0f;
+        if (!std::isfinite(a)) return false;
+        uint32_t bits;
+        std::memcpy(&bits, &a, sizeof(bits));
+        entry |= uint64_t{bits} << 32;
       }
+      ends_[static_cast<size_t>(mx) * 256 + mn] = entry;
     }
   }
-  tables_ = {hasTone_ ? tone_ : nullptr,
-             vibrance_,
-             hasSaturation_,
-             increase,
-             centre_.empty() ? nullptr : centre_.data(),
-             gain_.empty() ? nullptr : gain_.data(),
-             1.0f + sigma_};
+  tables_ = {
+      hasTone_ ? tone_ : nullptr, vibrance_, hasSaturation_, increase, ends_.data(), 1.0f + sigma_};
   fused_ = true;
   return true;
 }

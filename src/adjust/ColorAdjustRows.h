@@ -44,7 +44,7 @@ class ColorAdjustPlan {
   bool hasVibrance_, hasSaturation_;
   float vibrance_;  // the kernels' strength
   float sigma_;
-  std::vector<float> centre_, gain_;
+  std::vector<uint64_t> ends_;
   FusedColourTables tables_ = {};
   bool fused_ = false;
 };

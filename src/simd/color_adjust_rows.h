@@ -10,18 +10,19 @@
 namespace tfx {
 
 // Exposure, brightness, contrast, vibrance and saturation in one pass, for settings where the tone
-// curve and vibrance keep the order of a pixel's channels: then what saturation derives from a
-// pixel depends on its largest and smallest channel after the curve alone, and comes from tables.
+// curve and vibrance keep the order of a pixel's channels: then what vibrance and saturation
+// derive from a pixel depends on its largest and smallest channel after the curve alone, and
+// comes from tables indexed by largest * 256 + smallest (entries with smallest <= largest).
 struct FusedColourTables {
   const uint8_t* tone;  // 256 entries, or null for none
-  float strength;       // vibrance's, with 255 * |strength| below 2^22 (0: none)
+  float strength;       // vibrance's, with 255 * |strength| below 2^15 (0: none)
   bool saturate;
   bool increase;  // sigma >= 0
-  // By largest * 256 + smallest channel after the curve (entries with smallest <= largest), of
-  // the pixel after vibrance: saturation's l * 255 (for a grey when decreasing, the grey itself),
-  // and its a when increasing (0 for a grey); 1 + sigma when decreasing.
-  const float* centre;
-  const float* gain;
+  // The results of vibrance and saturation for the largest channel (bits 0..7) and the smallest
+  // (bits 8..15), the sum of the two after vibrance (bits 16..31), and in bits 32..63 the bits of
+  // saturation's a when increasing (0 for a grey, which keeps its channels).
+  const uint64_t* ends;
+  // Saturation's 1 + sigma when decreasing.
   float fixedGain;
 };
 

@@ -73,22 +73,34 @@ HWY_INLINE V8 ShuffleIndex(V8 x, int i) {
 }
 
 #if HWY_TARGET == HWY_AVX3_DL
-// Bytes 0..2 of each pixel from the table, byte 3 (alpha) kept: two 128-entry permutes, the
-// byte's top bit picking between them.
-struct TableVector {
-  const uint8_t* table;
+// A 256-entry byte table held in four registers: two 128-entry permutes, the index's top bit
+// picking between them.
+struct ByteTable {
+  __m512i part[4];
 
-  HWY_INLINE V8 operator()(V8 x) const {
-    const __m512i t0 = _mm512_loadu_si512(table), t1 = _mm512_loadu_si512(table + 64);
-    const __m512i t2 = _mm512_loadu_si512(table + 128), t3 = _mm512_loadu_si512(table + 192);
-    const __m512i low = _mm512_permutex2var_epi8(t0, x.raw, t1);
-    const __m512i high = _mm512_permutex2var_epi8(t2, x.raw, t3);
-    const __m512i mapped = _mm512_mask_blend_epi8(_mm512_movepi8_mask(x.raw), low, high);
-    return V8{_mm512_mask_blend_epi8(0x8888888888888888ull, mapped, x.raw)};
+  explicit ByteTable(const uint8_t table[256]) {
+    for (int i = 0; i < 4; ++i) part[i] = _mm512_loadu_si512(table + 64 * i);
+  }
+
+  HWY_INLINE __m512i operator()(__m512i x) const {
+    const __m512i low = _mm512_permutex2var_epi8(part[0], x, part[1]);
+    const __m512i high = _mm512_permutex2var_epi8(part[2], x, part[3]);
+    return _mm512_mask_blend_epi8(_mm512_movepi8_mask(x), low, high);
   }
 };
 
-HWY_INLINE TableVector MakeTableVector(const uint8_t table[256], uint8_t*) { return {table}; }
+// Bytes 0..2 of each pixel from the table, byte 3 (alpha) kept.
+struct TableVector {
+  ByteTable table;
+
+  HWY_INLINE V8 operator()(V8 x) const {
+    return V8{_mm512_mask_blend_epi8(0x8888888888888888ull, table(x.raw), x.raw)};
+  }
+};
+
+HWY_INLINE TableVector MakeTableVector(const uint8_t table[256], uint8_t*) {
+  return TableVector{ByteTable(table)};
+}
 #else
 // Bytes 0..2 of each pixel from the table, byte 3 (alpha) kept.
 struct TableVector {
@@ -305,40 +317,159 @@ struct BrightestTableVector {
   }
 };
 
-// The tone curve through `tone` (TableVector, or a direct read in scalar code), vibrance as
-// VibranceVector<true>, then saturation with its gain looked up by the pixel's largest and
-// smallest channel; the per-pixel forms' expressions throughout.
-template <bool kTone, bool kSaturate, bool kIncrease, class Tone>
+#if HWY_TARGET != HWY_SCALAR
+// Byte kByte of each pixel in its bytes 0..2 (byte 3 is left 0).
+template <int kByte>
+HWY_INLINE V8 SpreadByte(VU p) {
+  const D8 d8;
+  alignas(16) static constexpr uint8_t kPattern[16] = {
+      kByte,     kByte,     kByte,     0x80, 4 + kByte,  4 + kByte,  4 + kByte,  0x80,
+      8 + kByte, 8 + kByte, 8 + kByte, 0x80, 12 + kByte, 12 + kByte, 12 + kByte, 0x80};
+  return hn::TableLookupBytesOr0(hn::BitCast(d8, p), hn::LoadDup128(d8, kPattern));
+}
+
+#if HWY_TARGET == HWY_AVX3_DL
+// ScaleVector through a table per channel of the same products, built by the caller.
+struct ScaleTablesVector {
+  ByteTable blue, green, red;
+
+  HWY_INLINE VU operator()(VU p) const {
+    const __m512i x = hn::BitCast(D8(), p).raw;
+    __m512i out = _mm512_mask_blend_epi8(0x2222222222222222ull, blue(x), green(x));
+    out = _mm512_mask_blend_epi8(0x4444444444444444ull, out, red(x));
+    return hn::BitCast(DU(), V8{_mm512_mask_blend_epi8(0x8888888888888888ull, out, x)});
+  }
+};
+
+// BrightestTableVector with two gathers instead of three: the largest channel's entry, on the
+// table's diagonal, comes from a byte table; the smallest and middle channels' from the gathers.
+// A channel equal to the largest or smallest takes that one's entry, which is its own.
+struct BrightestPairVector {
+  const uint8_t* table;
+  ByteTable diagonal;
+
+  HWY_INLINE VU operator()(VU p) const {
+    const DU du;
+    const DI di;
+    const D8 d8;
+    const VI c0 = Channel0(p), c1 = Channel1(p), c2 = Channel2(p);
+    const VI low = hn::Min(c0, c1), high = hn::Max(c0, c1);
+    const VI mx = hn::Max(high, c2), mn = hn::Min(low, c2);
+    const VI mid = hn::Max(low, hn::Min(high, c2));
+    const VI row = hn::ShiftLeft<8>(mx);
+    const auto* base = reinterpret_cast<const int32_t*>(table);
+    const auto look = [&](VI c) {
+      return hn::BitCast(du, hn::GatherOffset(di, base, hn::Or(row, c)));
+    };
+    const VU top = hn::BitCast(du, V8{diagonal(hn::BitCast(d8, mx).raw)});
+    const V8 pixel = hn::BitCast(d8, p);
+    const V8 out =
+        hn::IfThenElse(hn::Eq(pixel, SpreadByte<0>(hn::BitCast(du, mx))), SpreadByte<0>(top),
+                       hn::IfThenElse(hn::Eq(pixel, SpreadByte<0>(hn::BitCast(du, mn))),
+                                      SpreadByte<0>(look(mn)), SpreadByte<0>(look(mid))));
+    return hn::BitCast(du, hn::IfThenElse(AlphaBytes(), pixel, out));
+  }
+};
+#endif  // HWY_TARGET == HWY_AVX3_DL
+
+// MixChannelSmall when k fits 16 bits as well: the product is then one multiply-add of 16-bit
+// halves, `k16` holding k's low half under a zero upper half and (channel - luma)'s low half
+// holding the difference.
+HWY_INLINE VI MixChannelShort(VI c, VI luma, VI k16) {
+  const DI di;
+  const hn::Repartition<int16_t, DI> d16;
+  VI odd = hn::Zero(di);
+  const VI product = hn::RearrangeToOddPlusEven(
+      hn::ReorderWidenMulAccumulate(di, hn::BitCast(d16, hn::Sub(c, luma)), hn::BitCast(d16, k16),
+                                    hn::Zero(di), odd),
+      odd);
+  const VI mixed = hn::Add(c, hn::ShiftRight<8>(product));
+  return hn::Max(hn::Min(mixed, hn::Set(di, 255)), hn::Zero(di));
+}
+#endif
+
+// The entries of FusedColourTables::ends at `index`: their low halves in `low`, their high
+// halves as floats in `high`.
+HWY_INLINE void LookUpEnds(const uint64_t* table, VI index, VU* low, VF* high) {
+#if HWY_TARGET == HWY_SCALAR
+  const uint64_t entry = table[hn::GetLane(index)];
+  const auto upper = static_cast<uint32_t>(entry >> 32);
+  float centre;
+  std::memcpy(&centre, &upper, sizeof(centre));
+  *low = hn::Set(DU(), static_cast<uint32_t>(entry));
+  *high = hn::Set(DF(), centre);
+#else
+  // Two narrow gathers from the entries' byte offsets (the low half first: little-endian): fewer
+  // instructions than wide gathers and the shuffles that would part their halves.
+  const VI offset = hn::ShiftLeft<3>(index);
+  const auto* halves = reinterpret_cast<const int32_t*>(table);
+  *low = hn::BitCast(DU(), hn::GatherOffset(DI(), halves, offset));
+  *high = hn::BitCast(DF(), hn::GatherOffset(DI(), halves + 1, offset));
+#endif
+}
+
+// The tone curve through `tone` (TableVector, or a direct read in scalar code), then vibrance
+// and saturation. What the two give the largest and the smallest channel depends on that pair
+// alone and comes from FusedColourTables::ends, with saturation's inputs; only the middle channel
+// is worked out, with the per-pixel forms' expressions (vibrance as VibranceVector<true>). A
+// channel equal to the largest or smallest takes that one's result, which is what working it out
+// would give.
+template <bool kTone, bool kVibrance, bool kSaturate, bool kIncrease, class Tone>
 struct FusedColourVector {
   Tone tone;
   const FusedColourTables* t;
 
   HWY_INLINE VU operator()(VU raw) const {
+    const DU du;
     const DI di;
     const DF df;
     const VU p = kTone ? tone(raw) : raw;
-    VI c0 = Channel0(p), c1 = Channel1(p), c2 = Channel2(p);
-    const VI mx = hn::Max(c0, hn::Max(c1, c2));
-    const VI mn = hn::Min(c0, hn::Min(c1, c2));
-    if (t->strength != 0.0f) {
+    const VI c0 = Channel0(p), c1 = Channel1(p), c2 = Channel2(p);
+    const VI low = hn::Min(c0, c1), high = hn::Max(c0, c1);
+    const VI mx = hn::Max(high, c2), mn = hn::Min(low, c2);
+    const VI index = hn::Or(hn::ShiftLeft<8>(mx), mn);
+    VU ends;
+    VF gain;
+    LookUpEnds(t->ends, index, &ends, &gain);
+    VI mid = hn::Max(low, hn::Min(high, c2));
+    if (kVibrance) {
       const VI luma = hn::ShiftRight<1>(hn::Add(mx, mn));
       const VI weight = hn::And(hn::Neg(hn::ShiftRight<1>(hn::Sub(mx, luma))), hn::Set(di, 255));
       const VI k = SmallToInt(hn::Mul(hn::ConvertTo(df, weight), hn::Set(df, t->strength)));
-      c0 = MixChannelSmall(c0, luma, k);
-      c1 = MixChannelSmall(c1, luma, k);
-      c2 = MixChannelSmall(c2, luma, k);
+#if HWY_TARGET == HWY_SCALAR
+      mid = MixChannelSmall(mid, luma, k);
+#else
+      mid = MixChannelShort(mid, luma, hn::And(k, hn::Set(di, 0xffff)));
+#endif
     }
-    if (!kSaturate) return Pack(p, c0, c1, c2);
-    const VI index = hn::Or(hn::ShiftLeft<8>(mx), mn);
-    const VF lv = hn::GatherIndex(df, t->centre, index);
-    const VF gain = kIncrease ? hn::GatherIndex(df, t->gain, index) : hn::Set(df, t->fixedGain);
-    const auto channel = [&](VI c) {
-      const VF f = hn::ConvertTo(df, c);
+    if (kSaturate) {
+      // l * 255 is half the sum of the pair after vibrance, exactly, for every sum up to 510.
+      const VF lv =
+          hn::Mul(hn::ConvertTo(df, hn::BitCast(di, hn::ShiftRight<16>(ends))), hn::Set(df, 0.5f));
+      if (!kIncrease) gain = hn::Set(df, t->fixedGain);
+      const VF f = hn::ConvertTo(df, mid);
       const VF o = kIncrease ? hn::Add(f, hn::Mul(hn::Sub(f, lv), gain))
                              : hn::Add(lv, hn::Mul(hn::Sub(f, lv), gain));
-      return ByteBits(ClampToByteRange<false>(o));
+      mid = SmallToInt(ClampToByteRange<false>(o));
+    }
+#if HWY_TARGET == HWY_SCALAR
+    const VI top = hn::BitCast(di, hn::And(ends, hn::Set(du, 255u)));
+    const VI bottom = hn::BitCast(di, hn::And(hn::ShiftRight<8>(ends), hn::Set(du, 255u)));
+    const auto pick = [&](VI c) {
+      return hn::IfThenElse(hn::Eq(c, mx), top, hn::IfThenElse(hn::Eq(c, mn), bottom, mid));
     };
-    return PackByteBits(p, channel(c0), channel(c1), channel(c2));
+    return Pack(p, pick(c0), pick(c1), pick(c2));
+#else
+    // Byte by byte: each colour byte equal to the largest takes its result, else each equal to
+    // the smallest, else the middle one's.
+    const D8 d8;
+    const V8 pixel = hn::BitCast(d8, p);
+    const V8 out =
+        hn::IfThenElse(hn::Eq(pixel, SpreadByte<0>(hn::BitCast(du, mx))), SpreadByte<0>(ends),
+                       hn::IfThenElse(hn::Eq(pixel, SpreadByte<0>(hn::BitCast(du, mn))),
+                                      SpreadByte<1>(ends), SpreadByte<0>(hn::BitCast(du, mid))));
+    return hn::BitCast(du, hn::IfThenElse(AlphaBytes(), pixel, out));
+#endif
   }
 };
 
@@ -420,11 +551,33 @@ void SaturationRow(uint8_t* pixels, size_t count, float sigma) {
 }
 
 void ScaleChannelsRow(uint8_t* dst, const uint8_t* src, size_t count, const float gain[3]) {
+#if HWY_TARGET == HWY_AVX3_DL
+  // The products of every byte, limited as ScaleVector limits them (NaN gives 255).
+  uint8_t tables[3][256];
+  for (int i = 0; i < 3; ++i) {
+    for (int v = 0; v < 256; ++v) {
+      const float product = static_cast<float>(v) * gain[i];
+      tables[i][v] = product < 0.0f     ? 0
+                     : product < 255.0f ? static_cast<uint8_t>(static_cast<int>(product))
+                                        : 255;
+    }
+  }
+  ForEachVectorInto(
+      DU(), dst, src, count,
+      ScaleTablesVector{ByteTable(tables[0]), ByteTable(tables[1]), ByteTable(tables[2])});
+#else
   ForEachVectorInto(DU(), dst, src, count, ScaleVector{gain[0], gain[1], gain[2]});
+#endif
 }
 
 void BrightestTableRow(uint8_t* dst, const uint8_t* src, size_t count, const uint8_t* table) {
+#if HWY_TARGET == HWY_AVX3_DL
+  uint8_t diagonal[256];
+  for (int m = 0; m < 256; ++m) diagonal[m] = table[m * 257];
+  ForEachVectorInto(DU(), dst, src, count, BrightestPairVector{table, ByteTable(diagonal)});
+#else
   ForEachVectorInto(DU(), dst, src, count, BrightestTableVector{table});
+#endif
 }
 
 #if HWY_TARGET == HWY_SCALAR
@@ -453,23 +606,42 @@ void FusedColourRow(uint8_t* dst, const uint8_t* src, size_t count,
   const uint8_t identity[256] = {};  // never read: without a tone the kernels skip the lookup
   const ToneVector tone{MakeTableVector(tables.tone ? tables.tone : identity, chunks)};
 #endif
-  const auto run = [&](auto tone_flag) {
+  const bool vibrance = tables.strength != 0.0f;
+  if (!vibrance && !tables.saturate) {
+    if (tables.tone) {
+      ForEachVectorInto(DU(), dst, src, count, tone);
+    } else if (dst != src) {
+      std::memcpy(dst, src, count * 4);
+    }
+    return;
+  }
+  const auto run = [&](auto tone_flag, auto vibrance_flag) {
     constexpr bool kTone = decltype(tone_flag)::value;
+    constexpr bool kVibrance = decltype(vibrance_flag)::value;
     if (!tables.saturate) {
-      ForEachVectorInto(DU(), dst, src, count,
-                        FusedColourVector<kTone, false, true, ToneVector>{tone, &tables});
+      ForEachVectorInto(
+          DU(), dst, src, count,
+          FusedColourVector<kTone, kVibrance, false, true, ToneVector>{tone, &tables});
     } else if (tables.increase) {
       ForEachVectorInto(DU(), dst, src, count,
-                        FusedColourVector<kTone, true, true, ToneVector>{tone, &tables});
+                        FusedColourVector<kTone, kVibrance, true, true, ToneVector>{tone, &tables});
     } else {
-      ForEachVectorInto(DU(), dst, src, count,
-                        FusedColourVector<kTone, true, false, ToneVector>{tone, &tables});
+      ForEachVectorInto(
+          DU(), dst, src, count,
+          FusedColourVector<kTone, kVibrance, true, false, ToneVector>{tone, &tables});
     }
   };
-  if (tables.tone) {
-    run(std::true_type());
+  const auto with_tone = [&](auto vibrance_flag) {
+    if (tables.tone) {
+      run(std::true_type(), vibrance_flag);
+    } else {
+      run(std::false_type(), vibrance_flag);
+    }
+  };
+  if (vibrance) {
+    with_tone(std::true_type());
   } else {
-    run(std::false_type());
+    with_tone(std::false_type());
   }
 }
 

@@ -82,8 +82,8 @@ TEST(ColorAdjustPlan, OnePassEqualsTheFiveOperationsInTurn) {
   // must not fuse; they run the kernels tested above one after the other.
   const struct {
     float e, b, c, v, s;
-  } cases[] = {
-      {20, 15, 30, 40, 25}, {0, 0, 0, -100, -60}, {-40, -3, 184, 100, 100}, {0, 0, 0, 0, -100}};
+  } cases[] = {{20, 15, 30, 40, 25}, {0, 0, 0, -100, -60}, {-40, -3, 184, 100, 100},
+               {0, 0, 0, 0, -100},   {0, 0, 0, 40, 0},     {20, 15, 30, 0, 0}};
   for (const auto& c : cases) {
     const Image expected = Clone(EveryColour());
     tfx_test::ReferenceExposure(expected.get(), c.e);
