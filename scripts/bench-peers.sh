@@ -5,6 +5,13 @@
 #
 #   scripts/bench-peers.sh            (after scripts/setup.sh; builds what it needs)
 #   BENCH_CORE=1 FFMPEG_FRAMES=8 MIN_TIME=0.3 scripts/bench-peers.sh
+#   BEFORE_REV=<commit> scripts/bench-peers.sh
+#   BEFORE_BIN=<dir of bench binaries> scripts/bench-peers.sh
+#
+# With BEFORE_REV, the library at that commit is built with today's benchmarks (in a temporary
+# worktree, build/before-<commit>, which later runs reuse), and with BEFORE_BIN its binaries are
+# taken as built; either way they run in the same run as ours and the peers, and the table gains
+# their figures and the speed-up since.
 #
 # How each side is timed:
 #  - Ours: the Google Benchmark binaries, pixels divided by CPU time per iteration.
@@ -36,6 +43,21 @@ benches=(bench_color_adjust bench_white_balance bench_hsl_adjust bench_vignette 
 cmake --build build/release -j "$(nproc)" --target "${benches[@]}" >/dev/null
 bin=build/release/bin
 
+before_bin=${BEFORE_BIN:-}
+if [ -n "${BEFORE_REV:-}" ]; then
+  rev=$(git rev-parse --short "$BEFORE_REV")
+  tree=build/before-$rev
+  if [ ! -d "$tree/src" ]; then
+    git worktree add --detach "$tree" "$rev" >/dev/null
+  fi
+  # Today's benchmarks, so that both sides measure the same cases the same way.
+  rm -rf "$tree/bench" && cp -r bench "$tree/bench"
+  echo "bench-peers: building $rev with today's benchmarks in $tree" >&2
+  (cd "$tree" && { [ -f build/release/CMakeCache.txt ] || cmake --preset release >/dev/null; } &&
+    cmake --build build/release -j "$(nproc)" --target "${benches[@]::${#benches[@]}-1}" >/dev/null)
+  before_bin=$tree/build/release/bin
+fi
+
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
 
@@ -64,8 +86,14 @@ ours() {  # BINARY FILTER
   TFX_BENCH_CUBE="$work/look33.cube" "${pin[@]}" "$bin/$1" --benchmark_filter="$2" \
     --benchmark_min_time="$min_time" --benchmark_out="$work/$1.json" --benchmark_out_format=json \
     >/dev/null 2>&1
+  if [ -n "$before_bin" ]; then
+    mkdir -p "$work/before"
+    TFX_BENCH_CUBE="$work/look33.cube" "${pin[@]}" "$before_bin/$1" --benchmark_filter="$2" \
+      --benchmark_min_time="$min_time" --benchmark_out="$work/before/$1.json" \
+      --benchmark_out_format=json >/dev/null 2>&1 || echo "bench-peers: $1 failed before" >&2
+  fi
 }
-echo "bench-peers: our benchmarks on core $core" >&2
+echo "bench-peers: our benchmarks on core $core${before_bin:+, and before from $before_bin}" >&2
 ours bench_color_adjust '^BM_ColorAdjust/[^/]+/vibrance/'
 ours bench_white_balance '^BM_WhiteBalanceAdjust/'
 ours bench_hsl_adjust '^BM_HSLAdjust/[^/]+/all8/'
@@ -130,17 +158,25 @@ python3 - "$work" <<'PY'
 import json, os, sys
 
 work = sys.argv[1]
-ours = {}  # benchmark name without /real_time -> Mpixel/s by CPU time
-for name in os.listdir(work):
-    if not name.endswith(".json"):
-        continue
-    with open(os.path.join(work, name)) as f:
-        for b in json.load(f).get("benchmarks", []):
-            if b.get("error_occurred") or "items_per_second" not in b:
-                continue
-            # Items per second are by real time; the two times share a unit.
-            rate = b["items_per_second"] * b["real_time"] / b["cpu_time"] / 1e6
-            ours[b["run_name"].replace("/real_time", "")] = rate
+
+def rates(folder):  # benchmark name without /real_time -> Mpixel/s by CPU time
+    found = {}
+    if not os.path.isdir(folder):
+        return found
+    for name in os.listdir(folder):
+        if not name.endswith(".json"):
+            continue
+        with open(os.path.join(folder, name)) as f:
+            for b in json.load(f).get("benchmarks", []):
+                if b.get("error_occurred") or "items_per_second" not in b:
+                    continue
+                # Items per second are by real time; the two times share a unit.
+                rate = b["items_per_second"] * b["real_time"] / b["cpu_time"] / 1e6
+                found[b["run_name"].replace("/real_time", "")] = rate
+    return found
+
+ours = rates(work)
+before = rates(os.path.join(work, "before"))
 
 ffmpeg = {}
 with open(os.path.join(work, "ffmpeg.txt")) as f:
@@ -198,10 +234,19 @@ for size in ("1080p", "4K"):
         else:
             theirs = ours.get(key.format(size))
         ratio = mine / theirs if mine and theirs and theirs == theirs else None
-        rows.append((size, name, fmt(mine), peer_name, fmt(theirs),
-                     "n/a" if ratio is None else "%.2f" % ratio, note))
+        row = [size, name, fmt(mine), peer_name, fmt(theirs),
+               "n/a" if ratio is None else "%.2f" % ratio]
+        if before:
+            was = before.get(bench.format(size))
+            row[2:2] = [fmt(was)]
+            row += ["n/a" if not was or not theirs or theirs != theirs else "%.2f" % (was / theirs),
+                    "n/a" if not was or not mine else "%.2fx" % (mine / was)]
+        rows.append(tuple(row + [note]))
 
 head = ("size", "ours", "Mpx/s", "peer", "Mpx/s", "ours/peer", "note")
+if before:
+    head = ("size", "ours", "Mpx/s before", "Mpx/s now", "peer", "Mpx/s", "now/peer",
+            "before/peer", "speed-up", "note")
 print("| " + " | ".join(head) + " |")
 print("|" + "|".join(["---"] * len(head)) + "|")
 for r in rows:
