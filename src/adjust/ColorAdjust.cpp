@@ -66,8 +66,9 @@ tagRGBQUAD MapColour(tagRGBQUAD c, const uint8_t table[256]) {
 
 void ApplyTable(CxImage* image, const uint8_t table[256], const ColorAdjustRows& rows) {
   if (HasPackedColour(*image)) {
-    ForEachRow(image,
-               [&](uint8_t* pixels, size_t count) { rows.applyTable(pixels, count, table); });
+    ForEachRow(image, [&](uint8_t* pixels, size_t count) {
+      rows.applyTable(pixels, pixels, count, table);
+    });
   } else {
     ForEachPixel(image, [&](tagRGBQUAD c) { return MapColour(c, table); });
   }
@@ -136,7 +137,7 @@ CxImage* BrightnessAdjust(CxImage* image, float b, const ColorAdjustRows& rows) 
   if (step == 4) {
     // Row padding is ignored on purpose: width * height pixels from the first byte.
     const size_t count = pixels < size / 4 ? pixels : size / 4;
-    rows.applyTable(bits, count, table);
+    rows.applyTable(bits, bits, count, table);
     return image;
   }
   // Narrower pixels still get three bytes each, so neighbouring windows overlap; the walk stops
@@ -238,7 +239,7 @@ void ColorAdjustPlan::ApplyInto(uint8_t* dst, const uint8_t* src, size_t count) 
   }
   if (dst != src) std::memcpy(dst, src, count * 4);
   uint8_t* pixels = dst;
-  if (hasTone_) rows_->applyTable(pixels, count, tone_);
+  if (hasTone_) rows_->applyTable(pixels, pixels, count, tone_);
   if (hasVibrance_) rows_->vibrance(pixels, count, vibrance_);
   if (hasSaturation_) rows_->saturation(pixels, count, sigma_);
 }

@@ -153,15 +153,17 @@ void ForEachRun(const float* mask, size_t count, bool outsideByTable, F f) {
 }
 
 // Pixels [start, end) of a row; `mask` holds the weights of the run.
-void ApplyRun(uint8_t* row, RunKind kind, size_t start, size_t end, const float* mask,
-              const VignetteBlend& blend) {
-  uint8_t* px = row + 4 * start;
-  if (kind == RunKind::kInside && blend.insideUnchanged) return;
-  if (kind == RunKind::kBlend) {
-    blend.kernel->blendRun(px, mask, end - start, blend);
+void ApplyRun(uint8_t* dstRow, const uint8_t* srcRow, RunKind kind, size_t start, size_t end,
+              const float* mask, const VignetteBlend& blend) {
+  uint8_t* px = dstRow + 4 * start;
+  const uint8_t* from = srcRow + 4 * start;
+  if (kind == RunKind::kInside && blend.insideUnchanged) {
+    if (px != from) std::memcpy(px, from, 4 * (end - start));
+  } else if (kind == RunKind::kBlend) {
+    blend.kernel->blendRun(px, from, mask, end - start, blend);
   } else {
     // Red, green and blue alike, alpha kept.
-    BestColorAdjustRows().applyTable(px, end - start,
+    BestColorAdjustRows().applyTable(px, from, end - start,
                                      kind == RunKind::kInside ? blend.inside : blend.outside);
   }
 }
@@ -193,7 +195,7 @@ VignetteBlend MakeVignetteBlend(float a, float e, float b, const VignetteKernel&
 
 void VignetteRow(uint8_t* bgra, const float* mask, size_t count, const VignetteBlend& blend) {
   ForEachRun(mask, count, blend.outsideByTable, [&](RunKind kind, size_t start, size_t end) {
-    ApplyRun(bgra, kind, start, end, mask + start, blend);
+    ApplyRun(bgra, bgra, kind, start, end, mask + start, blend);
   });
 }
 
@@ -228,14 +230,18 @@ VignettePlan::VignettePlan(int width, int height, float amount, float feather, f
   active_ = true;
 }
 
-void VignettePlan::Apply(uint8_t* pixels, size_t stride, int y0, int rows) const {
-  if (!active_) return;
+void VignettePlan::ApplyInto(uint8_t* dst, const uint8_t* src, size_t stride, int y0,
+                             int rows) const {
+  if (!active_) {
+    if (dst != src) std::memcpy(dst, src, stride * static_cast<size_t>(rows));
+    return;
+  }
   const int cy = height_ >> 1;
-  for (int y = y0; y < y0 + rows; ++y, pixels += stride) {
+  for (int y = y0; y < y0 + rows; ++y, dst += stride, src += stride) {
     const size_t j = size_t(y < cy ? cy - y : y - cy);
     for (size_t r = firstRun_[j]; r < firstRun_[j + 1]; ++r) {
       const Run& run = runs_[r];
-      ApplyRun(pixels, run.kind, run.start, run.end, masks_.data() + run.mask, blend_);
+      ApplyRun(dst, src, run.kind, run.start, run.end, masks_.data() + run.mask, blend_);
     }
   }
 }

@@ -14,7 +14,9 @@ struct VignetteBlend;
 // without fused multiply-add, so they give the same bytes.
 struct VignetteKernel {
   const char* name;
-  void (*blendRun)(uint8_t* bgra, const float* mask, size_t count, const VignetteBlend& blend);
+  // From `src` into `dst`, which may be `src`.
+  void (*blendRun)(uint8_t* dst, const uint8_t* src, const float* mask, size_t count,
+                   const VignetteBlend& blend);
 };
 
 // The kernels this machine runs, best first.
@@ -55,7 +57,12 @@ class VignettePlan {
   VignettePlan(int width, int height, float amount, float feather, float highlights, float size,
                float roundness, float exposure);
   // Rows [y0, y0 + rows) of a frame of the plan's size, the first at `pixels`.
-  void Apply(uint8_t* pixels, size_t stride, int y0, int rows) const;
+  void Apply(uint8_t* pixels, size_t stride, int y0, int rows) const {
+    ApplyInto(pixels, pixels, stride, y0, rows);
+  }
+  // The same from the rows of `src` (same stride) into `dst`, which may be `src`: what copying
+  // them and then Apply would give.
+  void ApplyInto(uint8_t* dst, const uint8_t* src, size_t stride, int y0, int rows) const;
 
  private:
   struct Run {

@@ -37,9 +37,9 @@ class NLEVignetteAdjustEffect final : public NLEDynamicEffect {
       std::memcpy(planned_, settings, sizeof settings);
     }
     const tfx::VignettePlan& plan = *plan_;
-    if (CopyInBands(dst, dstWidth, dstHeight, dstStride, src, srcHeight, srcStride,
-                    [&](uint8_t* pixels, int y0, int rows) {
-                      plan.Apply(pixels, static_cast<size_t>(dstStride), y0, rows);
+    if (ForEachBand(dst, dstWidth, dstHeight, dstStride, src, srcHeight, srcStride,
+                    [&](uint8_t* to, const uint8_t* from, int y0, int rows) {
+                      plan.ApplyInto(to, from, static_cast<size_t>(dstStride), y0, rows);
                     })) {
       return 0;
     }

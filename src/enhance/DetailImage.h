@@ -54,8 +54,9 @@ void ForEachRun(const ColourRows& rows, RunFn run) {
 inline void ApplyColourTable(const ColourRows& rows, const uint8_t table[256]) {
   if (rows.pixelBytes == 4) {
     const ColorAdjustRows& kernels = BestColorAdjustRows();
-    ForEachRun(rows,
-               [&](uint8_t* pixels, size_t count) { kernels.applyTable(pixels, count, table); });
+    ForEachRun(rows, [&](uint8_t* pixels, size_t count) {
+      kernels.applyTable(pixels, pixels, count, table);
+    });
     return;
   }
   ForEachRun(rows, [&](uint8_t* pixels, size_t count) {

@@ -31,7 +31,8 @@ struct FusedColourTables {
 // Rows need no particular alignment.
 struct ColorAdjustRows {
   const char* name;  // the instruction set, as Highway names it
-  void (*applyTable)(uint8_t* pixels, size_t count, const uint8_t table[256]);
+  // Bytes 0..2 of each pixel of `src` through the table into `dst`, which may be `src`.
+  void (*applyTable)(uint8_t* dst, const uint8_t* src, size_t count, const uint8_t table[256]);
   // strength = v / 100 * 0.8
   void (*vibrance)(uint8_t* pixels, size_t count, float strength);
   // sigma = s / 100, not 0

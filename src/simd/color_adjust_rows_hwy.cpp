@@ -517,17 +517,18 @@ HWY_INLINE void ForEachVectorInto(D d, uint8_t* dst, const uint8_t* src, size_t 
 
 #if HWY_TARGET == HWY_SCALAR
 // One-lane vectors have no byte shuffle to build on, so the table is read directly.
-void ApplyTableRow(uint8_t* pixels, size_t count, const uint8_t table[256]) {
-  for (size_t i = 0; i < count; ++i, pixels += 4) {
-    pixels[0] = table[pixels[0]];
-    pixels[1] = table[pixels[1]];
-    pixels[2] = table[pixels[2]];
+void ApplyTableRow(uint8_t* dst, const uint8_t* src, size_t count, const uint8_t table[256]) {
+  for (size_t i = 0; i < count; ++i, dst += 4, src += 4) {
+    dst[0] = table[src[0]];
+    dst[1] = table[src[1]];
+    dst[2] = table[src[2]];
+    dst[3] = src[3];
   }
 }
 #else
-void ApplyTableRow(uint8_t* pixels, size_t count, const uint8_t table[256]) {
+void ApplyTableRow(uint8_t* dst, const uint8_t* src, size_t count, const uint8_t table[256]) {
   HWY_ALIGN uint8_t chunks[256];
-  ForEachVector(D8(), pixels, count, MakeTableVector(table, chunks));
+  ForEachVectorInto(D8(), dst, src, count, MakeTableVector(table, chunks));
 }
 #endif
 

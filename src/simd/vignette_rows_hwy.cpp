@@ -58,32 +58,35 @@ struct BlendVector {
 };
 
 template <bool kZeroWeight>
-void BlendRunOf(uint8_t* px, const float* mask, size_t count, const VignetteBlend& blend) {
+void BlendRunOf(uint8_t* dst, const uint8_t* src, const float* mask, size_t count,
+                const VignetteBlend& blend) {
   const DU du;
   const DF df;
   const BlendVector<kZeroWeight> kernel{1.0f + blend.a, blend.e, blend.b};
   const size_t lanes = hn::Lanes(du);
   size_t i = 0;
   for (; i + lanes <= count; i += lanes) {
-    uint32_t* row = reinterpret_cast<uint32_t*>(px + 4 * i);
-    hn::StoreU(kernel(hn::LoadU(du, row), hn::LoadU(df, mask + i)), du, row);
+    const auto* from = reinterpret_cast<const uint32_t*>(src + 4 * i);
+    hn::StoreU(kernel(hn::LoadU(du, from), hn::LoadU(df, mask + i)), du,
+               reinterpret_cast<uint32_t*>(dst + 4 * i));
   }
   if (i < count) {
     // The tail through zero-padded copies, so that it gets the same arithmetic.
     HWY_ALIGN uint32_t words[HWY_MAX_BYTES / 4] = {};
     HWY_ALIGN float weights[HWY_MAX_BYTES / 4] = {};
-    std::memcpy(words, px + 4 * i, 4 * (count - i));
+    std::memcpy(words, src + 4 * i, 4 * (count - i));
     std::memcpy(weights, mask + i, 4 * (count - i));
     hn::Store(kernel(hn::Load(du, words), hn::Load(df, weights)), du, words);
-    std::memcpy(px + 4 * i, words, 4 * (count - i));
+    std::memcpy(dst + 4 * i, words, 4 * (count - i));
   }
 }
 
-void BlendRun(uint8_t* px, const float* mask, size_t count, const VignetteBlend& blend) {
+void BlendRun(uint8_t* dst, const uint8_t* src, const float* mask, size_t count,
+              const VignetteBlend& blend) {
   if (blend.zeroWeight) {
-    BlendRunOf<true>(px, mask, count, blend);
+    BlendRunOf<true>(dst, src, mask, count, blend);
   } else {
-    BlendRunOf<false>(px, mask, count, blend);
+    BlendRunOf<false>(dst, src, mask, count, blend);
   }
 }
 

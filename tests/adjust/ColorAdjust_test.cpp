@@ -241,7 +241,7 @@ TEST(ColorAdjustRows, TableKernelsMapColourBytesOnly) {
         for (size_t i = 0; i < count * 4; ++i) {
           if (i % 4 != 3) expected[i] = table[expected[i]];
         }
-        rows->applyTable(pixels.data(), count, table.data());
+        rows->applyTable(pixels.data(), pixels.data(), count, table.data());
         ASSERT_EQ(pixels, expected);
       }
     }
