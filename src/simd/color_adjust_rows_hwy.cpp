@@ -317,6 +317,23 @@ struct BrightestTableVector {
   }
 };
 
+// A pixel's three colour channels and their largest, smallest and middle value.
+struct Ranked {
+  VI c0, c1, c2, mx, mn, mid;
+};
+
+HWY_INLINE Ranked Rank(VU p) {
+  Ranked r;
+  r.c0 = Channel0(p);
+  r.c1 = Channel1(p);
+  r.c2 = Channel2(p);
+  const VI low = hn::Min(r.c0, r.c1), high = hn::Max(r.c0, r.c1);
+  r.mx = hn::Max(high, r.c2);
+  r.mn = hn::Min(low, r.c2);
+  r.mid = hn::Max(low, hn::Min(high, r.c2));
+  return r;
+}
+
 #if HWY_TARGET != HWY_SCALAR
 // Byte kByte of each pixel in its bytes 0..2 (byte 3 is left 0).
 template <int kByte>
@@ -326,6 +343,21 @@ HWY_INLINE V8 SpreadByte(VU p) {
       kByte,     kByte,     kByte,     0x80, 4 + kByte,  4 + kByte,  4 + kByte,  0x80,
       8 + kByte, 8 + kByte, 8 + kByte, 0x80, 12 + kByte, 12 + kByte, 12 + kByte, 0x80};
   return hn::TableLookupBytesOr0(hn::BitCast(d8, p), hn::LoadDup128(d8, kPattern));
+}
+
+// Byte by byte: each colour byte of `p` equal to the largest becomes byte 0 of `top`'s lane,
+// else each equal to the smallest byte `kBottom` of `bottom`'s, else byte 0 of `middle`'s; alpha
+// is kept.
+template <int kBottom>
+HWY_INLINE VU PickByRank(VU p, const Ranked& r, VU top, VU bottom, VU middle) {
+  const DU du;
+  const D8 d8;
+  const V8 pixel = hn::BitCast(d8, p);
+  const V8 out =
+      hn::IfThenElse(hn::Eq(pixel, SpreadByte<0>(hn::BitCast(du, r.mx))), SpreadByte<0>(top),
+                     hn::IfThenElse(hn::Eq(pixel, SpreadByte<0>(hn::BitCast(du, r.mn))),
+                                    SpreadByte<kBottom>(bottom), SpreadByte<0>(middle)));
+  return hn::BitCast(du, hn::IfThenElse(AlphaBytes(), pixel, out));
 }
 
 #if HWY_TARGET == HWY_AVX3_DL
@@ -351,23 +383,14 @@ struct BrightestPairVector {
   HWY_INLINE VU operator()(VU p) const {
     const DU du;
     const DI di;
-    const D8 d8;
-    const VI c0 = Channel0(p), c1 = Channel1(p), c2 = Channel2(p);
-    const VI low = hn::Min(c0, c1), high = hn::Max(c0, c1);
-    const VI mx = hn::Max(high, c2), mn = hn::Min(low, c2);
-    const VI mid = hn::Max(low, hn::Min(high, c2));
-    const VI row = hn::ShiftLeft<8>(mx);
+    const Ranked r = Rank(p);
+    const VI row = hn::ShiftLeft<8>(r.mx);
     const auto* base = reinterpret_cast<const int32_t*>(table);
     const auto look = [&](VI c) {
       return hn::BitCast(du, hn::GatherOffset(di, base, hn::Or(row, c)));
     };
-    const VU top = hn::BitCast(du, V8{diagonal(hn::BitCast(d8, mx).raw)});
-    const V8 pixel = hn::BitCast(d8, p);
-    const V8 out =
-        hn::IfThenElse(hn::Eq(pixel, SpreadByte<0>(hn::BitCast(du, mx))), SpreadByte<0>(top),
-                       hn::IfThenElse(hn::Eq(pixel, SpreadByte<0>(hn::BitCast(du, mn))),
-                                      SpreadByte<0>(look(mn)), SpreadByte<0>(look(mid))));
-    return hn::BitCast(du, hn::IfThenElse(AlphaBytes(), pixel, out));
+    const VU top = hn::BitCast(du, V8{diagonal(hn::BitCast(D8(), r.mx).raw)});
+    return PickByRank<0>(p, r, top, look(r.mn), look(r.mid));
   }
 };
 #endif  // HWY_TARGET == HWY_AVX3_DL
@@ -424,14 +447,13 @@ struct FusedColourVector {
     const DI di;
     const DF df;
     const VU p = kTone ? tone(raw) : raw;
-    const VI c0 = Channel0(p), c1 = Channel1(p), c2 = Channel2(p);
-    const VI low = hn::Min(c0, c1), high = hn::Max(c0, c1);
-    const VI mx = hn::Max(high, c2), mn = hn::Min(low, c2);
+    const Ranked r = Rank(p);
+    const VI mx = r.mx, mn = r.mn;
     const VI index = hn::Or(hn::ShiftLeft<8>(mx), mn);
     VU ends;
     VF gain;
     LookUpEnds(t->ends, index, &ends, &gain);
-    VI mid = hn::Max(low, hn::Min(high, c2));
+    VI mid = r.mid;
     if (kVibrance) {
       const VI luma = hn::ShiftRight<1>(hn::Add(mx, mn));
       const VI weight = hn::And(hn::Neg(hn::ShiftRight<1>(hn::Sub(mx, luma))), hn::Set(di, 255));
@@ -458,17 +480,9 @@ struct FusedColourVector {
     const auto pick = [&](VI c) {
       return hn::IfThenElse(hn::Eq(c, mx), top, hn::IfThenElse(hn::Eq(c, mn), bottom, mid));
     };
-    return Pack(p, pick(c0), pick(c1), pick(c2));
+    return Pack(p, pick(r.c0), pick(r.c1), pick(r.c2));
 #else
-    // Byte by byte: each colour byte equal to the largest takes its result, else each equal to
-    // the smallest, else the middle one's.
-    const D8 d8;
-    const V8 pixel = hn::BitCast(d8, p);
-    const V8 out =
-        hn::IfThenElse(hn::Eq(pixel, SpreadByte<0>(hn::BitCast(du, mx))), SpreadByte<0>(ends),
-                       hn::IfThenElse(hn::Eq(pixel, SpreadByte<0>(hn::BitCast(du, mn))),
-                                      SpreadByte<1>(ends), SpreadByte<0>(hn::BitCast(du, mid))));
-    return hn::BitCast(du, hn::IfThenElse(AlphaBytes(), pixel, out));
+    return PickByRank<1>(p, r, ends, ends, hn::BitCast(du, mid));
 #endif
   }
 };
