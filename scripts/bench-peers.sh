@@ -39,7 +39,8 @@ done
 
 [ -f build/release/CMakeCache.txt ] || cmake --preset release >/dev/null
 benches=(bench_color_adjust bench_white_balance bench_hsl_adjust bench_vignette bench_lens_adjust
-         bench_cube_lut bench_lut_effects bench_denoise bench_blur bench_peer_ocio_lut)
+         bench_cube_lut bench_lut_effects bench_denoise bench_blur bench_light_adjust
+         bench_grade_chain bench_peer_ocio_lut)
 cmake --build build/release -j "$(nproc)" --target "${benches[@]}" >/dev/null
 bin=build/release/bin
 
@@ -103,6 +104,33 @@ ours bench_cube_lut '^BM_CubeLutDoLUT/[^/]+/file/'
 ours bench_lut_effects '^BM_ChromeKeyLut3d/[^/]+/mask/'
 ours bench_denoise '^BM_DeNoiseRGB/'
 ours bench_blur '^BM_(GaussianBlur|CvGaussianBlur)/[^/]+/bgra|^BM_(FastAverageBlur|CvBlur)/[^/]+/bgr/r7/|^BM_(FastFilter|CvMedianBlur)/[^/]+/r7/'
+
+# Our own cases at 4K, each beside the memcpy of the frame in the same binary and run.
+our_case() {  # BINARY FILTER
+  for side in now before; do
+    local dir=$bin
+    if [ "$side" = before ]; then
+      [ -n "$before_bin" ] || continue
+      dir=$before_bin
+    fi
+    mkdir -p "$work/cases/$side"
+    TFX_BENCH_CUBE="$work/look33.cube" "${pin[@]}" "$dir/$1" --benchmark_filter="$2|^BM_Memcpy/4K/" \
+      --benchmark_min_time="$min_time" --benchmark_out="$work/cases/$side/$1.json" \
+      --benchmark_out_format=json >/dev/null 2>&1 || echo "bench-peers: $1 failed ($side)" >&2
+  done
+}
+echo "bench-peers: our cases against memcpy" >&2
+our_case bench_grade_chain '^BM_GradeChain/4K/'
+our_case bench_color_adjust '^BM_ColorAdjust/4K/all5/'
+our_case bench_light_adjust '^BM_LightAdjust/4K/all4/'
+our_case bench_white_balance '^BM_(WhiteBalanceAdjust|temperatureAdjustment)/4K/'
+our_case bench_vignette '^BM_Vignette/4K/darken/'
+our_case bench_hsl_adjust '^BM_(HSLAdjust/4K/all8|HueAdjust/4K/30deg)/'
+our_case bench_lens_adjust '^BM_Lens/4K/(both|distortion_rebuilt_each_frame)/'
+our_case bench_cube_lut '^BM_CubeLutDoLUT/4K/(33|64)/(random|photo)/'
+our_case bench_lut_effects '^BM_(ColorLut3dAdjust/4K/cube(33|64)|ChromeKeyLut3d/4K/(mask|beauty))/'
+our_case bench_denoise '^BM_DeNoise(RGB|Lumiance)/4K/'
+our_case bench_blur '^BM_(FastAverageBlur|CvBlur)/4K/bgr/r7/|^BM_(FastFilter|CvMedianBlur)/4K/r3/'
 
 # --- OpenColorIO --------------------------------------------------------------------------------
 echo "bench-peers: OpenColorIO" >&2
@@ -243,6 +271,25 @@ for size in ("1080p", "4K"):
                     "n/a" if not was or not mine else "%.2fx" % (mine / was)]
         rows.append(tuple(row + [note]))
 
+def cases(folder):  # name without /real_time -> (real time in ms, the memcpy of its binary in ms)
+    found = {}
+    if not os.path.isdir(folder):
+        return found
+    for name in os.listdir(folder):
+        with open(os.path.join(folder, name)) as f:
+            runs = [b for b in json.load(f).get("benchmarks", []) if not b.get("error_occurred")]
+        scale = {"ns": 1e-6, "us": 1e-3, "ms": 1.0, "s": 1e3}
+        times = {b["run_name"].replace("/real_time", ""): b["real_time"] * scale[b["time_unit"]]
+                 for b in runs}
+        memcpy = times.get("BM_Memcpy/4K")
+        for key, t in times.items():
+            if key != "BM_Memcpy/4K":
+                found[key] = (t, memcpy)
+    return found
+
+now_cases = cases(os.path.join(work, "cases", "now"))
+before_cases = cases(os.path.join(work, "cases", "before"))
+
 head = ("size", "ours", "Mpx/s", "peer", "Mpx/s", "ours/peer", "note")
 if before:
     head = ("size", "ours", "Mpx/s before", "Mpx/s now", "peer", "Mpx/s", "now/peer",
@@ -251,4 +298,64 @@ print("| " + " | ".join(head) + " |")
 print("|" + "|".join(["---"] * len(head)) + "|")
 for r in rows:
     print("| " + " | ".join(r) + " |")
+
+# Our cases: each as the fraction of the memcpy of the frame in its own run (or, where the target
+# is against a peer or against before, that ratio), before and now.
+ratio_cases = [  # label, benchmark, target
+    ("Grade: ColorAdjust -> LightAdjust -> WhiteBalanceAdjust -> VignetteAdjust",
+     "BM_GradeChain/4K", ">= 0.08 (12.5 memcpys)"),
+    ("ColorAdjust, all five", "BM_ColorAdjust/4K/all5", ">= 0.3"),
+    ("LightAdjust, all four", "BM_LightAdjust/4K/all4", ">= 0.35"),
+    ("WhiteBalanceAdjust", "BM_WhiteBalanceAdjust/4K", ">= 0.35"),
+    ("VignetteAdjust, amount -50", "BM_Vignette/4K/darken", ">= 0.3"),
+    ("HSLAdjust, all bands", "BM_HSLAdjust/4K/all8", ">= 0.15"),
+    ("DistortionFringingAdjust, both, warm", "BM_Lens/4K/both", ">= 0.2"),
+    ("DistortionFringingAdjust, strength changing every frame",
+     "BM_Lens/4K/distortion_rebuilt_each_frame", ">= 0.1"),
+    ("hueAdjustment 30 degrees", "BM_HueAdjust/4K/30deg", ">= 0.3"),
+    ("temperatureAdjustment", "BM_temperatureAdjustment/4K", ">= 0.1"),
+    ("doLUT 33 points, random", "BM_CubeLutDoLUT/4K/33/random", ">= 0.1"),
+    ("doLUT 33 points, photo-like", "BM_CubeLutDoLUT/4K/33/photo", ">= 0.1"),
+    ("doLUT 64 points, random", "BM_CubeLutDoLUT/4K/64/random", ">= 0.1"),
+    ("doLUT 64 points, photo-like", "BM_CubeLutDoLUT/4K/64/photo", ">= 0.1"),
+    ("ColorLut3dAdjust, 33-point file", "BM_ColorLut3dAdjust/4K/cube33", ">= 0.09"),
+    ("ColorLut3dAdjust, 64-point file", "BM_ColorLut3dAdjust/4K/cube64", ">= 0.09"),
+    ("ChromeKeyLut3d mask", "BM_ChromeKeyLut3d/4K/mask", ">= 0.08"),
+    ("ChromeKeyLut3d colours", "BM_ChromeKeyLut3d/4K/beauty", ">= 0.08"),
+]
+pair_cases = [  # label, ours, theirs, target
+    ("fastAverageBlur r7 (BGR) over cv::blur 15x15", "BM_FastAverageBlur/4K/bgr/r7",
+     "BM_CvBlur/4K/bgr/r7", ">= 1.3"),
+    ("fastFilter r3 over cv::medianBlur 7", "BM_FastFilter/4K/r3", "BM_CvMedianBlur/4K/r3",
+     ">= 1"),
+]
+speed_cases = [("deNoiseRGB", "BM_DeNoiseRGB/4K"), ("deNoiseLumiance", "BM_DeNoiseLumiance/4K")]
+
+def fraction(table, key):
+    t, memcpy = table.get(key, (None, None))
+    return "n/a" if not t or not memcpy else "%.3f" % (memcpy / t)
+
+def over(table, mine, theirs):
+    a, b = table.get(mine, (None, None))[0], table.get(theirs, (None, None))[0]
+    return "n/a" if not a or not b else "%.2f" % (b / a)
+
+if now_cases:
+    print()
+    cols = ("case, 4K, one thread", "before", "now", "target") if before_cases else \
+        ("case, 4K, one thread", "now", "target")
+    print("| " + " | ".join(cols) + " |")
+    print("|" + "|".join(["---"] * len(cols)) + "|")
+    def row(label, was, now, target):
+        cells = (label, was, now, target) if before_cases else (label, now, target)
+        print("| " + " | ".join(cells) + " |")
+    for label, key, target in ratio_cases:
+        row(label + " (x memcpy)", fraction(before_cases, key), fraction(now_cases, key), target)
+    for label, mine, theirs, target in pair_cases:
+        row(label, over(before_cases, mine, theirs), over(now_cases, mine, theirs), target)
+    for label, key in speed_cases:
+        was = before_cases.get(key, (None, None))[0]
+        now = now_cases.get(key, (None, None))[0]
+        row(label + " (ms a frame)", "n/a" if not was else "%.0f" % was,
+            "n/a" if not now else "%.0f" % now + (" (%.2fx)" % (was / now) if was else ""),
+            "2x faster")
 PY
