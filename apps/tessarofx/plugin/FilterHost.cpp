@@ -310,7 +310,11 @@ Status ResolveFilter(const std::vector<PublishedFilter>& published, const std::s
     }
   }
   if (!match) {
-    return Status::Error("unknown filter '" + request + "' (see 'tessarofx list')");
+    // The published names, as the parameter errors list theirs: the tool and the Python module
+    // both report this.
+    std::string known;
+    for (const PublishedFilter& f : published) known += (known.empty() ? "" : ", ") + f.name;
+    return Status::Error("unknown filter '" + request + "' (known: " + known + ")");
   }
   filter->guid = match->guid;
   filter->name = name;
