@@ -210,11 +210,10 @@ bool ColorAdjustPlan::Fuse() {
       if (hasSaturation_) ends = calNewColor(ends, sigma_);
       uint64_t entry = ends.rgbRed | uint32_t{ends.rgbBlue} << 8 | uint32_t(top + bottom) << 16;
       // A grey stays as it is, whatever the gain.
+      const SaturationSpread spread = SpreadOf(static_cast<float>(top), static_cast<float>(bottom));
+      // The kernels take l * 255 as half the sum, which it is for every pair.
+      if (hasSaturation_ && spread.lv != static_cast<float>(top + bottom) * 0.5f) return false;
       if (hasSaturation_ && increase && top != bottom) {
-        const SaturationSpread spread =
-            SpreadOf(static_cast<float>(top), static_cast<float>(bottom));
-        // The kernels take l * 255 as half the sum, which it is for every pair.
-        if (spread.lv != static_cast<float>(top + bottom) * 0.5f) return false;
         const float sat =
             spread.l < 0.5f ? spread.delta / spread.sum : spread.delta / (2.0f - spread.sum);
         const float a = sat + sigma_ >= 1.0f ? 1.0f / sat - 1.0f : 1.0f / (1.0f - sigma_) - 1.0f;
