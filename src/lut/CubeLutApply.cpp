@@ -3,11 +3,16 @@
 #include <algorithm>
 #include <climits>
 #include <cmath>
+#include <cstdlib>
 #include <cstring>
 #include <initializer_list>
 #include <memory>
 
 #include "simd/lut_tetra_rows.h"
+
+#if defined(__linux__)
+#include <sys/mman.h>
+#endif
 
 namespace tfx {
 namespace {
@@ -37,7 +42,27 @@ bool Coherent(const TetraTable& t, const uint8_t* in, ptrdiff_t inPitch, int wid
   return 2 * near >= kPairs;
 }
 
+// Packed points of `floats` floats. Random pixels read corners all over the lattice, and with
+// 4 KiB pages a 33-point lattice spans 141 pages and a slab of a 64-point one 272, more than the
+// first-level TLB holds; so large lattices get whole 2 MiB blocks, which Linux may back with large
+// pages on request.
+float* AllocatePoints(size_t floats) {
+  constexpr size_t kLarge = size_t{2} << 20;
+  const size_t bytes = floats * sizeof(float);
+  if (bytes < kLarge / 8) {
+    return static_cast<float*>(std::aligned_alloc(64, (bytes + 63) / 64 * 64));
+  }
+  const size_t blocks = (bytes + kLarge - 1) / kLarge * kLarge;
+  void* p = std::aligned_alloc(kLarge, blocks);
+#if defined(__linux__) && defined(MADV_HUGEPAGE)
+  if (p) madvise(p, blocks, MADV_HUGEPAGE);  // only advice: refused, the pages stay small
+#endif
+  return static_cast<float*>(p);
+}
+
 }  // namespace
+
+void TetraPlan::Free::operator()(float* p) const { std::free(p); }
 
 void TetraRowReference(const TetraTable& t, uint8_t* row, int width, int bytesPerPixel) {
   const int last = t.size - 1;
@@ -117,7 +142,7 @@ void TetraPlan::Prepare(const TetraTable& table) {
   }
   const size_t floats = static_cast<size_t>(n) * n * n * per;
   if (floats > capacity_) {
-    points_ = hwy::AllocateAligned<float>(floats);
+    points_.reset(AllocatePoints(floats));
     capacity_ = floats;
   }
   float* out = points_.get();

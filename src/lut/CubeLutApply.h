@@ -4,8 +4,7 @@
 
 #include <cstddef>
 #include <cstdint>
-
-#include <hwy/aligned_allocator.h>
+#include <memory>
 
 namespace tfx {
 
@@ -107,7 +106,10 @@ class TetraPlan {
   bool packed_ = false;
   bool grey_ = false;
   size_t capacity_ = 0;  // floats
-  hwy::AlignedFreeUniquePtr<float[]> points_;
+  struct Free {
+    void operator()(float* p) const;
+  };
+  std::unique_ptr<float[], Free> points_;
   float ft_[256] = {};
   float position_[256] = {};
   bool positional_ = false;
