@@ -20,7 +20,8 @@ void TetraRowVector(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int 
 size_t TetraBandCapacity(int width, int rows);
 
 // `rows` rows of 4-byte pixels (4-byte aligned, pitches in bytes) through a plan with Slabs() > 1,
-// a slab at a time; `scratch` holds Slabs() * TetraBandCapacity(width, rows) elements.
+// a slab at a time with AVX-512 and row by row on the other instruction sets; `scratch` holds
+// Slabs() * TetraBandCapacity(width, rows) elements.
 void TetraBandVector(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
                      ptrdiff_t pitch, int width, int rows, uint32_t* scratch, size_t capacity);
 
