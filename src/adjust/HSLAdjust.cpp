@@ -3,9 +3,11 @@
 // Everything that depends on the hue alone (the band weights and the three sums they give) is
 // folded into a table of 1536 hue steps per parameter set. Packed 32-bit pixels then go through
 // a vector kernel, compiled once per instruction set by foreach_target.h and picked at run time,
-// whose lanes evaluate the same float operations in the same order as the per-pixel form used
-// for the other layouts: both give the bytes the formulas in HSLAdjust.h define. Nothing is fused
-// into a multiply-add (no MulAdd, and the build passes -ffp-contract=off).
+// whose lanes work on the highest, lowest and middle channel value and move the three results
+// into place at the end. Each step there rounds exactly as the per-pixel form used for the other
+// layouts does (where a step is rewritten, the line above it says why it rounds alike), so both
+// give the bytes the formulas in HSLAdjust.h define. Nothing is fused into a multiply-add (no
+// MulAdd, and the build passes -ffp-contract=off).
 #ifndef TFX_ADJUST_HSLADJUST_SHARED
 #define TFX_ADJUST_HSLADJUST_SHARED
 
@@ -34,6 +36,18 @@ struct Tables {
   alignas(64) float hue[kHueSteps * 4];
 };
 
+// The byte picks of a pixel whose highest, lowest and middle channel values are its bytes 0, 1
+// and 2 (alpha 3) for the channels of hue sextant `sextant`, red at bit `red`; the sextant rides
+// in bits 4-6, which are masked off before the picks are used.
+constexpr uint32_t SextantPicks(int sextant, int red) {
+  // Highest (0), lowest (1) or middle (2) for red, green and blue.
+  constexpr uint8_t kRoles[6][3] = {{0, 2, 1}, {2, 0, 1}, {1, 0, 2},
+                                    {1, 2, 0}, {2, 1, 0}, {0, 1, 2}};
+  return (uint32_t{kRoles[sextant][0]} << red) | (uint32_t{kRoles[sextant][1]} << 8) |
+         (uint32_t{kRoles[sextant][2]} << (16 - red)) | (3u << 24) |
+         (static_cast<uint32_t>(sextant) << 4);
+}
+
 }  // namespace
 }  // namespace tfx
 
@@ -51,6 +65,20 @@ namespace HWY_NAMESPACE {
 namespace hn = hwy::HWY_NAMESPACE;
 
 #include "simd/pixel_lanes-inl.h"
+
+// trunc(v) for |v| < 2^22 as the bare conversion: ConvertTo adds an overflow fix-up these values
+// never need.
+HWY_INLINE VI TruncToInt(VF v) {
+#if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
+  return VI{_mm512_cvttps_epi32(v.raw)};
+#elif HWY_ARCH_X86 && HWY_TARGET == HWY_AVX2
+  return VI{_mm256_cvttps_epi32(v.raw)};
+#elif HWY_ARCH_X86 && (HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3)
+  return VI{_mm_cvttps_epi32(v.raw)};
+#else
+  return SmallToInt(v);
+#endif
+}
 
 // One vector of pixels; red at bit kRed, blue at bit 16 - kRed.
 template <int kRed>
@@ -73,10 +101,10 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
       hn::IfThenElse(hn::Eq(g, mx), hn::Add(c2, hn::Sub(b, r)), hn::Add(c4, hn::Sub(r, g))));
   // floor(256 p / c) from a float quotient: below 1536 its ulp is 2^-13, while a quotient that is
   // not an integer lies at least 1/c >= 1/255 from one, so rounding never crosses an integer.
-  // Greys divide by 1 instead and are kept below.
+  // Greys divide by 1 instead; every step below leaves them as they are.
   const VF cf = hn::ConvertTo(df, c);
   const VF divisor = hn::ConvertTo(df, hn::Max(c, hn::Set(di, 1)));
-  const VI j = SmallToInt(hn::Div(hn::ConvertTo(df, hn::ShiftLeft<8>(p)), divisor));
+  const VI j = TruncToInt(hn::Div(hn::ConvertTo(df, hn::ShiftLeft<8>(p)), divisor));
   const VI index = hn::ShiftLeft<2>(j);
   const VF shift = hn::GatherIndex(df, table, index);
   const VF k = hn::GatherIndex(df, table + 1, index);
@@ -89,83 +117,64 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
 
   const VF mxf = hn::ConvertTo(df, mx);
   const VF mnf = hn::ConvertTo(df, mn);
-  VF vr = hn::ConvertTo(df, r);
-  VF vg = hn::ConvertTo(df, g);
-  VF vb = hn::ConvertTo(df, b);
 
-  // Hue: the sextant k' is the number of thresholds n c (n = 1..5) that q reaches; the masks
-  // are nested, so the last one reached gives k' c.
-  {
-    const VF turn = hn::ConvertTo(df, c6);
-    VF q = hn::Add(hn::ConvertTo(df, p), hn::Mul(shift, cf));
-    q = hn::IfThenElse(hn::Lt(q, zero), hn::Add(q, turn),
-                       hn::IfThenElse(q >= turn, hn::Sub(q, turn), q));
-    const VF t1 = cf;
-    const VF t2 = hn::ConvertTo(df, c2);
-    const VF t3 = hn::ConvertTo(df, hn::Add(c2, c));
-    const VF t4 = hn::ConvertTo(df, c4);
-    const VF t5 = hn::ConvertTo(df, hn::Add(c4, c));
-    const auto m1 = q >= t1;
-    const auto m2 = q >= t2;
-    const auto m3 = q >= t3;
-    const auto m4 = q >= t4;
-    const auto m5 = q >= t5;
-    VF base = hn::IfThenElseZero(m1, t1);
-    base = hn::IfThenElse(m2, t2, base);
-    base = hn::IfThenElse(m3, t3, base);
-    base = hn::IfThenElse(m4, t4, base);
-    base = hn::IfThenElse(m5, t5, base);
-    const VF x = hn::Sub(q, base);
-    const VF rise = hn::Add(mnf, x);
-    const VF fall = hn::Sub(mxf, x);
-    const auto in0 = hn::Not(m1);
-    const auto in1 = hn::AndNot(m2, m1);
-    const auto in2 = hn::AndNot(m3, m2);
-    const auto in3 = hn::AndNot(m4, m3);
-    const auto in4 = hn::AndNot(m5, m4);
-    const VF hr = hn::IfThenElse(
-        in1, fall, hn::IfThenElse(in4, rise, hn::IfThenElse(hn::Or(in2, in3), mnf, mxf)));
-    const VF hg =
-        hn::IfThenElse(in0, rise, hn::IfThenElse(in3, fall, hn::IfThenElse(m4, mnf, mxf)));
-    const VF hb = hn::IfThenElse(in2, rise, hn::IfThenElse(m5, fall, hn::IfThenElse(m3, mxf, mnf)));
-    // A shift of 0 needs no lane of its own: every step above is then exact integer arithmetic
-    // that gives back the channels themselves.
-    vr = hr;
-    vg = hg;
-    vb = hb;
-  }
-  // Saturation around the lightness, no further than the chroma limit of that lightness.
-  {
-    const VI sum = hn::Add(mx, mn);
-    const VF m = hn::Mul(hn::ConvertTo(df, sum), hn::Set(df, 0.5f));
-    const VF limit =
-        hn::ConvertTo(df, hn::Sub(hn::Set(di, 255), hn::Abs(hn::Sub(sum, hn::Set(di, 255)))));
-    const VF s = hn::Div(hn::Min(hn::Mul(cf, k), limit), divisor);
-    const auto on = hn::Ne(k, one);
-    vr = hn::IfThenElse(on, hn::Add(m, hn::Mul(hn::Sub(vr, m), s)), vr);
-    vg = hn::IfThenElse(on, hn::Add(m, hn::Mul(hn::Sub(vg, m), s)), vg);
-    vb = hn::IfThenElse(on, hn::Add(m, hn::Mul(hn::Sub(vb, m), s)), vb);
-  }
+  // Hue: the sextant of q is the number of thresholds n c (n = 1..5) it reaches; the masks are
+  // nested, so the last one reached gives that sextant's picks.
+  const VF turn = hn::ConvertTo(df, c6);
+  VF q = hn::Add(hn::ConvertTo(df, p), hn::Mul(shift, cf));
+  q = hn::IfThenElse(hn::Lt(q, zero), hn::Add(q, turn),
+                     hn::IfThenElse(q >= turn, hn::Sub(q, turn), q));
+  // The thresholds are integers below 2^11, so these sums are exact.
+  const VF t2 = hn::Add(cf, cf);
+  const VF t4 = hn::Add(t2, t2);
+  VU picks = hn::Set(du, SextantPicks(0, kRed));
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= cf), hn::Set(du, SextantPicks(1, kRed)), picks);
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= t2), hn::Set(du, SextantPicks(2, kRed)), picks);
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= hn::Add(t2, cf)),
+                         hn::Set(du, SextantPicks(3, kRed)), picks);
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= t4), hn::Set(du, SextantPicks(4, kRed)), picks);
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= hn::Add(t4, cf)),
+                         hn::Set(du, SextantPicks(5, kRed)), picks);
+  const VI sextant = hn::BitCast(di, hn::And(hn::ShiftRight<4>(picks), hn::Set(du, 7u)));
+  // sextant * c below 2^11: exact, the threshold the masks picked.
+  const VF x = hn::Sub(q, hn::Mul(hn::ConvertTo(df, sextant), cf));
+  // The one channel that is neither the highest nor the lowest rises in even sextants and falls
+  // in odd ones. A shift of 0 needs no lane of its own: all of this is then exact integer
+  // arithmetic that gives back the channels themselves.
+  const VF mid = hn::IfThenElse(hn::RebindMask(df, hn::TestBit(picks, hn::Set(du, 0x10u))),
+                                hn::Sub(mxf, x), hn::Add(mnf, x));
+
+  // Saturation around the lightness, no further than the chroma limit of that lightness. A
+  // factor of 1 makes s exactly 1 (the limit is never below c) and leaves every value as it is;
+  // greys get s = 0 around their own value.
+  const VI sum = hn::Add(mx, mn);
+  const VF m = hn::Mul(hn::ConvertTo(df, sum), hn::Set(df, 0.5f));
+  const VF limit =
+      hn::ConvertTo(df, hn::Sub(hn::Set(di, 255), hn::Abs(hn::Sub(sum, hn::Set(di, 255)))));
+  const VF s = hn::Div(hn::Min(hn::Mul(cf, k), limit), divisor);
+  // mx - m is exactly c / 2 and mn - m its negative, whose product with s is the negated one.
+  const VF h = hn::Mul(hn::Mul(cf, hn::Set(df, 0.5f)), s);
+  const VF hi = hn::Add(m, h);
+  const VF lo = hn::Sub(m, h);
+  const VF md = hn::Add(m, hn::Mul(hn::Sub(mid, m), s));
+
   // Lightness towards white or black, faded out towards grey. c / 64 is exact as c * 2^-6.
-  {
-    const VF fade = hn::Min(one, hn::Mul(cf, hn::Set(df, 1.0f / 64.0f)));
-    const VF l = hn::Mul(light, fade);
-    // l = 0 adds (255 - v) * 0 or v * 0, a zero, which leaves v as it is.
-    const auto up = hn::Gt(l, zero);
-    const VF white = hn::Set(df, 255.0f);
-    vr = hn::Add(vr, hn::Mul(hn::IfThenElse(up, hn::Sub(white, vr), vr), l));
-    vg = hn::Add(vg, hn::Mul(hn::IfThenElse(up, hn::Sub(white, vg), vg), l));
-    vb = hn::Add(vb, hn::Mul(hn::IfThenElse(up, hn::Sub(white, vb), vb), l));
-  }
-  const auto round = [&](VF v) {
+  // l = 0 adds (255 - v) * 0 or v * 0, a zero, which leaves v as it is.
+  const VF fade = hn::Min(one, hn::Mul(cf, hn::Set(df, 1.0f / 64.0f)));
+  const VF l = hn::Mul(light, fade);
+  const auto up = hn::Gt(l, zero);
+  const VF white = hn::Set(df, 255.0f);
+  const auto byte = [&](VF v) {
+    v = hn::Add(v, hn::Mul(hn::IfThenElse(up, hn::Sub(white, v), v), l));
     const VF rounded = hn::Add(v, hn::Set(df, 0.5f));
-    return hn::BitCast(di, SmallToInt(hn::Min(hn::Max(rounded, zero), hn::Set(df, 255.0f))));
+    return hn::BitCast(du, TruncToInt(hn::Min(hn::Max(rounded, zero), white)));
   };
-  const VU out = hn::BitCast(
-      du, hn::Or(hn::Or(hn::BitCast(di, hn::And(px, hn::Set(du, 0xff000000u))),
-                        hn::ShiftLeft<8>(round(vg))),
-                 hn::Or(hn::ShiftLeft<kRed>(round(vr)), hn::ShiftLeft<16 - kRed>(round(vb)))));
-  return hn::IfThenElse(hn::RebindMask(du, keep), px, out);
+  // Highest, lowest, middle and alpha as bytes 0..3, then each moved to its channel.
+  const VU values =
+      hn::Or(hn::Or(byte(hi), hn::ShiftLeft<8>(byte(lo))),
+             hn::Or(hn::ShiftLeft<16>(byte(md)), hn::And(px, hn::Set(du, 0xff000000u))));
+  const VU lane = hn::Mul(hn::And(hn::Iota(du, 0), hn::Set(du, 3u)), hn::Set(du, 0x04040404u));
+  return hn::TableLookupBytes(values, hn::Add(hn::And(picks, hn::Set(du, 0x0f0f0f0fu)), lane));
 }
 
 template <int kRed>
