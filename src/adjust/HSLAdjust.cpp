@@ -36,15 +36,15 @@ struct Tables {
   alignas(64) float hue[kHueSteps * 4];
 };
 
-// The byte picks of a pixel whose highest, lowest and middle channel values are its bytes 0, 1
-// and 2 (alpha 3) for the channels of hue sextant `sextant`, red at bit `red`; the sextant rides
-// in bits 4-6, which are masked off before the picks are used.
-constexpr uint32_t SextantPicks(int sextant, int red) {
+// The byte picks for hue sextant `sextant`, red at bit `red`, where the highest, lowest and
+// middle channel value and alpha of a pixel lie `stride` bytes apart; the sextant rides in bits
+// 4-6, which are masked off before the picks are used.
+constexpr uint32_t SextantPicks(int sextant, int red, uint32_t stride) {
   // Highest (0), lowest (1) or middle (2) for red, green and blue.
   constexpr uint8_t kRoles[6][3] = {{0, 2, 1}, {2, 0, 1}, {1, 0, 2},
                                     {1, 2, 0}, {2, 1, 0}, {0, 1, 2}};
-  return (uint32_t{kRoles[sextant][0]} << red) | (uint32_t{kRoles[sextant][1]} << 8) |
-         (uint32_t{kRoles[sextant][2]} << (16 - red)) | (3u << 24) |
+  return (kRoles[sextant][0] * stride << red) | (kRoles[sextant][1] * stride << 8) |
+         (kRoles[sextant][2] * stride << (16 - red)) | (3 * stride << 24) |
          (static_cast<uint32_t>(sextant) << 4);
 }
 
@@ -79,6 +79,38 @@ HWY_INLINE VI TruncToInt(VF v) {
   return SmallToInt(v);
 #endif
 }
+
+#if HWY_ARCH_X86 && HWY_TARGET != HWY_SCALAR && HWY_TARGET != HWY_EMU128
+// Bytes of the highest, lowest and middle value and alpha of pixel i lie at 4 * role + i % 4 of
+// its 16-byte block: two saturating packs, which also clamp to 0..255.
+constexpr uint32_t kStride = 4;
+constexpr uint32_t kLaneStep = 0x01010101u;
+HWY_INLINE VU PackValues(VF hi, VF lo, VF mid, VU px) {
+  const hn::Repartition<int16_t, DU> d16;
+  const auto hiLo = hn::ReorderDemote2To(d16, TruncToInt(hi), TruncToInt(lo));
+  const auto midAlpha =
+      hn::ReorderDemote2To(d16, TruncToInt(mid), hn::BitCast(DI(), hn::ShiftRight<24>(px)));
+#if HWY_TARGET <= HWY_AVX3
+  return VU{_mm512_packus_epi16(hiLo.raw, midAlpha.raw)};
+#elif HWY_TARGET == HWY_AVX2
+  return VU{_mm256_packus_epi16(hiLo.raw, midAlpha.raw)};
+#else
+  return VU{_mm_packus_epi16(hiLo.raw, midAlpha.raw)};
+#endif
+}
+#else
+// Bytes 0..3 of pixel i: highest, lowest and middle value and alpha.
+constexpr uint32_t kStride = 1;
+constexpr uint32_t kLaneStep = 0x04040404u;
+HWY_INLINE VU PackValues(VF hi, VF lo, VF mid, VU px) {
+  const DF df;
+  const auto byte = [&](VF v) {
+    return hn::BitCast(DU(), TruncToInt(hn::Min(hn::Max(v, hn::Zero(df)), hn::Set(df, 255.0f))));
+  };
+  return hn::Or(hn::Or(byte(hi), hn::ShiftLeft<8>(byte(lo))),
+                hn::Or(hn::ShiftLeft<16>(byte(mid)), hn::And(px, hn::Set(DU(), 0xff000000u))));
+}
+#endif
 
 // One vector of pixels; red at bit kRed, blue at bit 16 - kRed.
 template <int kRed>
@@ -127,14 +159,17 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
   // The thresholds are integers below 2^11, so these sums are exact.
   const VF t2 = hn::Add(cf, cf);
   const VF t4 = hn::Add(t2, t2);
-  VU picks = hn::Set(du, SextantPicks(0, kRed));
-  picks = hn::IfThenElse(hn::RebindMask(du, q >= cf), hn::Set(du, SextantPicks(1, kRed)), picks);
-  picks = hn::IfThenElse(hn::RebindMask(du, q >= t2), hn::Set(du, SextantPicks(2, kRed)), picks);
+  VU picks = hn::Set(du, SextantPicks(0, kRed, kStride));
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= cf), hn::Set(du, SextantPicks(1, kRed, kStride)),
+                         picks);
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= t2), hn::Set(du, SextantPicks(2, kRed, kStride)),
+                         picks);
   picks = hn::IfThenElse(hn::RebindMask(du, q >= hn::Add(t2, cf)),
-                         hn::Set(du, SextantPicks(3, kRed)), picks);
-  picks = hn::IfThenElse(hn::RebindMask(du, q >= t4), hn::Set(du, SextantPicks(4, kRed)), picks);
+                         hn::Set(du, SextantPicks(3, kRed, kStride)), picks);
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= t4), hn::Set(du, SextantPicks(4, kRed, kStride)),
+                         picks);
   picks = hn::IfThenElse(hn::RebindMask(du, q >= hn::Add(t4, cf)),
-                         hn::Set(du, SextantPicks(5, kRed)), picks);
+                         hn::Set(du, SextantPicks(5, kRed, kStride)), picks);
   const VI sextant = hn::BitCast(di, hn::And(hn::ShiftRight<4>(picks), hn::Set(du, 7u)));
   // sextant * c below 2^11: exact, the threshold the masks picked.
   const VF x = hn::Sub(q, hn::Mul(hn::ConvertTo(df, sextant), cf));
@@ -164,16 +199,13 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
   const VF l = hn::Mul(light, fade);
   const auto up = hn::Gt(l, zero);
   const VF white = hn::Set(df, 255.0f);
-  const auto byte = [&](VF v) {
+  // Each value lit and rounded, v + 0.5 to be truncated; the bytes then moved to their channels.
+  const auto lit = [&](VF v) {
     v = hn::Add(v, hn::Mul(hn::IfThenElse(up, hn::Sub(white, v), v), l));
-    const VF rounded = hn::Add(v, hn::Set(df, 0.5f));
-    return hn::BitCast(du, TruncToInt(hn::Min(hn::Max(rounded, zero), white)));
+    return hn::Add(v, hn::Set(df, 0.5f));
   };
-  // Highest, lowest, middle and alpha as bytes 0..3, then each moved to its channel.
-  const VU values =
-      hn::Or(hn::Or(byte(hi), hn::ShiftLeft<8>(byte(lo))),
-             hn::Or(hn::ShiftLeft<16>(byte(md)), hn::And(px, hn::Set(du, 0xff000000u))));
-  const VU lane = hn::Mul(hn::And(hn::Iota(du, 0), hn::Set(du, 3u)), hn::Set(du, 0x04040404u));
+  const VU values = PackValues(lit(hi), lit(lo), lit(md), px);
+  const VU lane = hn::Mul(hn::And(hn::Iota(du, 0), hn::Set(du, 3u)), hn::Set(du, kLaneStep));
   return hn::TableLookupBytes(values, hn::Add(hn::And(picks, hn::Set(du, 0x0f0f0f0fu)), lane));
 }
 
