@@ -29,7 +29,8 @@ namespace {
 
 constexpr int kHueSteps = 1536;  // 256 per sextant
 
-// Per hue step: hue shift in sextants, chroma factor, lightness before the grey fade, unused.
+// Per hue step: hue shift in sextants, chroma factor, lightness before the grey fade (+0 only
+// where no band touches the step), unused.
 struct Tables {
   HSLBands bands;
   bool active;
@@ -37,15 +38,15 @@ struct Tables {
 };
 
 // The byte picks for hue sextant `sextant`, red at bit `red`, where the highest, lowest and
-// middle channel value and alpha of a pixel lie `stride` bytes apart; the sextant rides in bits
-// 4-6, which are masked off before the picks are used.
+// middle channel value and alpha of a pixel lie `stride` bytes apart. The sextant rides in bits
+// 28-30, which a byte shuffle ignores.
 constexpr uint32_t SextantPicks(int sextant, int red, uint32_t stride) {
   // Highest (0), lowest (1) or middle (2) for red, green and blue.
   constexpr uint8_t kRoles[6][3] = {{0, 2, 1}, {2, 0, 1}, {1, 0, 2},
                                     {1, 2, 0}, {2, 1, 0}, {0, 1, 2}};
   return (kRoles[sextant][0] * stride << red) | (kRoles[sextant][1] * stride << 8) |
          (kRoles[sextant][2] * stride << (16 - red)) | (3 * stride << 24) |
-         (static_cast<uint32_t>(sextant) << 4);
+         (static_cast<uint32_t>(sextant) << 28);
 }
 
 }  // namespace
@@ -112,9 +113,34 @@ HWY_INLINE VU PackValues(VF hi, VF lo, VF mid, VU px) {
 }
 #endif
 
+// Picks for every sextant, each lane's own byte offset within its block added.
+struct LanePicks {
+  VU of[6];
+};
+
+template <int kRed>
+HWY_INLINE LanePicks MakeLanePicks() {
+  const DU du;
+  const VU lane = hn::Mul(hn::And(hn::Iota(du, 0), hn::Set(du, 3u)), hn::Set(du, kLaneStep));
+  LanePicks picks;
+  for (int n = 0; n < 6; ++n) {
+    picks.of[n] = hn::Add(hn::Set(du, SextantPicks(n, kRed, kStride)), lane);
+  }
+  return picks;
+}
+
+// The picked bytes of `values`; bits 4-6 of a pick are not part of its byte index.
+HWY_INLINE VU PickBytes(VU values, VU picks) {
+#if HWY_ARCH_X86 && HWY_TARGET != HWY_SCALAR && HWY_TARGET != HWY_EMU128
+  return hn::TableLookupBytes(values, picks);
+#else
+  return hn::TableLookupBytes(values, hn::And(picks, hn::Set(DU(), 0x0f0f0f0fu)));
+#endif
+}
+
 // One vector of pixels; red at bit kRed, blue at bit 16 - kRed.
 template <int kRed>
-HWY_INLINE VU AdjustPixels(VU px, const float* table) {
+HWY_INLINE VU AdjustPixels(VU px, const float* table, const LanePicks& sextantPicks) {
   const DU du;
   const DI di;
   const DF df;
@@ -143,9 +169,9 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
   const VF light = hn::GatherIndex(df, table + 2, index);
   const VF zero = hn::Zero(df);
   const VF one = hn::Set(df, 1.0f);
-  const auto untouched = hn::And(hn::And(hn::Eq(shift, zero), hn::Eq(k, one)), hn::Eq(light, zero));
-  const auto keep = hn::Or(hn::RebindMask(df, hn::Eq(c, hn::Zero(di))), untouched);
-  if (hn::AllTrue(df, keep)) return px;
+  // Greys and hue steps no band touches (lightness +0 exactly) come out as they went in.
+  const auto keep = hn::Or(hn::Eq(c, hn::Zero(di)), hn::Eq(hn::BitCast(di, light), hn::Zero(di)));
+  if (hn::AllTrue(di, keep)) return px;
 
   const VF mxf = hn::ConvertTo(df, mx);
   const VF mnf = hn::ConvertTo(df, mn);
@@ -159,25 +185,20 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
   // The thresholds are integers below 2^11, so these sums are exact.
   const VF t2 = hn::Add(cf, cf);
   const VF t4 = hn::Add(t2, t2);
-  VU picks = hn::Set(du, SextantPicks(0, kRed, kStride));
-  picks = hn::IfThenElse(hn::RebindMask(du, q >= cf), hn::Set(du, SextantPicks(1, kRed, kStride)),
-                         picks);
-  picks = hn::IfThenElse(hn::RebindMask(du, q >= t2), hn::Set(du, SextantPicks(2, kRed, kStride)),
-                         picks);
-  picks = hn::IfThenElse(hn::RebindMask(du, q >= hn::Add(t2, cf)),
-                         hn::Set(du, SextantPicks(3, kRed, kStride)), picks);
-  picks = hn::IfThenElse(hn::RebindMask(du, q >= t4), hn::Set(du, SextantPicks(4, kRed, kStride)),
-                         picks);
-  picks = hn::IfThenElse(hn::RebindMask(du, q >= hn::Add(t4, cf)),
-                         hn::Set(du, SextantPicks(5, kRed, kStride)), picks);
-  const VI sextant = hn::BitCast(di, hn::And(hn::ShiftRight<4>(picks), hn::Set(du, 7u)));
+  VU picks = sextantPicks.of[0];
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= cf), sextantPicks.of[1], picks);
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= t2), sextantPicks.of[2], picks);
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= hn::Add(t2, cf)), sextantPicks.of[3], picks);
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= t4), sextantPicks.of[4], picks);
+  picks = hn::IfThenElse(hn::RebindMask(du, q >= hn::Add(t4, cf)), sextantPicks.of[5], picks);
   // sextant * c below 2^11: exact, the threshold the masks picked.
-  const VF x = hn::Sub(q, hn::Mul(hn::ConvertTo(df, sextant), cf));
+  const VF x =
+      hn::Sub(q, hn::Mul(hn::ConvertTo(df, hn::BitCast(di, hn::ShiftRight<28>(picks))), cf));
   // The one channel that is neither the highest nor the lowest rises in even sextants and falls
-  // in odd ones. A shift of 0 needs no lane of its own: all of this is then exact integer
-  // arithmetic that gives back the channels themselves.
-  const VF mid = hn::IfThenElse(hn::RebindMask(df, hn::TestBit(picks, hn::Set(du, 0x10u))),
-                                hn::Sub(mxf, x), hn::Add(mnf, x));
+  // in odd ones (bit 28 of the picks, moved to the sign). A shift of 0 needs no lane of its own:
+  // all of this is then exact integer arithmetic that gives back the channels themselves.
+  const auto falls = hn::Lt(hn::BitCast(di, hn::ShiftLeft<3>(picks)), hn::Zero(di));
+  const VF mid = hn::IfThenElse(hn::RebindMask(df, falls), hn::Sub(mxf, x), hn::Add(mnf, x));
 
   // Saturation around the lightness, no further than the chroma limit of that lightness. A
   // factor of 1 makes s exactly 1 (the limit is never below c) and leaves every value as it is;
@@ -204,9 +225,7 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table) {
     v = hn::Add(v, hn::Mul(hn::IfThenElse(up, hn::Sub(white, v), v), l));
     return hn::Add(v, hn::Set(df, 0.5f));
   };
-  const VU values = PackValues(lit(hi), lit(lo), lit(md), px);
-  const VU lane = hn::Mul(hn::And(hn::Iota(du, 0), hn::Set(du, 3u)), hn::Set(du, kLaneStep));
-  return hn::TableLookupBytes(values, hn::Add(hn::And(picks, hn::Set(du, 0x0f0f0f0fu)), lane));
+  return PickBytes(PackValues(lit(hi), lit(lo), lit(md), px), picks);
 }
 
 template <int kRed>
@@ -214,6 +233,7 @@ void AdjustRowsOf(uint8_t* dst, size_t dstStride, const uint8_t* src, size_t src
                   size_t count, const float* table) {
   const DU du;
   const size_t lanes = hn::Lanes(du);
+  const LanePicks picks = MakeLanePicks<kRed>();
   for (size_t y = 0; y < rows; ++y) {
     const uint8_t* in = src + y * srcStride;
     uint8_t* out = dst + y * dstStride;
@@ -222,13 +242,14 @@ void AdjustRowsOf(uint8_t* dst, size_t dstStride, const uint8_t* src, size_t src
       // A frame far beyond the caches streams in faster when asked for well ahead of use.
       __builtin_prefetch(in + 4 * i + 4096);
       const VU px = hn::LoadU(du, reinterpret_cast<const uint32_t*>(in + 4 * i));
-      hn::StoreU(AdjustPixels<kRed>(px, table), du, reinterpret_cast<uint32_t*>(out + 4 * i));
+      hn::StoreU(AdjustPixels<kRed>(px, table, picks), du,
+                 reinterpret_cast<uint32_t*>(out + 4 * i));
     }
     if (i < count) {
       // The tail through a full vector, so that it sees the very same operations.
       alignas(64) uint32_t tail[HWY_MAX_BYTES / 4] = {};
       std::memcpy(tail, in + 4 * i, 4 * (count - i));
-      hn::Store(AdjustPixels<kRed>(hn::Load(du, tail), table), du, tail);
+      hn::Store(AdjustPixels<kRed>(hn::Load(du, tail), table, picks), du, tail);
       std::memcpy(out + 4 * i, tail, 4 * (count - i));
     }
   }
@@ -327,6 +348,10 @@ void Build(const HSLBands& bands, Tables* t) {
     entry[1] = static_cast<float>(std::max(0.0, 1.0 + sat));
     entry[2] = static_cast<float>(std::min(1.0, std::max(-1.0, light)));
     entry[3] = 0.0f;
+    // A lightness of exactly +0 marks a step no band touches; a touched one with no lightness
+    // change holds -0, which lights every value by a zero just the same.
+    const bool untouched = entry[0] == 0.0f && entry[1] == 1.0f && entry[2] == 0.0f;
+    entry[2] = untouched ? 0.0f : entry[2] == 0.0f ? -0.0f : entry[2];
   }
 }
 
