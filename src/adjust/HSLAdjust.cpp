@@ -160,15 +160,17 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table, const LanePicks& sextantPi
   // floor(256 p / c) from a float quotient: below 1536 its ulp is 2^-13, while a quotient that is
   // not an integer lies at least 1/c >= 1/255 from one, so rounding never crosses an integer.
   // Greys divide by 1 instead; every step below leaves them as they are.
+  // Every integer here is below 2^24, so its float and these products and sums are exact.
+  const VF one = hn::Set(df, 1.0f);
   const VF cf = hn::ConvertTo(df, c);
-  const VF divisor = hn::ConvertTo(df, hn::Max(c, hn::Set(di, 1)));
-  const VI j = TruncToInt(hn::Div(hn::ConvertTo(df, hn::ShiftLeft<8>(p)), divisor));
+  const VF pf = hn::ConvertTo(df, p);
+  const VF divisor = hn::Max(cf, one);
+  const VI j = TruncToInt(hn::Div(hn::Mul(pf, hn::Set(df, 256.0f)), divisor));
   const VI index = hn::ShiftLeft<2>(j);
   const VF shift = hn::GatherIndex(df, table, index);
   const VF k = hn::GatherIndex(df, table + 1, index);
   const VF light = hn::GatherIndex(df, table + 2, index);
   const VF zero = hn::Zero(df);
-  const VF one = hn::Set(df, 1.0f);
   // Greys and hue steps no band touches (lightness +0 exactly) come out as they went in.
   const auto keep = hn::Or(hn::Eq(c, hn::Zero(di)), hn::Eq(hn::BitCast(di, light), hn::Zero(di)));
   if (hn::AllTrue(di, keep)) return px;
@@ -179,7 +181,7 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table, const LanePicks& sextantPi
   // Hue: the sextant of q is the number of thresholds n c (n = 1..5) it reaches; the masks are
   // nested, so the last one reached gives that sextant's picks.
   const VF turn = hn::ConvertTo(df, c6);
-  VF q = hn::Add(hn::ConvertTo(df, p), hn::Mul(shift, cf));
+  VF q = hn::Add(pf, hn::Mul(shift, cf));
   q = hn::IfThenElse(hn::Lt(q, zero), hn::Add(q, turn),
                      hn::IfThenElse(q >= turn, hn::Sub(q, turn), q));
   // The thresholds are integers below 2^11, so these sums are exact.
@@ -203,10 +205,10 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table, const LanePicks& sextantPi
   // Saturation around the lightness, no further than the chroma limit of that lightness. A
   // factor of 1 makes s exactly 1 (the limit is never below c) and leaves every value as it is;
   // greys get s = 0 around their own value.
-  const VI sum = hn::Add(mx, mn);
-  const VF m = hn::Mul(hn::ConvertTo(df, sum), hn::Set(df, 0.5f));
-  const VF limit =
-      hn::ConvertTo(df, hn::Sub(hn::Set(di, 255), hn::Abs(hn::Sub(sum, hn::Set(di, 255)))));
+  // The limit 255 - |sum - 255| is the lesser of sum and 510 - sum.
+  const VF sum = hn::Add(mxf, mnf);
+  const VF m = hn::Mul(sum, hn::Set(df, 0.5f));
+  const VF limit = hn::Min(sum, hn::Sub(hn::Set(df, 510.0f), sum));
   const VF s = hn::Div(hn::Min(hn::Mul(cf, k), limit), divisor);
   // mx - m is exactly c / 2 and mn - m its negative, whose product with s is the negated one.
   const VF h = hn::Mul(hn::Mul(cf, hn::Set(df, 0.5f)), s);
