@@ -83,7 +83,8 @@ HWY_INLINE VI TruncToInt(VF v) {
 
 #if HWY_ARCH_X86 && HWY_TARGET != HWY_SCALAR && HWY_TARGET != HWY_EMU128
 // Bytes of the highest, lowest and middle value and alpha of pixel i lie at 4 * role + i % 4 of
-// its 16-byte block: two saturating packs, which also clamp to 0..255.
+// its 16-byte block. The two saturating packs clamp to 0..255 as the rounding must; a value in
+// (-1, 0) has already truncated to 0.
 constexpr uint32_t kStride = 4;
 constexpr uint32_t kLaneStep = 0x01010101u;
 HWY_INLINE VU PackValues(VF hi, VF lo, VF mid, VU px) {
@@ -159,8 +160,8 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table, const LanePicks& sextantPi
       hn::IfThenElse(hn::Eq(g, mx), hn::Add(c2, hn::Sub(b, r)), hn::Add(c4, hn::Sub(r, g))));
   // floor(256 p / c) from a float quotient: below 1536 its ulp is 2^-13, while a quotient that is
   // not an integer lies at least 1/c >= 1/255 from one, so rounding never crosses an integer.
-  // Greys divide by 1 instead; every step below leaves them as they are.
-  // Every integer here is below 2^24, so its float and these products and sums are exact.
+  // Greys divide by 1 instead; every step below leaves them as they are. The integers here are
+  // far below 2^24, so their floats and these products are exact.
   const VF one = hn::Set(df, 1.0f);
   const VF cf = hn::ConvertTo(df, c);
   const VF pf = hn::ConvertTo(df, p);
@@ -204,8 +205,8 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table, const LanePicks& sextantPi
 
   // Saturation around the lightness, no further than the chroma limit of that lightness. A
   // factor of 1 makes s exactly 1 (the limit is never below c) and leaves every value as it is;
-  // greys get s = 0 around their own value.
-  // The limit 255 - |sum - 255| is the lesser of sum and 510 - sum.
+  // greys get s = 0 around their own value. The limit 255 - |sum - 255| is the lesser of sum
+  // and 510 - sum, all exact in float.
   const VF sum = hn::Add(mxf, mnf);
   const VF m = hn::Mul(sum, hn::Set(df, 0.5f));
   const VF limit = hn::Min(sum, hn::Sub(hn::Set(df, 510.0f), sum));
