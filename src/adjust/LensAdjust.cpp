@@ -10,11 +10,14 @@
 // set that one thread is reading stays alive when another evicts or releases it.
 #include "tessarofx/LensAdjust.h"
 
+#include <sys/mman.h>
+
 #include <atomic>
 #include <climits>
 #include <cmath>
 #include <cstddef>
 #include <cstdint>
+#include <cstdlib>
 #include <cstring>
 #include <memory>
 #include <mutex>
@@ -418,7 +421,22 @@ bool PackedBgra(const CxImage& image, int width, int height) {
          image.GetSize() == size_t(width) * size_t(height) * 4;
 }
 
+// Whole huge pages where the system lends them: the composite is written once, all of it, and a
+// fault per 4 KiB page costs a good share of building it.
+LensBlock* AllocateBlocks(size_t count) {
+  const size_t huge = size_t{2} << 20;
+  const size_t bytes = (count * sizeof(LensBlock) + huge - 1) / huge * huge;
+  void* memory = nullptr;
+  if (posix_memalign(&memory, huge, bytes) != 0) return nullptr;
+#ifdef MADV_HUGEPAGE
+  madvise(memory, bytes, MADV_HUGEPAGE);
+#endif
+  return static_cast<LensBlock*>(memory);
+}
+
 }  // namespace
+
+void LensComposite::Free::operator()(LensBlock* blocks) const { std::free(blocks); }
 
 bool ComposeLens(float d, float f, int width, int height, LensComposite* out) {
   *out = LensComposite();
@@ -430,27 +448,42 @@ bool ComposeLens(float d, float f, int width, int height, LensComposite* out) {
   const LensMapsRef fringe = FringingMaps(f, width, height);
   if (!distort || !fringe) return false;
   const size_t count = size_t(width) * size_t(height);
-  for (auto& plane : out->offset) {
-    plane.reset(new (std::nothrow) int32_t[count]);
-    if (!plane) {
-      *out = LensComposite();
-      return false;
-    }
-  }
+  const size_t blocks = (count + 15) / 16;
+  out->blocks.reset(AllocateBlocks(blocks));
+  if (!out->blocks) return false;
   // A fringing point is a pixel j of the distorted frame (always inside it), which holds the
   // source's bytes at the distortion's offset, or the source's own pixel j when that offset
   // leaves the buffer.
-  const int64_t rowBytes = int64_t{width} * 4;
+  const int32_t rowBytes = width * 4;
   const int64_t size = int64_t(count) * 4;
   const LensPoint* d0 = distort->plane[0].get();
-  for (int p = 0; p < 3; ++p) {
-    const LensPoint* points = fringe->plane[p].get();
-    int32_t* offsets = out->offset[p].get();
-    for (size_t i = 0; i < count; ++i) {
-      const size_t j = size_t(points[i].y) * size_t(width) + size_t(points[i].x);
-      const int64_t pos = int64_t{d0[j].y} * rowBytes + d0[j].x;
-      offsets[i] = static_cast<int32_t>(pos >= 0 && pos + 4 <= size ? pos : int64_t(j) * 4);
+  const LensPoint* planes[3] = {fringe->plane[0].get(), fringe->plane[1].get(),
+                                fringe->plane[2].get()};
+  LensBlock* coded = out->blocks.get();
+  BestLensResampleRows().composeBlocks(planes[0], planes[1], planes[2], d0, count, width, coded);
+  try {
+    for (size_t b = 0; b < blocks; ++b) {
+      if (coded[b].spill != -2) continue;
+      coded[b] = LensBlock();
+      coded[b].spill = static_cast<int32_t>(out->spill.size() / 48);
+      const size_t i0 = b * 16;
+      for (int p = 0; p < 3; ++p) {
+        for (size_t l = 0; l < 16; ++l) {
+          // Past the last pixel, offset 0: read, never written.
+          int32_t offset = 0;
+          if (i0 + l < count) {
+            const LensPoint point = planes[p][i0 + l];
+            const size_t j = size_t(point.y) * size_t(width) + size_t(point.x);
+            const int64_t pos = int64_t{d0[j].y} * rowBytes + d0[j].x;
+            offset = static_cast<int32_t>(pos >= 0 && pos + 4 <= size ? pos : int64_t(j) * 4);
+          }
+          out->spill.push_back(offset);
+        }
+      }
     }
+  } catch (const std::bad_alloc&) {
+    *out = LensComposite();
+    return false;
   }
   out->distortion = d;
   out->fringing = f;
@@ -460,13 +493,14 @@ bool ComposeLens(float d, float f, int width, int height, LensComposite* out) {
 }
 
 bool DistortFringeFrom(const CxImage& source, CxImage* target, const LensComposite& composite) {
-  if (!composite.offset[0] || !PackedBgra(source, composite.width, composite.height) ||
+  if (!composite.blocks || !PackedBgra(source, composite.width, composite.height) ||
       !PackedBgra(*target, composite.width, composite.height)) {
     return false;
   }
-  BestLensResampleRows().fringeOffsets(
-      composite.offset[0].get(), composite.offset[1].get(), composite.offset[2].get(),
-      size_t(composite.width) * size_t(composite.height), source.GetBits(), target->GetBits());
+  BestLensResampleRows().fringeBlocks(composite.blocks.get(),
+                                      size_t(composite.width) * size_t(composite.height),
+                                      composite.spill.data(), composite.width * 4, source.GetBits(),
+                                      static_cast<int32_t>(source.GetSize()), target->GetBits());
   return true;
 }
 

@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <memory>
 #include <utility>
+#include <vector>
 
 #include "tessarofx/CxImage.h"
 
@@ -72,16 +73,31 @@ uint64_t LensMapBuilds();
 bool DistortFrom(const CxImage& source, CxImage* target, float d);
 bool FringeFrom(const CxImage& source, CxImage* target, float f);
 
+// Sixteen consecutive output pixels of the one-pass resampling below. The sources a plane reads
+// for sixteen neighbours lie on a short stretch of up to four rows, so each is coded in a byte
+// against the plane's base offset: the top two bits count rows (rowBytes apart), the low six the
+// bytes from there, at most 60 so that the word fits in the row's 64-byte window. Blocks that do
+// not fit, or hold the frame's last pixels, keep their offsets in LensComposite::spill instead.
+struct alignas(64) LensBlock {
+  uint8_t index[3][16];  // blue, green (and alpha), red
+  int32_t base[3];       // windows of 64 bytes start at base + row * rowBytes, inside the frame
+  int32_t spill;         // -1, or where the block's 48 offsets start in units of 48
+};
+
 // Distortion followed by fringing on packed BGRA frames, in one pass: for each output pixel, the
 // byte offsets into the source that its blue, its green and alpha, and its red come from after
-// both steps. Built for one setting and size; large (three ints per pixel), so kept by the
-// caller that runs the setting frame after frame.
+// both steps. Built for one setting and size (about four bytes a pixel), so kept by the caller
+// that runs the setting frame after frame.
 struct LensComposite {
   float distortion = 0.0f;
   float fringing = 0.0f;
   int width = 0;
   int height = 0;
-  std::unique_ptr<int32_t[]> offset[3];  // blue, green (and alpha), red
+  struct Free {
+    void operator()(LensBlock* blocks) const;
+  };
+  std::unique_ptr<LensBlock[], Free> blocks;  // one per sixteen pixels, rounded up
+  std::vector<int32_t> spill;  // per spilled block: blue, green, red offsets, 16 each
 };
 
 // Builds `out` for both (non-zero) strengths and a packed BGRA frame of this size; false, with

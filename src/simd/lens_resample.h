@@ -27,6 +27,19 @@ struct LensResampleRows {
   // those at red[i], green and alpha from those at green[i]. Every offset leaves four bytes.
   void (*fringeOffsets)(const int32_t* blue, const int32_t* green, const int32_t* red, size_t count,
                         const uint8_t* src, uint8_t* dst);
+  // `count` pixels of `dst` from the blocks of a one-pass composite (see LensBlock) over a packed
+  // frame `src` of `srcSize` bytes with rows of `rowBytes`: each pixel as fringeOffsets makes it
+  // from the offsets its block codes, or from the block's offsets in `spill`.
+  void (*fringeBlocks)(const LensBlock* blocks, size_t count, const int32_t* spill,
+                       int32_t rowBytes, const uint8_t* src, int32_t srcSize, uint8_t* dst);
+  // The blocks of a one-pass composite (see LensBlock) over a packed BGRA frame of `count`
+  // pixels, `width` to a row: pixel i's plane takes the distortion's source (row y, byte x: the
+  // offset y * width * 4 + x) at the point of that plane's fringing map. Blocks that need their
+  // offsets spilled (sources past the windows, a distortion source outside the frame, the last
+  // partial block) are marked with spill = -2 and otherwise left for the caller. Offsets stay
+  // within int32_t: sides of at most 8191 pixels.
+  void (*composeBlocks)(const LensPoint* blue, const LensPoint* green, const LensPoint* red,
+                        const LensPoint* distort, size_t count, int32_t width, LensBlock* blocks);
   // The distortion map's step from the strength-independent values of each quadrant point
   // (radius r, power = r^e rounded to float, direction cosT, sinT) to its offset from the
   // centre, in float: rp = (power * k + r) * rescale, x = cosT * rp * nx, y = sinT * rp * ny.

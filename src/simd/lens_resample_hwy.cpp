@@ -145,6 +145,162 @@ void FringeOffsetsRow(const int32_t* blue, const int32_t* green, const int32_t* 
   }
 }
 
+static_assert(sizeof(LensBlock) == 64, "a block is one vector on the widest targets");
+
+#if HWY_TARGET == HWY_AVX3_DL
+// Byte 4i + c of the pixel vector takes plane (blue, green, red, green)[c]'s index of pixel i,
+// plus c: the byte of the source word that channel comes from.
+HWY_INLINE __m512i BlockBytes(const LensBlock& block, __m512i spread) {
+  const __m512i indices = _mm512_load_si512(&block);
+  return _mm512_add_epi8(_mm512_permutexvar_epi8(spread, indices), _mm512_set1_epi32(0x03020100));
+}
+
+// Every byte of one plane from its four row windows: two 128-byte permutes (bit 6 picks the row
+// within each pair) and bit 7 between them. Windows of rows the block does not use are pulled
+// back inside the frame; their bytes are never picked.
+HWY_INLINE __m512i PlaneBytes(const uint8_t* src, int32_t base, int32_t rowBytes, int32_t last,
+                              __m512i bytes, __mmask64 upper) {
+  const auto window = [&](int row) {
+    const int32_t at = base + row * rowBytes;
+    return _mm512_loadu_si512(src + (at < last ? at : last));
+  };
+  const __m512i low = _mm512_permutex2var_epi8(window(0), bytes, window(1));
+  const __m512i high = _mm512_permutex2var_epi8(window(2), bytes, window(3));
+  return _mm512_mask_blend_epi8(upper, low, high);
+}
+#endif  // HWY_TARGET == HWY_AVX3_DL
+
+void FringeBlocksRow(const LensBlock* blocks, size_t count, const int32_t* spill, int32_t rowBytes,
+                     const uint8_t* src, int32_t srcSize, uint8_t* dst) {
+  const DI di;
+  const size_t lanes = hn::Lanes(di);
+  const hn::Rebind<uint8_t, DI> d8;
+  const int32_t* words = reinterpret_cast<const int32_t*>(src);
+  const VI row = hn::Set(di, rowBytes);
+  const VI low6 = hn::Set(di, 63);
+#if HWY_TARGET == HWY_AVX3_DL
+  HWY_ALIGN uint8_t order[64];
+  for (int i = 0; i < 64; ++i) {
+    const int plane[4] = {0, 1, 2, 1};
+    order[i] = static_cast<uint8_t>(16 * plane[i & 3] + (i >> 2));
+  }
+  const __m512i spread = _mm512_load_si512(order);
+  const int32_t last = srcSize - 64;
+#else
+  static_cast<void>(srcSize);
+#endif
+  // Sources follow curves the hardware prefetcher does not foresee: ask for a block's first
+  // window a few blocks ahead.
+  const size_t ahead = 4;
+  const size_t total = (count + 15) / 16;
+  for (size_t b = 0; b < total; ++b, dst += 64) {
+    const LensBlock& block = blocks[b];
+    if (b + ahead < total) __builtin_prefetch(src + blocks[b + ahead].base[1]);
+    if (block.spill >= 0) {
+      const int32_t* offsets = spill + 48 * size_t(block.spill);
+      const size_t n = count - 16 * b < 16 ? count - 16 * b : 16;
+      FringeOffsetsRow(offsets, offsets + 16, offsets + 32, n, src, dst);
+      continue;
+    }
+#if HWY_TARGET == HWY_AVX3_DL
+    const __m512i bytes = BlockBytes(block, spread);
+    const __mmask64 upper = _mm512_movepi8_mask(bytes);
+    const __m512i blue = PlaneBytes(src, block.base[0], rowBytes, last, bytes, upper);
+    const __m512i green = PlaneBytes(src, block.base[1], rowBytes, last, bytes, upper);
+    const __m512i red = PlaneBytes(src, block.base[2], rowBytes, last, bytes, upper);
+    const __m512i blueGreen = _mm512_mask_blend_epi8(0xaaaaaaaaaaaaaaaaull, blue, green);
+    _mm512_storeu_si512(dst, _mm512_mask_blend_epi8(0x4444444444444444ull, blueGreen, red));
+#else
+    for (size_t l = 0; l < 16; l += lanes) {
+      VI v[3];
+      for (int p = 0; p < 3; ++p) {
+        const VI index = hn::PromoteTo(di, hn::LoadU(d8, block.index[p] + l));
+        const VI offset = hn::Add(hn::Add(hn::Set(di, block.base[p]), hn::And(index, low6)),
+                                  hn::Mul(hn::ShiftRight<6>(index), row));
+        v[p] = hn::GatherOffset(di, words, offset);
+      }
+      hn::StoreU(MergeChannels(v[0], v[1], v[2]), di, reinterpret_cast<int32_t*>(dst + 4 * l));
+    }
+#endif
+  }
+}
+
+// Coding one plane of a block: sources on rows y0..y0 + 3 and bytes x0..x0 + 60 of them, taken
+// straight from the distortion map's (x, y), which give the offset y * rowBytes + x; every
+// window must lie inside the frame.
+bool ComposePlane(const LensPoint* points, const int32_t* distort, int32_t width, int32_t size,
+                  uint8_t index[16], int32_t* base) {
+  const DI di;
+  const size_t lanes = hn::Lanes(di);
+  const hn::Rebind<uint8_t, DI> d8;
+  const int32_t rowBytes = width * 4;
+  const VI vwidth = hn::Set(di, width);
+  const VI row = hn::Set(di, rowBytes);
+  const VI last = hn::Set(di, size - 4);
+  HWY_ALIGN int32_t xs[16], ys[16];
+  VI lowX = hn::Set(di, hwy::LimitsMax<int32_t>());
+  VI lowY = lowX;
+  VI highX = hn::Set(di, hwy::LimitsMin<int32_t>());
+  VI highY = highX;
+  VI outside = hn::Zero(di);
+  for (size_t l = 0; l < 16; l += lanes) {
+    const VI point = LoadPoints(points + l);
+    const VI source =
+        hn::GatherIndex(di, distort, hn::Add(hn::Mul(PointY(point), vwidth), PointX(point)));
+    const VI x = PointX(source);
+    const VI y = PointY(source);
+    const VI pos = hn::Add(hn::Mul(y, row), x);
+    outside =
+        hn::Or(outside, hn::VecFromMask(di, hn::Or(hn::Lt(pos, hn::Zero(di)), hn::Lt(last, pos))));
+    lowX = hn::Min(lowX, x);
+    highX = hn::Max(highX, x);
+    lowY = hn::Min(lowY, y);
+    highY = hn::Max(highY, y);
+    hn::Store(x, di, xs + l);
+    hn::Store(y, di, ys + l);
+  }
+  const int32_t x0 = hn::GetLane(hn::MinOfLanes(di, lowX));
+  const int32_t y0 = hn::GetLane(hn::MinOfLanes(di, lowY));
+  const int32_t rows = hn::GetLane(hn::MaxOfLanes(di, highY)) - y0;
+  const int64_t start = int64_t{y0} * rowBytes + x0;
+  if (!hn::AllTrue(di, hn::Eq(outside, hn::Zero(di))) ||
+      hn::GetLane(hn::MaxOfLanes(di, highX)) - x0 > 60 || rows > 3 || start < 0 ||
+      start + int64_t{rows} * rowBytes + 64 > size) {
+    return false;
+  }
+  for (size_t l = 0; l < 16; l += lanes) {
+    const VI y = hn::ShiftLeft<6>(hn::Sub(hn::Load(di, ys + l), hn::Set(di, y0)));
+    const VI code = hn::Or(y, hn::Sub(hn::Load(di, xs + l), hn::Set(di, x0)));
+    hn::StoreU(hn::DemoteTo(d8, code), d8, index + l);
+  }
+  *base = static_cast<int32_t>(start);
+  return true;
+}
+
+void ComposeBlocksRow(const LensPoint* blue, const LensPoint* green, const LensPoint* red,
+                      const LensPoint* distort, size_t count, int32_t width, LensBlock* blocks) {
+  const int32_t size = static_cast<int32_t>(count * 4);
+  const int32_t* map = reinterpret_cast<const int32_t*>(distort);
+  // As in FringeBlocksRow: the distortion entries the planes will read a few blocks ahead.
+  const size_t ahead = 16;
+  const LensPoint* planes[3] = {blue, green, red};
+  for (size_t b = 0; b < count / 16; ++b) {
+    LensBlock& block = blocks[b];
+    const size_t i = 16 * b;
+    if (i + 16 * ahead < count) {
+      for (const LensPoint* plane : planes) {
+        const LensPoint p = plane[i + 16 * ahead];
+        __builtin_prefetch(map + size_t(p.y) * size_t(width) + size_t(p.x));
+      }
+    }
+    const bool fits = ComposePlane(blue + i, map, width, size, block.index[0], &block.base[0]) &&
+                      ComposePlane(green + i, map, width, size, block.index[1], &block.base[1]) &&
+                      ComposePlane(red + i, map, width, size, block.index[2], &block.base[2]);
+    block.spill = fits ? -1 : -2;
+  }
+  if (count % 16 != 0) blocks[count / 16].spill = -2;
+}
+
 using DF = hn::RebindToFloat<DI>;
 using VF = hn::Vec<DF>;
 
@@ -234,8 +390,9 @@ void AssembleRow(const float* x, const float* y, bool above, int width, int cx, 
 
 const LensResampleRows* LensRowsOfThisTarget() {
   static const LensResampleRows rows = {
-      hwy::TargetName(HWY_TARGET), &DistortRow,        &FringeRow,
-      &FringeOffsetsRow,           &DistortOffsetsRow, &AssembleRow};
+      hwy::TargetName(HWY_TARGET), &DistortRow,      &FringeRow,
+      &FringeOffsetsRow,           &FringeBlocksRow, &ComposeBlocksRow,
+      &DistortOffsetsRow,          &AssembleRow};
   return &rows;
 }
 

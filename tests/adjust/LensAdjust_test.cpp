@@ -299,6 +299,69 @@ TEST(LensResampleRows, EverySetMatchesThePerPointForms) {
       std::memcpy(&actual, &out[i * 4], 4);
       ASSERT_EQ(actual, expected) << "pixel " << i;
     }
+    // Coded blocks: random windows of up to four rows, spilled blocks among them, and a partial
+    // last block, which is always spilled.
+    const size_t blockCount = (size_t(w) * h + 15) / 16;
+    std::vector<tfx::LensBlock> blocks(blockCount);
+    std::vector<int32_t> spill;
+    std::vector<uint32_t> expectedBlocks;
+    for (size_t b = 0; b < blockCount; ++b) {
+      tfx::LensBlock& block = blocks[b];
+      int32_t coded[3][16];
+      const bool spilled = b % 5 == 2 || b + 1 == blockCount;
+      for (int p = 0; p < 3; ++p) {
+        const int rowsUsed = uniform(0, 3);
+        block.base[p] = uniform(0, srcSize - 64 - rowsUsed * w * 4);
+        for (int l = 0; l < 16; ++l) {
+          const int row = uniform(0, rowsUsed), byte = uniform(0, 60);
+          block.index[p][l] = uint8_t(row << 6 | byte);
+          coded[p][l] = spilled ? uniform(0, srcSize - 4) : block.base[p] + row * w * 4 + byte;
+        }
+      }
+      block.spill = spilled ? int32_t(spill.size() / 48) : -1;
+      if (spilled) spill.insert(spill.end(), &coded[0][0], &coded[0][0] + 48);
+      for (int l = 0; l < 16; ++l) {
+        uint32_t b0, g0, r0;
+        std::memcpy(&b0, &src[size_t(coded[0][l])], 4);
+        std::memcpy(&g0, &src[size_t(coded[1][l])], 4);
+        std::memcpy(&r0, &src[size_t(coded[2][l])], 4);
+        expectedBlocks.push_back((b0 & 0xffu) | (g0 & 0xff00ff00u) | (r0 & 0xff0000u));
+      }
+    }
+    expectedBlocks.resize(size_t(w) * h);
+    std::vector<uint32_t> outBlocks(size_t(w) * h);
+    rows->fringeBlocks(blocks.data(), outBlocks.size(), spill.data(), w * 4, src.data(), srcSize,
+                       reinterpret_cast<uint8_t*>(outBlocks.data()));
+    EXPECT_EQ(outBlocks, expectedBlocks);
+
+    // Blocks composed from real maps: each coded one gives back the offsets of the two steps,
+    // its windows inside the frame; a distortion strong enough to need spills somewhere.
+    {
+      const auto distort = tfx::DistortMaps(150, w, h), fringe = tfx::FringingMaps(100, w, h);
+      std::vector<tfx::LensBlock> composed(blockCount);
+      rows->composeBlocks(fringe->plane[0].get(), fringe->plane[1].get(), fringe->plane[2].get(),
+                          distort->plane[0].get(), size_t(w) * h, w, composed.data());
+      size_t coded = 0;
+      for (size_t b = 0; b < blockCount; ++b) {
+        if (composed[b].spill == -2) continue;
+        ASSERT_EQ(composed[b].spill, -1);
+        ++coded;
+        for (int p = 0; p < 3; ++p) {
+          const int32_t base = composed[b].base[p];
+          for (int l = 0; l < 16; ++l) {
+            const tfx::LensPoint f = fringe->plane[p][b * 16 + size_t(l)];
+            const tfx::LensPoint d = distort->plane[0][size_t(f.y) * w + size_t(f.x)];
+            const int code = composed[b].index[p][l];
+            ASSERT_TRUE(base >= 0 && base + (code >> 6) * w * 4 + 64 <= srcSize);
+            ASSERT_EQ(base + (code >> 6) * w * 4 + (code & 63), d.y * w * 4 + d.x)
+                << "block " << b << " plane " << p << " lane " << l;
+          }
+        }
+      }
+      EXPECT_EQ(composed[blockCount - 1].spill, -2);
+      EXPECT_TRUE(coded > 0 && coded < blockCount - 1) << coded;
+    }
+
     rows->distortOffsets(basis[0].data(), basis[1].data(), basis[2].data(), basis[3].data(),
                          size_t(qw), scale, x.data(), y.data());
     for (const bool above : {false, true}) {
