@@ -225,56 +225,50 @@ void FringeBlocksRow(const LensBlock* blocks, size_t count, const int32_t* spill
   }
 }
 
-// Coding one plane of a block: sources on rows y0..y0 + 3 and bytes x0..x0 + 60 of them, taken
-// straight from the distortion map's (x, y), which give the offset y * rowBytes + x; every
-// window must lie inside the frame.
+// Coding one plane of a block from the distortion map's (x, y) at its points, which give the
+// offset y * rowBytes + x. The rows span the block's lowest to highest (a curve may turn within
+// a block); the bytes start two left of the leftmost of the first and last pixels', since
+// along a curve the pixels between seldom stray further. Windows inside the frame hold every
+// offset they code, so no source of a coded block leaves the frame.
 bool ComposePlane(const LensPoint* points, const int32_t* distort, int32_t width, int32_t size,
                   uint8_t index[16], int32_t* base) {
   const DI di;
+  const hn::RebindToUnsigned<DI> du;
   const size_t lanes = hn::Lanes(di);
   const hn::Rebind<uint8_t, DI> d8;
   const int32_t rowBytes = width * 4;
   const VI vwidth = hn::Set(di, width);
-  const VI row = hn::Set(di, rowBytes);
-  const VI last = hn::Set(di, size - 4);
-  HWY_ALIGN int32_t xs[16], ys[16];
-  VI lowX = hn::Set(di, hwy::LimitsMax<int32_t>());
-  VI lowY = lowX;
-  VI highX = hn::Set(di, hwy::LimitsMin<int32_t>());
-  VI highY = highX;
-  VI outside = hn::Zero(di);
+  HWY_ALIGN int32_t words[16];
+  VI lowY = hn::Set(di, hwy::LimitsMax<int32_t>());
+  VI highY = hn::Set(di, hwy::LimitsMin<int32_t>());
   for (size_t l = 0; l < 16; l += lanes) {
     const VI point = LoadPoints(points + l);
-    const VI source =
-        hn::GatherIndex(di, distort, hn::Add(hn::Mul(PointY(point), vwidth), PointX(point)));
-    const VI x = PointX(source);
-    const VI y = PointY(source);
-    const VI pos = hn::Add(hn::Mul(y, row), x);
-    outside =
-        hn::Or(outside, hn::VecFromMask(di, hn::Or(hn::Lt(pos, hn::Zero(di)), hn::Lt(last, pos))));
-    lowX = hn::Min(lowX, x);
-    highX = hn::Max(highX, x);
-    lowY = hn::Min(lowY, y);
-    highY = hn::Max(highY, y);
-    hn::Store(x, di, xs + l);
-    hn::Store(y, di, ys + l);
+    const VI j = hn::Add(hn::Mul(PointY(point), vwidth), PointX(point));
+    const VI word = hn::GatherIndex(di, distort, j);
+    lowY = hn::Min(lowY, PointY(word));
+    highY = hn::Max(highY, PointY(word));
+    hn::Store(word, di, words + l);
   }
-  const int32_t x0 = hn::GetLane(hn::MinOfLanes(di, lowX));
+  const auto x = [](int32_t word) { return int32_t{static_cast<int16_t>(word & 0xffff)}; };
+  const int32_t x0 = (x(words[0]) < x(words[15]) ? x(words[0]) : x(words[15])) - 2;
   const int32_t y0 = hn::GetLane(hn::MinOfLanes(di, lowY));
   const int32_t rows = hn::GetLane(hn::MaxOfLanes(di, highY)) - y0;
   const int64_t start = int64_t{y0} * rowBytes + x0;
-  if (!hn::AllTrue(di, hn::Eq(outside, hn::Zero(di))) ||
-      hn::GetLane(hn::MaxOfLanes(di, highX)) - x0 > 60 || rows > 3 || start < 0 ||
-      start + int64_t{rows} * rowBytes + 64 > size) {
-    return false;
-  }
+  if (rows > 3 || start < 0 || start + int64_t{rows} * rowBytes + 64 > size) return false;
+  const VI vx0 = hn::Set(di, x0);
+  const VI vy0 = hn::Set(di, y0);
+  auto stray = hn::Zero(du);
   for (size_t l = 0; l < 16; l += lanes) {
-    const VI y = hn::ShiftLeft<6>(hn::Sub(hn::Load(di, ys + l), hn::Set(di, y0)));
-    const VI code = hn::Or(y, hn::Sub(hn::Load(di, xs + l), hn::Set(di, x0)));
+    const VI word = hn::Load(di, words + l);
+    const VI dx = hn::Sub(PointX(word), vx0);
+    // Unsigned, so that bytes left of x0 count as far.
+    stray = hn::Or(stray, hn::VecFromMask(du, hn::Lt(hn::Set(du, 60), hn::BitCast(du, dx))));
+    const VI code =
+        hn::Or(hn::ShiftLeft<6>(hn::Sub(PointY(word), vy0)), hn::And(dx, hn::Set(di, 63)));
     hn::StoreU(hn::DemoteTo(d8, code), d8, index + l);
   }
   *base = static_cast<int32_t>(start);
-  return true;
+  return hn::AllTrue(du, hn::Eq(stray, hn::Zero(du)));
 }
 
 void ComposeBlocksRow(const LensPoint* blue, const LensPoint* green, const LensPoint* red,
