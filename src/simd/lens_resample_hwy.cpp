@@ -189,13 +189,16 @@ void FringeBlocksRow(const LensBlock* blocks, size_t count, const int32_t* spill
 #else
   static_cast<void>(srcSize);
 #endif
-  // Sources follow curves the hardware prefetcher does not foresee: ask for a block's first
-  // window a few blocks ahead.
-  const size_t ahead = 4;
+  // Sources follow curves the hardware prefetcher does not foresee: ask for each plane's first
+  // window a few blocks ahead, and for the blocks themselves a little further.
+  const size_t ahead = 8;
   const size_t total = (count + 15) / 16;
   for (size_t b = 0; b < total; ++b, dst += 64) {
     const LensBlock& block = blocks[b];
-    if (b + ahead < total) __builtin_prefetch(src + blocks[b + ahead].base[1]);
+    if (b + ahead < total) {
+      for (int p = 0; p < 3; ++p) __builtin_prefetch(src + blocks[b + ahead].base[p]);
+    }
+    if (b + 16 < total) __builtin_prefetch(blocks + b + 16);
     if (block.spill >= 0) {
       const int32_t* offsets = spill + 48 * size_t(block.spill);
       const size_t n = count - 16 * b < 16 ? count - 16 * b : 16;
