@@ -436,7 +436,7 @@ LensBlock* AllocateBlocks(size_t count) {
 
 }  // namespace
 
-void LensComposite::Free::operator()(LensBlock* blocks) const { std::free(blocks); }
+void LensComposite::Free::operator()(LensBlock* memory) const { std::free(memory); }
 
 bool ComposeLens(float d, float f, int width, int height, LensComposite* out) {
   *out = LensComposite();

@@ -94,7 +94,7 @@ struct LensComposite {
   int width = 0;
   int height = 0;
   struct Free {
-    void operator()(LensBlock* blocks) const;
+    void operator()(LensBlock* memory) const;
   };
   std::unique_ptr<LensBlock[], Free> blocks;  // one per sixteen pixels, rounded up
   std::vector<int32_t> spill;  // per spilled block: blue, green, red offsets, 16 each
