@@ -278,12 +278,16 @@ void ComposeBlocksRow(const LensPoint* blue, const LensPoint* green, const LensP
                       const LensPoint* distort, size_t count, int32_t width, LensBlock* blocks) {
   const int32_t size = static_cast<int32_t>(count * 4);
   const int32_t* map = reinterpret_cast<const int32_t*>(distort);
-  // As in FringeBlocksRow: the distortion entries the planes will read a few blocks ahead.
+  // As in FringeBlocksRow: the distortion entries the planes will read a few blocks ahead, and
+  // the points those requests read further ahead still, so that they do not wait.
   const size_t ahead = 16;
   const LensPoint* planes[3] = {blue, green, red};
   for (size_t b = 0; b < count / 16; ++b) {
     LensBlock& block = blocks[b];
     const size_t i = 16 * b;
+    if (i + 64 * ahead < count) {
+      for (const LensPoint* plane : planes) __builtin_prefetch(plane + i + 64 * ahead);
+    }
     if (i + 16 * ahead < count) {
       for (const LensPoint* plane : planes) {
         const LensPoint p = plane[i + 16 * ahead];
