@@ -421,15 +421,17 @@ bool PackedBgra(const CxImage& image, int width, int height) {
          image.GetSize() == size_t(width) * size_t(height) * 4;
 }
 
-// Whole huge pages where the system lends them: the composite is written once, all of it, and a
-// fault per 4 KiB page costs a good share of building it.
+// Large composites in whole huge pages where the system lends them: the composite is written
+// once, all of it, and a fault per 4 KiB page costs a good share of building it.
 LensBlock* AllocateBlocks(size_t count) {
   const size_t huge = size_t{2} << 20;
-  const size_t bytes = (count * sizeof(LensBlock) + huge - 1) / huge * huge;
+  const size_t bytes = count * sizeof(LensBlock);
+  const bool large = bytes >= huge;
+  const size_t rounded = large ? (bytes + huge - 1) / huge * huge : bytes;
   void* memory = nullptr;
-  if (posix_memalign(&memory, huge, bytes) != 0) return nullptr;
+  if (posix_memalign(&memory, large ? huge : alignof(LensBlock), rounded) != 0) return nullptr;
 #ifdef MADV_HUGEPAGE
-  madvise(memory, bytes, MADV_HUGEPAGE);
+  if (large) madvise(memory, rounded, MADV_HUGEPAGE);
 #endif
   return static_cast<LensBlock*>(memory);
 }
