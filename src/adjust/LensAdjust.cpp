@@ -471,7 +471,7 @@ bool ComposeLens(float d, float f, int width, int height, LensComposite* out) {
       const size_t i0 = b * 16;
       for (int p = 0; p < 3; ++p) {
         for (size_t l = 0; l < 16; ++l) {
-          // Past the last pixel, offset 0: read, never written.
+          // Lanes past the last pixel are padding, never resampled.
           int32_t offset = 0;
           if (i0 + l < count) {
             const LensPoint point = planes[p][i0 + l];
