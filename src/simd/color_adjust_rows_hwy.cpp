@@ -13,6 +13,7 @@
 
 #undef HWY_TARGET_INCLUDE
 #define HWY_TARGET_INCLUDE "simd/color_adjust_rows_hwy.cpp"
+#include <hwy/cache_control.h>
 #include <hwy/foreach_target.h>  // IWYU pragma: keep
 #include <hwy/highway.h>
 
@@ -510,6 +511,10 @@ HWY_INLINE void ForEachVector(D d, uint8_t* pixels, size_t count, const Kernel& 
 }
 
 // ForEachVector from `src` to `dst`.
+// How far ahead of the pixels it reads a row asks for its input: the hardware's own prefetch
+// stops at every 4 KiB page, and in a chain of effects the frames come from memory, not cache.
+constexpr size_t kPrefetchAhead = 4096;
+
 template <class D, class Kernel>
 HWY_INLINE void ForEachVectorInto(D d, uint8_t* dst, const uint8_t* src, size_t count,
                                   const Kernel& kernel) {
@@ -518,6 +523,9 @@ HWY_INLINE void ForEachVectorInto(D d, uint8_t* dst, const uint8_t* src, size_t 
   const size_t bytes = count * 4;
   size_t i = 0;
   for (; i + step <= bytes; i += step) {
+    // Only a hint, and past the row at its end: an integer, not a pointer beyond the array.
+    hwy::Prefetch(
+        reinterpret_cast<const uint8_t*>(reinterpret_cast<uintptr_t>(src) + i + kPrefetchAhead));
     hn::StoreU(kernel(hn::LoadU(d, reinterpret_cast<const T*>(src + i))), d,
                reinterpret_cast<T*>(dst + i));
   }

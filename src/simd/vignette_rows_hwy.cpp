@@ -8,6 +8,7 @@
 
 #undef HWY_TARGET_INCLUDE
 #define HWY_TARGET_INCLUDE "simd/vignette_rows_hwy.cpp"
+#include <hwy/cache_control.h>
 #include <hwy/foreach_target.h>  // IWYU pragma: keep
 #include <hwy/highway.h>
 
@@ -57,6 +58,10 @@ struct BlendVector {
   }
 };
 
+// How far ahead of the pixels it reads a run asks for its input: the hardware's own prefetch
+// stops at every 4 KiB page, and a chain of effects finds its frames in memory, not in cache.
+constexpr size_t kPrefetchAhead = 4096;
+
 template <bool kZeroWeight>
 void BlendRunOf(uint8_t* dst, const uint8_t* src, const float* mask, size_t count,
                 const VignetteBlend& blend) {
@@ -66,6 +71,9 @@ void BlendRunOf(uint8_t* dst, const uint8_t* src, const float* mask, size_t coun
   const size_t lanes = hn::Lanes(du);
   size_t i = 0;
   for (; i + lanes <= count; i += lanes) {
+    // Only a hint, and past the row at its end: an integer, not a pointer beyond the array.
+    hwy::Prefetch(reinterpret_cast<const uint8_t*>(reinterpret_cast<uintptr_t>(src) + 4 * i +
+                                                   kPrefetchAhead));
     const auto* from = reinterpret_cast<const uint32_t*>(src + 4 * i);
     hn::StoreU(kernel(hn::LoadU(du, from), hn::LoadU(df, mask + i)), du,
                reinterpret_cast<uint32_t*>(dst + 4 * i));
