@@ -67,20 +67,6 @@ namespace hn = hwy::HWY_NAMESPACE;
 
 #include "simd/pixel_lanes-inl.h"
 
-// trunc(v) for |v| < 2^22 as the bare conversion: ConvertTo adds an overflow fix-up these values
-// never need.
-HWY_INLINE VI TruncToInt(VF v) {
-#if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
-  return VI{_mm512_cvttps_epi32(v.raw)};
-#elif HWY_ARCH_X86 && HWY_TARGET == HWY_AVX2
-  return VI{_mm256_cvttps_epi32(v.raw)};
-#elif HWY_ARCH_X86 && (HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3)
-  return VI{_mm_cvttps_epi32(v.raw)};
-#else
-  return SmallToInt(v);
-#endif
-}
-
 #if HWY_ARCH_X86 && HWY_TARGET != HWY_SCALAR && HWY_TARGET != HWY_EMU128
 // Bytes of the highest, lowest and middle value and alpha of pixel i lie at 4 * role + i % 4 of
 // its 16-byte block. The two saturating packs clamp to 0..255 as the rounding must; a value in
@@ -89,9 +75,9 @@ constexpr uint32_t kStride = 4;
 constexpr uint32_t kLaneStep = 0x01010101u;
 HWY_INLINE VU PackValues(VF hi, VF lo, VF mid, VU px) {
   const hn::Repartition<int16_t, DU> d16;
-  const auto hiLo = hn::ReorderDemote2To(d16, TruncToInt(hi), TruncToInt(lo));
+  const auto hiLo = hn::ReorderDemote2To(d16, SmallToInt(hi), SmallToInt(lo));
   const auto midAlpha =
-      hn::ReorderDemote2To(d16, TruncToInt(mid), hn::BitCast(DI(), hn::ShiftRight<24>(px)));
+      hn::ReorderDemote2To(d16, SmallToInt(mid), hn::BitCast(DI(), hn::ShiftRight<24>(px)));
 #if HWY_TARGET <= HWY_AVX3
   return VU{_mm512_packus_epi16(hiLo.raw, midAlpha.raw)};
 #elif HWY_TARGET == HWY_AVX2
@@ -107,7 +93,7 @@ constexpr uint32_t kLaneStep = 0x04040404u;
 HWY_INLINE VU PackValues(VF hi, VF lo, VF mid, VU px) {
   const DF df;
   const auto byte = [&](VF v) {
-    return hn::BitCast(DU(), TruncToInt(hn::Min(hn::Max(v, hn::Zero(df)), hn::Set(df, 255.0f))));
+    return hn::BitCast(DU(), SmallToInt(hn::Min(hn::Max(v, hn::Zero(df)), hn::Set(df, 255.0f))));
   };
   return hn::Or(hn::Or(byte(hi), hn::ShiftLeft<8>(byte(lo))),
                 hn::Or(hn::ShiftLeft<16>(byte(mid)), hn::And(px, hn::Set(DU(), 0xff000000u))));
@@ -166,7 +152,7 @@ HWY_INLINE VU AdjustPixels(VU px, const float* table, const LanePicks& sextantPi
   const VF cf = hn::ConvertTo(df, c);
   const VF pf = hn::ConvertTo(df, p);
   const VF divisor = hn::Max(cf, one);
-  const VI j = TruncToInt(hn::Div(hn::Mul(pf, hn::Set(df, 256.0f)), divisor));
+  const VI j = SmallToInt(hn::Div(hn::Mul(pf, hn::Set(df, 256.0f)), divisor));
   const VI index = hn::ShiftLeft<2>(j);
   const VF shift = hn::GatherIndex(df, table, index);
   const VF k = hn::GatherIndex(df, table + 1, index);
