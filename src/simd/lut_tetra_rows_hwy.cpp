@@ -36,12 +36,8 @@ namespace HWY_NAMESPACE {
 
 namespace hn = hwy::HWY_NAMESPACE;
 
-using DU = hn::ScalableTag<uint32_t>;
-using DI = hn::RebindToSigned<DU>;
-using DF = hn::RebindToFloat<DU>;
-using VU = hn::Vec<DU>;
-using VI = hn::Vec<DI>;
-using VF = hn::Vec<DF>;
+#include "simd/pixel_lanes-inl.h"
+
 using MF = hn::Mask<DF>;
 
 // Pixels per block: a multiple of every lane count, and small enough that the block's weights

@@ -19,7 +19,8 @@ def tool(*args):
     return run.stdout
 
 
-def picture(h=48, w=64, seed=5):
+# Noise with the parts the filters treat apart: transparent rows and a green patch to key.
+def noisy_frame(h=48, w=64, seed=5):
     rng = np.random.default_rng(seed)
     img = rng.integers(0, 256, (h, w, 4), dtype=np.uint8)
     img[: h // 4, :, 3] = 0  # transparent rows for the keyers and lutAToWhiteEffect
@@ -30,7 +31,7 @@ def picture(h=48, w=64, seed=5):
 @pytest.fixture(scope="module")
 def files(tmp_path_factory):
     d = tmp_path_factory.mktemp("frames")
-    img, bg = picture(), picture(seed=9)
+    img, bg = noisy_frame(), noisy_frame(seed=9)
     tfx.write_image(d / "in.png", img)
     tfx.write_image(d / "bg.png", bg)
     tfx.bake_lut([("ColorAdjust", {"u_contrast": 40})], size=17).write(d / "look.cube")
