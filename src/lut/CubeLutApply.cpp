@@ -146,6 +146,8 @@ void TetraPlan::Prepare(const TetraTable& table) {
     capacity_ = floats;
   }
   float* out = points_.get();
+  finite_ = true;
+  for (int v = 0; v < 256; ++v) finite_ = finite_ && std::isfinite(ft_[v]);
   for (int i = 0; i < n; ++i) {
     for (int j = 0; j < n; ++j) {
       for (int k = 0; k < n; ++k) {
@@ -159,6 +161,7 @@ void TetraPlan::Prepare(const TetraTable& table) {
       }
     }
   }
+  for (const float* p = points_.get(); p < out && finite_; ++p) finite_ = std::isfinite(*p);
 }
 
 void TetraRow(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width,

@@ -78,6 +78,8 @@ class TetraPlan {
   // reads such a table the way doLUT always has.
   bool Packed() const { return packed_; }
   bool Grey() const { return grey_; }
+  // Whether every packed point and every fraction is finite.
+  bool Finite() const { return finite_; }
   const float* Points() const { return points_.get(); }
   const float* Fractions() const { return ft_; }
   // Where each byte lies along an axis, in lattice points: its lower index plus its fraction, when
@@ -105,6 +107,7 @@ class TetraPlan {
   bool usable_ = false;
   bool packed_ = false;
   bool grey_ = false;
+  bool finite_ = false;
   size_t capacity_ = 0;  // floats
   struct Free {
     void operator()(float* p) const;

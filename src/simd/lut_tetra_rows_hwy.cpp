@@ -133,6 +133,7 @@ struct Kernel {
   const float* ft;
   const float* position;  // or null
   float divisor;          // or 0
+  bool finite;            // every point and fraction
   const int32_t* lower[3];
   int32_t stride[3];
   int32_t last[3];
@@ -187,6 +188,36 @@ struct Kernel {
       p000 = hn::Add(hn::Add(ro, go), bo);
     }
 
+    const VF one = hn::Set(df, 1.0f);
+    const VI p111 = hn::Add(hn::Add(hn::Add(p000, red.step), green.step), blue.step);
+    if (finite) {
+      // Whichever of tied fractions the reference takes first, the fractions come out in
+      // decreasing order, and a corner it would pass instead of the one here has weight 0, which
+      // times a finite point adds nothing. So the sorted fractions, the axis of the largest and
+      // that of the smallest give its bytes, at half the operations of its comparison chain.
+      const VF low = hn::Min(red.fraction, green.fraction);
+      const VF high = hn::Max(red.fraction, green.fraction);
+      const VF first = hn::Max(high, blue.fraction);
+      const VF second = hn::Max(low, hn::Min(high, blue.fraction));
+      const VF third = hn::Min(low, blue.fraction);
+      // Red wins ties for the largest and blue for the smallest, so the two axes always differ.
+      const VI largest = hn::IfThenElse(
+          hn::RebindMask(di, hn::Eq(red.fraction, first)), red.step,
+          hn::IfThenElse(hn::RebindMask(di, hn::Eq(green.fraction, first)), green.step, blue.step));
+      const VI smallest = hn::IfThenElse(
+          hn::RebindMask(di, hn::Eq(blue.fraction, third)), blue.step,
+          hn::IfThenElse(hn::RebindMask(di, hn::Eq(green.fraction, third)), green.step, red.step));
+      hn::Store(hn::Sub(one, first), df, prepared.weight[0] + at);
+      hn::Store(hn::Sub(first, second), df, prepared.weight[1] + at);
+      hn::Store(hn::Sub(second, third), df, prepared.weight[2] + at);
+      hn::Store(third, df, prepared.weight[3] + at);
+      hn::Store(p000, di, prepared.corner[0] + at);
+      hn::Store(hn::Add(p000, largest), di, prepared.corner[1] + at);
+      hn::Store(hn::Sub(p111, smallest), di, prepared.corner[2] + at);
+      hn::Store(p111, di, prepared.corner[3] + at);
+      return;
+    }
+
     // The reference's comparison chain, as masks.
     const MF rg = hn::Gt(red.fraction, green.fraction);
     const MF gb = hn::Gt(green.fraction, blue.fraction);
@@ -201,7 +232,7 @@ struct Kernel {
     const VF third = hn::IfThenElse(rg, hn::IfThenElse(gb, blue.fraction, green.fraction),
                                     hn::IfThenElse(hn::Or(bg, br), red.fraction, blue.fraction));
 
-    hn::Store(hn::Sub(hn::Set(df, 1.0f), first.fraction), df, prepared.weight[0] + at);
+    hn::Store(hn::Sub(one, first.fraction), df, prepared.weight[0] + at);
     hn::Store(hn::Sub(first.fraction, second.fraction), df, prepared.weight[1] + at);
     hn::Store(hn::Sub(second.fraction, third), df, prepared.weight[2] + at);
     hn::Store(third, df, prepared.weight[3] + at);
@@ -210,8 +241,7 @@ struct Kernel {
     hn::Store(p000, di, prepared.corner[0] + at);
     hn::Store(pa, di, prepared.corner[1] + at);
     hn::Store(hn::Add(pa, second.step), di, prepared.corner[2] + at);
-    hn::Store(hn::Add(hn::Add(hn::Add(p000, red.step), green.step), blue.step), di,
-              prepared.corner[3] + at);
+    hn::Store(p111, di, prepared.corner[3] + at);
   }
 };
 
@@ -292,8 +322,11 @@ HWY_INLINE VU Finish(const Kernel& kernel, VU p, const Prepared& prepared, size_
     const VF g = Blend(w, c[0].green, c[1].green, c[2].green, c[3].green);
     const VF b = Blend(w, c[0].blue, c[1].blue, c[2].blue, c[3].blue);
     VU r8, g8, b8;
-    // Lattices stay within 0..255 in practice; the general conversion is for the others.
-    if (hn::AllTrue(df, hn::And(Plain(r), hn::And(Plain(g), Plain(b))))) {
+    // Lattices stay within 0..255 in practice; the general conversion is for the others. Values
+    // from 0.5 up (NaN fails the comparison) pass Plain at half the comparisons.
+    const VF half = hn::Set(df, 0.5f);
+    if (hn::AllTrue(df, hn::And(hn::Ge(r, half), hn::And(hn::Ge(g, half), hn::Ge(b, half)))) ||
+        hn::AllTrue(df, hn::And(Plain(r), hn::And(Plain(g), Plain(b))))) {
       r8 = PlainBytes(r), g8 = PlainBytes(g), b8 = PlainBytes(b);
     } else {
       r8 = ComponentBytes(r), g8 = ComponentBytes(g), b8 = ComponentBytes(b);
@@ -395,6 +428,7 @@ Kernel MakeKernel(const TetraPlan& plan) {
           plan.Fractions(),
           plan.Positions(),
           plan.Divisor(),
+          plan.Finite(),
           {plan.Lower(0), plan.Lower(1), plan.Lower(2)},
           {plan.Stride(0), plan.Stride(1), plan.Stride(2)},
           {plan.Last(0), plan.Last(1), plan.Last(2)},
