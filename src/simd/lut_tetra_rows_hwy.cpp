@@ -459,21 +459,26 @@ struct Slabs {
   uint32_t* pixels[kSlabs];
   size_t count[kSlabs];
 
-  HWY_INLINE VU Of(VU p) const {
+  // Which lanes of `p` fall in each slab: those whose red byte reaches the slab's start and not
+  // the next one's.
+  HWY_INLINE void Masks(VU p, MU in[kSlabs]) const {
     const DI di;
     const VI r = hn::And(hn::BitCast(di, hn::ShiftRight<16>(p)), hn::Set(di, 255));
-    VI slab = hn::Zero(di);
+    MU reaches[kSlabs];
     for (int k = 1; k < kSlabs; ++k) {
-      slab = hn::Sub(slab, hn::VecFromMask(di, hn::Gt(r, hn::Set(di, start[k] - 1))));
+      reaches[k] = hn::RebindMask(DU(), hn::Gt(r, hn::Set(di, start[k] - 1)));
     }
-    return hn::BitCast(DU(), slab);
+    in[0] = hn::Not(reaches[1]);
+    for (int k = 1; k + 1 < kSlabs; ++k) in[k] = hn::AndNot(reaches[k + 1], reaches[k]);
+    in[kSlabs - 1] = reaches[kSlabs - 1];
   }
 
   HWY_INLINE void Sort(VU p) {
     const DU du;
-    const VU slab = Of(p);
+    MU in[kSlabs];
+    Masks(p, in);
     for (int k = 0; k < kSlabs; ++k) {
-      const MU m = hn::Eq(slab, hn::Set(du, k));
+      const MU m = in[k];
 #if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
       // The register form and a whole store: the memory form is several times slower on Intel
       // cores, and every slab has a vector to spare past its end.
@@ -488,12 +493,12 @@ struct Slabs {
   // The next lanes of every slab, each to where its pixel came from.
   HWY_INLINE VU Gather(VU p) {
     const DU du;
-    const VU slab = Of(p);
+    MU in[kSlabs];
+    Masks(p, in);
     VU result = hn::Zero(du);
     for (int k = 0; k < kSlabs; ++k) {
-      const MU m = hn::Eq(slab, hn::Set(du, k));
-      result = hn::Or(result, ExpandLoad(m, pixels[k] + count[k]));
-      count[k] += hn::CountTrue(du, m);
+      result = hn::Or(result, ExpandLoad(in[k], pixels[k] + count[k]));
+      count[k] += hn::CountTrue(du, in[k]);
     }
     return result;
   }
