@@ -19,6 +19,9 @@ struct VignetteKernel {
                    const VignetteBlend& blend);
 };
 
+// The kernel Highway's dispatch picks at the time of the call (hwy::SetSupportedTargetsForTest
+// included).
+const VignetteKernel& BestVignetteKernel();
 // The kernels this machine runs, best first.
 const std::vector<const VignetteKernel*>& SupportedVignetteKernels();
 
@@ -39,7 +42,7 @@ struct VignetteBlend {
 };
 
 VignetteBlend MakeVignetteBlend(float a, float e, float b,
-                                const VignetteKernel& kernel = *SupportedVignetteKernels().front());
+                                const VignetteKernel& kernel = BestVignetteKernel());
 
 // Blends `count` BGRA pixels with their mask weights (in [0, 1], as the gradient makes them); the
 // same bytes as vignettePixel.

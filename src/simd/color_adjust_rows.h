@@ -50,7 +50,8 @@ struct ColorAdjustRows {
 
 inline constexpr size_t kBrightestTableBytes = 256 * 256 + 3;
 
-// The set Highway's dispatch picks for this CPU, chosen on the first call.
+// The set Highway's dispatch picks at the time of the call (hwy::SetSupportedTargetsForTest
+// included).
 const ColorAdjustRows& BestColorAdjustRows();
 // One set per instruction set both compiled in and run by this CPU, best first.
 std::vector<const ColorAdjustRows*> SupportedColorAdjustRows();

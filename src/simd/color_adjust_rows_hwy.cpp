@@ -686,10 +686,7 @@ namespace tfx {
 
 HWY_EXPORT(RowsOfThisTarget);
 
-const ColorAdjustRows& BestColorAdjustRows() {
-  static const ColorAdjustRows* const best = HWY_DYNAMIC_DISPATCH(RowsOfThisTarget)();
-  return *best;
-}
+const ColorAdjustRows& BestColorAdjustRows() { return *HWY_DYNAMIC_DISPATCH(RowsOfThisTarget)(); }
 
 std::vector<const ColorAdjustRows*> SupportedColorAdjustRows() {
   return EverySupportedSet(HWY_DISPATCH_TABLE(RowsOfThisTarget));

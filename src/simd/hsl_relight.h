@@ -34,7 +34,8 @@ struct HslHueChoice {
 };
 const HslHueChoice& HslHueChoices();
 
-// The set Highway's dispatch picks for this CPU, chosen on the first call.
+// The set Highway's dispatch picks at the time of the call (hwy::SetSupportedTargetsForTest
+// included).
 const HslRelightRows& BestHslRelightRows();
 // One set per instruction set both compiled in and run by this CPU, best first.
 std::vector<const HslRelightRows*> SupportedHslRelightRows();

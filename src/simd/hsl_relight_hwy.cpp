@@ -210,8 +210,7 @@ const HslHueChoice& HslHueChoices() {
 }
 
 const HslRelightRows& BestHslRelightRows() {
-  static const HslRelightRows* const best = HWY_DYNAMIC_DISPATCH(RelightRowsOfThisTarget)();
-  return *best;
+  return *HWY_DYNAMIC_DISPATCH(RelightRowsOfThisTarget)();
 }
 
 std::vector<const HslRelightRows*> SupportedHslRelightRows() {

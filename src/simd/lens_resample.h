@@ -53,7 +53,8 @@ struct LensResampleRows {
                       float fcy, LensPoint* out);
 };
 
-// The set Highway's dispatch picks for this CPU, chosen on the first call.
+// The set Highway's dispatch picks at the time of the call (hwy::SetSupportedTargetsForTest
+// included).
 const LensResampleRows& BestLensResampleRows();
 // One set per instruction set both compiled in and run by this CPU, best first.
 std::vector<const LensResampleRows*> SupportedLensResampleRows();

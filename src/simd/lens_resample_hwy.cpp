@@ -410,8 +410,7 @@ namespace tfx {
 HWY_EXPORT(LensRowsOfThisTarget);
 
 const LensResampleRows& BestLensResampleRows() {
-  static const LensResampleRows* const best = HWY_DYNAMIC_DISPATCH(LensRowsOfThisTarget)();
-  return *best;
+  return *HWY_DYNAMIC_DISPATCH(LensRowsOfThisTarget)();
 }
 
 std::vector<const LensResampleRows*> SupportedLensResampleRows() {

@@ -114,6 +114,8 @@ namespace tfx {
 
 HWY_EXPORT(KernelOfThisTarget);
 
+const VignetteKernel& BestVignetteKernel() { return *HWY_DYNAMIC_DISPATCH(KernelOfThisTarget)(); }
+
 const std::vector<const VignetteKernel*>& SupportedVignetteKernels() {
   static const std::vector<const VignetteKernel*> kernels =
       EverySupportedSet(HWY_DISPATCH_TABLE(KernelOfThisTarget));
