@@ -197,11 +197,11 @@ void TetraImage(const TetraPlan& plan, const uint8_t* in, int inPitch, uint8_t* 
     // slab, which is then a few bytes a pixel, and its sorted pixels stream through in order.
     // The storage is left uninitialised, so that only the part the pixels fill is ever touched.
     const int bandRows = std::max(1, (1 << 20) / width);
-    const size_t capacity = TetraBandCapacity(width, bandRows);
+    const size_t needed = TetraBandScratch(width, bandRows);
     thread_local std::unique_ptr<uint32_t[]> scratch;
     thread_local size_t scratchSize = 0;
-    if (scratchSize < capacity * TetraPlan::kMaxSlabs) {
-      scratchSize = capacity * TetraPlan::kMaxSlabs;
+    if (scratchSize < needed) {
+      scratchSize = needed;
       scratch.reset(new uint32_t[scratchSize]);
     }
     for (int y = 0; y < height; y += bandRows) {
@@ -211,7 +211,7 @@ void TetraImage(const TetraPlan& plan, const uint8_t* in, int inPitch, uint8_t* 
       if (Coherent(plan.Table(), from, inPitch, width, rows)) {
         for (int r = 0; r < rows; ++r) TetraRow(plan, from + r * inPitch, to + r * pitch, width, 4);
       } else {
-        TetraBandVector(plan, from, inPitch, to, pitch, width, rows, scratch.get(), capacity);
+        TetraBandVector(plan, from, inPitch, to, pitch, width, rows, scratch.get());
       }
     }
     return;

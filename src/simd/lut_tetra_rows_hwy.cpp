@@ -458,6 +458,10 @@ struct Slabs {
   int32_t start[kSlabs];
   uint32_t* pixels[kSlabs];
   size_t count[kSlabs];
+  // Each vector's lanes of every slab, as the sort met them, so that putting the results back
+  // reads neither the input nor the red bytes again.
+  uint8_t* bits;
+  static constexpr size_t kMaskBytes = (HWY_MAX_BYTES / sizeof(uint32_t) + 7) / 8;
 
   // Which lanes of `p` fall in each slab: those whose red byte reaches the slab's start and not
   // the next one's.
@@ -479,6 +483,8 @@ struct Slabs {
     Masks(p, in);
     for (int k = 0; k < kSlabs; ++k) {
       const MU m = in[k];
+      hn::StoreMaskBits(du, m, bits);
+      bits += kMaskBytes;
 #if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
       // The register form and a whole store: the memory form is several times slower on Intel
       // cores, and every slab has a vector to spare past its end.
@@ -491,14 +497,14 @@ struct Slabs {
   }
 
   // The next lanes of every slab, each to where its pixel came from.
-  HWY_INLINE VU Gather(VU p) {
+  HWY_INLINE VU Gather() {
     const DU du;
-    MU in[kSlabs];
-    Masks(p, in);
     VU result = hn::Zero(du);
     for (int k = 0; k < kSlabs; ++k) {
-      result = hn::Or(result, ExpandLoad(in[k], pixels[k] + count[k]));
-      count[k] += hn::CountTrue(du, in[k]);
+      const MU m = hn::LoadMaskBits(du, bits);
+      bits += kMaskBytes;
+      result = hn::Or(result, ExpandLoad(m, pixels[k] + count[k]));
+      count[k] += hn::CountTrue(du, m);
     }
     return result;
   }
@@ -530,7 +536,7 @@ HWY_INLINE void EveryVector(const uint8_t* in, ptrdiff_t inPitch, uint8_t* out, 
     const uint32_t* from = reinterpret_cast<const uint32_t*>(in + y * inPitch);
     uint32_t* to = out ? reinterpret_cast<uint32_t*>(out + y * pitch) : nullptr;
     for (size_t x = 0; x < whole; x += lanes) {
-      PrefetchAhead(from + x);
+      PrefetchAhead(to ? to + x : from + x);
       visit(from + x, to ? to + x : nullptr);
     }
     if (whole < width) {
@@ -543,12 +549,13 @@ HWY_INLINE void EveryVector(const uint8_t* in, ptrdiff_t inPitch, uint8_t* out, 
 }
 
 void TetraBandOfTarget(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
-                       ptrdiff_t pitch, int width, int rows, uint32_t* scratch, size_t capacity) {
+                       ptrdiff_t pitch, int width, int rows, uint32_t* scratch) {
   if (width <= 0 || rows <= 0) return;
   const DU du;
   const Kernel kernel = MakeKernel(plan);
 #if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
   constexpr bool kSort = true;
+  static_assert(HWY_MAX_BYTES == kSortBytes, "the band's sizes assume these vectors");
 #else
   constexpr bool kSort = false;
 #endif
@@ -561,12 +568,15 @@ void TetraBandOfTarget(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPit
     }
     return;
   }
+  const size_t capacity = TetraBandCapacity(width, rows);
   Slabs slabs;
   for (int k = 0; k < kSlabs; ++k) {
     slabs.start[k] = plan.SlabStart(k);
     slabs.pixels[k] = scratch + k * capacity;
     slabs.count[k] = 0;
   }
+  uint8_t* const bits = reinterpret_cast<uint8_t*>(scratch + kSlabs * capacity);
+  slabs.bits = bits;
   const size_t w = static_cast<size_t>(width);
   EveryVector(in, inPitch, nullptr, 0, w, rows,
               [&](const uint32_t* from, uint32_t*) { slabs.Sort(hn::LoadU(du, from)); });
@@ -575,10 +585,9 @@ void TetraBandOfTarget(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPit
     Rows4<false>(kernel, pixels, pixels, slabs.count[k]);
     slabs.count[k] = 0;
   }
-  // In place, each vector of pixels is read before its results are stored over it.
-  EveryVector(in, inPitch, out, pitch, w, rows, [&](const uint32_t* from, uint32_t* to) {
-    hn::StoreU(slabs.Gather(hn::LoadU(du, from)), du, to);
-  });
+  slabs.bits = bits;
+  EveryVector(in, inPitch, out, pitch, w, rows,
+              [&](const uint32_t*, uint32_t* to) { hn::StoreU(slabs.Gather(), du, to); });
 }
 
 const char* TargetOfThisTarget() { return hwy::TargetName(HWY_TARGET); }
@@ -594,17 +603,27 @@ HWY_EXPORT(TetraRowOfTarget);
 HWY_EXPORT(TetraBandOfTarget);
 HWY_EXPORT(TargetOfThisTarget);
 
+// Here, after every target, HWY_MAX_BYTES is the last target's (the scalar one's 8 bytes), so
+// sizes that must hold any target's vectors take the widest, which only sort into slabs.
+constexpr size_t kSortLanes = kSortBytes / sizeof(uint32_t);
+
 size_t TetraBandCapacity(int width, int rows) {
-  // Whole vectors of every row, and one more that CompressStore may write past the last.
-  constexpr size_t kLanes = HWY_MAX_BYTES / sizeof(uint32_t);
-  const size_t padded = (static_cast<size_t>(width) + kLanes - 1) / kLanes * kLanes;
-  return padded * static_cast<size_t>(rows) + kLanes;
+  // Whole vectors of every row, and one more that the compressing store may write past the last.
+  const size_t padded = (static_cast<size_t>(width) + kSortLanes - 1) / kSortLanes * kSortLanes;
+  return padded * static_cast<size_t>(rows) + kSortLanes;
+}
+
+size_t TetraBandScratch(int width, int rows) {
+  // The slabs, then every vector's mask of each slab's lanes, in bytes rounded up to elements.
+  const size_t vectors =
+      (static_cast<size_t>(width) + kSortLanes - 1) / kSortLanes * static_cast<size_t>(rows);
+  const size_t maskBytes = vectors * TetraPlan::kMaxSlabs * ((kSortLanes + 7) / 8);
+  return TetraPlan::kMaxSlabs * TetraBandCapacity(width, rows) + (maskBytes + 3) / 4;
 }
 
 void TetraBandVector(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
-                     ptrdiff_t pitch, int width, int rows, uint32_t* scratch, size_t capacity) {
-  HWY_DYNAMIC_DISPATCH(TetraBandOfTarget)
-  (plan, in, inPitch, out, pitch, width, rows, scratch, capacity);
+                     ptrdiff_t pitch, int width, int rows, uint32_t* scratch) {
+  HWY_DYNAMIC_DISPATCH(TetraBandOfTarget)(plan, in, inPitch, out, pitch, width, rows, scratch);
 }
 
 void TetraRowVector(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width,
