@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "simd/hsl_relight.h"
+#include "support/EffectHarness.h"
 #include "support/ImageBuilders.h"
 
 namespace {
@@ -216,16 +217,6 @@ TEST(WhiteBalance, TemperatureKernelsOfEverySetMatchThePerPixelForm) {
   }
 }
 
-// The kernels keep one ramp value per pixel.
-TEST(WhiteBalance, NoHueByteRampsTwoChannels) {
-  const tfx::HslHueChoice& hue = tfx::HslHueChoices();
-  for (int h = 0; h < 256; ++h) {
-    int ramps = 0;
-    for (int c = 0; c < 3; ++c) ramps += (hue.code[h] >> (2 * c) & 3) == 2;
-    EXPECT_LE(ramps, 1) << "hue " << h;
-  }
-}
-
 TEST(WhiteBalance, OtherLayoutsAndPaddedRowsMatchThePerPixelForm) {
   const struct {
     unsigned bpp, effWidth;
@@ -358,6 +349,38 @@ TEST(AdjustWhiteBalance, ScalesByTheTemperatureAndTintFactors) {
   EXPECT_TRUE(balance.Process(empty, grey, ColorGain{1, 1, 1}, 1.0f, 1.0f));
   EXPECT_TRUE(balance.Process(grey, grey, ColorGain{1, 1, 1}, 1.0f, 1.0f));
   EXPECT_EQ(grey.at<uint8_t>(1, 1), 9);
+}
+
+// The effect's balance per byte: factor in double, then float; product in float, truncated and
+// limited. Every colour through Running, at both signs, the range ends and far outside them
+// (negative and above-2 factors).
+TEST(WhiteBalanceAdjustEffect, EveryColourMatchesTheFactors) {
+  const CxImage& all = EveryColour();
+  const int height = static_cast<int>(all.GetHeight());
+  const tfx_test::Bytes in(all.GetBits(), all.GetBits() + all.GetSize());
+  NLEComPtr<INLECGFilter> filter = tfx_test::CreateEffect(
+      tfx_test::kWhiteBalance, tfx_test::Settings({{L"u_temperature", 0}, {L"u_tint", 0}}));
+  const double settings[][2] = {{100, 0}, {-100, 37}, {0, -100}, {-33.3, 71.1}, {-900, 650}};
+  for (const auto& s : settings) {
+    SCOPED_TRACE(testing::Message() << "temperature " << s[0] << " tint " << s[1]);
+    tfx_test::SetParam(filter.get(), L"u_temperature", s[0]);
+    tfx_test::SetParam(filter.get(), L"u_tint", s[1]);
+    const tfx_test::Bytes out = tfx_test::RunFrame(filter.get(), new TestFrame(4096, height, in),
+                                                   new TestFrame(4096, height));
+    const float a = static_cast<float>(s[0] / 200.0), b = static_cast<float>(s[1] / 200.0);
+    const double factors[3] = {1 + 0.5 * b - a, 1 - b, 1 + 0.5 * b + a};
+    uint8_t table[4][256];
+    for (int v = 0; v < 256; ++v) {
+      for (int c = 0; c < 3; ++c) {
+        const float p = static_cast<float>(factors[c]) * static_cast<float>(v);
+        table[c][v] = static_cast<uint8_t>(!(p > 0) ? 0 : p >= 255 ? 255 : int(p));
+      }
+      table[3][v] = static_cast<uint8_t>(v);
+    }
+    for (size_t i = 0; i < in.size(); ++i) {
+      if (out[i] != table[i % 4][in[i]]) FAIL() << "pixel " << i / 4 << " byte " << i % 4;
+    }
+  }
 }
 
 }  // namespace

@@ -1,19 +1,34 @@
+// The plug-in's entry points and every effect as a host creates and runs it.
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <cwchar>
+#include <functional>
+#include <opencv2/core.hpp>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include "plugin/NLEBasicCrossFilter.h"
 #include "plugin/NLEDynamicEffect.h"
 #include "support/EffectHarness.h"
+#include "support/EveryTarget.h"
+#include "tessarofx/ColorAdjust.h"
+#include "tessarofx/HSLAdjust.h"
+#include "tessarofx/LensAdjust.h"
+#include "tessarofx/LightAdjust.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/TessaroFx.h"
+#include "tessarofx/Vignette.h"
+#include "tessarofx/WhiteBalance.h"
 
 namespace {
 
 namespace Key = NLEKey::Filter;
+using tfx_test::Bytes;
+using tfx_test::CreateEffect;
+using tfx_test::EffectParams;
+using tfx_test::RunFrame;
+using tfx_test::Settings;
 
 std::wstring StringOf(INLEProperties* bag, const wchar_t* key) {
   wchar_t buf[128] = {};
@@ -31,24 +46,6 @@ NLEComPtr<INLEProperties> Descriptor(int index) {
   EXPECT_EQ(GetFilterProperties(index, &desc), NLE_S_OK) << index;
   return desc;
 }
-
-// Collects what the default logger writes while the test runs.
-struct LogCapture {
-  LogCapture() {
-    NLEGetDefaultLogger()->SetSink(&LogCapture::Sink, this);
-    level = NLEGetDefaultLogger()->GetLevel();
-    NLEGetDefaultLogger()->SetLevel(kNLELogInfo);
-  }
-  ~LogCapture() {
-    NLEGetDefaultLogger()->SetSink(nullptr, nullptr);
-    NLEGetDefaultLogger()->SetLevel(level);
-  }
-  static void Sink(void* self, int32_t, const wchar_t* message) {
-    static_cast<LogCapture*>(self)->lines.push_back(message);
-  }
-  std::vector<std::wstring> lines;
-  int32_t level;
-};
 
 // A device that offers the OpenCL operations but has no program manager or memory behind them.
 class FakeDevice final : public scombase::CUnknown,
@@ -93,51 +90,35 @@ TEST(FilterRegistry, DescriptorsAreUnreachableBeforeTheFirstCount) {
 TEST(FilterRegistry, PublishesTenFiltersInGuidOrder) {
   EXPECT_EQ(GetFilterCount(), 10u);
   EXPECT_EQ(GetFilterCount(), 10u);
-
-  const wchar_t* expected[10][2] = {
-      {L"18C6E879-4138-42D0-B0B9-6B4401AA97E6", L"ColorAdjust"},
-      {L"39509FB9-39FB-4516-9464-3D891DD61D62", L"WhiteBalanceAdjust"},
-      {L"41AA934B-757A-4EAD-8F7B-85E2E2952B6A", L"ChromeKeyCombine"},
-      {L"74EB022D-1D73-4D1E-9F70-487C356D46CD", L"Lut"},
-      {L"8622FC58-4DF1-44BD-9B37-2F633D4D3368", L"VignetteAdjust"},
-      {L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356", L"lutAToWhiteEffect"},
-      {L"AF91FF05-6577-4A4B-C81E-652EE7D6596E", L"HSLAdjust"},
-      {L"CFAAD60B-AC2B-4B39-A8E1-D25E35A6F735", L"DistortionFringingAdjust"},
-      {L"D8651B53-F47A-4B98-B8E9-35B491D5EADC", L"LightAdjust"},
-      {L"DB4BBA18-48FC-4164-B572-E59757B02796", L"ChromeKeyLut3dCL"},
-  };
+  const wchar_t* names[10] = {
+      L"ColorAdjust",    L"WhiteBalanceAdjust", L"ChromeKeyCombine", L"Lut",
+      L"VignetteAdjust", L"lutAToWhiteEffect",  L"HSLAdjust",        L"DistortionFringingAdjust",
+      L"LightAdjust",    L"ChromeKeyLut3dCL"};
   for (int i = 0; i < 10; ++i) {
     SCOPED_TRACE(i);
     NLEComPtr<INLEProperties> desc = Descriptor(i);
     ASSERT_TRUE(desc);
-    EXPECT_EQ(StringOf(desc, Key::kFilterID), expected[i][0]);
-    EXPECT_EQ(StringOf(desc, Key::kFilterFriendName), expected[i][1]);
+    EXPECT_EQ(StringOf(desc, Key::kFilterID), tfx_test::kGuids[i]);
+    EXPECT_EQ(StringOf(desc, Key::kFilterFriendName), names[i]);
     EXPECT_EQ(IntOf(desc, Key::kFilterCSupport), 1);  // every GUID has a CPU class
   }
-
   INLEProperties* untouched = reinterpret_cast<INLEProperties*>(0x1);
   EXPECT_EQ(GetFilterProperties(10, &untouched), NLE_E_INVALIDARG);
   EXPECT_EQ(GetFilterProperties(-1, &untouched), NLE_E_INVALIDARG);
   EXPECT_EQ(untouched, reinterpret_cast<INLEProperties*>(0x1));
-}
 
-TEST(FilterRegistry, OpenCLDescriptorWinsWhereBothClassesExist) {
-  ASSERT_EQ(GetFilterCount(), 10u);
+  // Where both classes exist the OpenCL descriptor is published, as the registered object itself.
   NLEComPtr<INLEProperties> key = Descriptor(9);
   EXPECT_EQ(IntOf(key, Key::kFilterOpenclSupport), 1);
   EXPECT_EQ(IntOf(key, Key::kFilterCSupport), 1);
   EXPECT_EQ(IntOf(key, Key::Property::kCount, 0), 0);  // the CPU class's six stay unpublished
-
-  NLEComPtr<INLEProperties> light = Descriptor(8);
-  EXPECT_EQ(IntOf(light, Key::kFilterOpenclSupport), -1);
-
-  // The published descriptor is the registered object itself, not a copy.
+  EXPECT_EQ(IntOf(Descriptor(8), Key::kFilterOpenclSupport), -1);
   auto& cl = NLEBasicCrossFilter::get_class_set();
-  EXPECT_EQ(cl.at(L"DB4BBA18-48FC-4164-B572-E59757B02796").second.get(), key.get());
+  EXPECT_EQ(cl.at(tfx_test::kChromeKey).second.get(), key.get());
   auto& cpu = NLEDynamicEffect::get_class_set();
   EXPECT_EQ(cpu.size(), 10u);
   EXPECT_EQ(cl.size(), 4u);
-  NLEComPtr<INLEProperties> cpuKey = cpu.at(L"DB4BBA18-48FC-4164-B572-E59757B02796").second;
+  NLEComPtr<INLEProperties> cpuKey = cpu.at(tfx_test::kChromeKey).second;
   EXPECT_EQ(IntOf(cpuKey, Key::Property::kCount), 6);
   EXPECT_EQ(StringOf(cpuKey, Key::kFilterFriendName), L"ChromeKeyLut3d");
 }
@@ -164,52 +145,40 @@ TEST(FilterRegistry, WhiteBalanceRegistersItsFiveParameters) {
   EXPECT_EQ(min.Text(), L"-100.000000");
 }
 
-TEST(CreateFilterFromGUID, ChoosesTheClassByTheDevice) {
+TEST(CreateFilterFromGUID, ChoosesTheClassByTheDeviceAndLogsIt) {
   ASSERT_EQ(GetFilterCount(), 10u);
   void* filter = nullptr;
-  // Unknown GUID and missing arguments.
   EXPECT_EQ(CreateFilterFromGUID(nullptr, L"00000000-0000-0000-0000-000000000000", nullptr, nullptr,
                                  &filter),
             NLE_E_INVALIDARG);
   EXPECT_EQ(filter, nullptr);
 
-  // A CPU-only GUID with a device has no class to create.
+  // A CPU-only GUID with a device has no class to create; OpenCL classes cannot bind without a
+  // program manager, nor to a device without OpenCL.
   FakeDevice* device = new FakeDevice(true);
   NLEComPtr<INLECGDevice> hold(device);
-  EXPECT_EQ(
-      CreateFilterFromGUID(device, L"D8651B53-F47A-4B98-B8E9-35B491D5EADC", nullptr, "", &filter),
-      NLE_E_INVALIDARG);
-  // OpenCL classes cannot bind without a program manager, nor to a device without OpenCL.
-  EXPECT_EQ(CreateFilterFromGUID(device, L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356", nullptr, nullptr,
-                                 &filter),
+  EXPECT_EQ(CreateFilterFromGUID(device, tfx_test::kLight, nullptr, "", &filter), NLE_E_INVALIDARG);
+  EXPECT_EQ(CreateFilterFromGUID(device, tfx_test::kAToWhite, nullptr, nullptr, &filter),
             NLE_E_INVALIDARG);
   NLEComPtr<INLECGDevice> plain(new FakeDevice(false));
-  EXPECT_EQ(
-      CreateFilterFromGUID(plain, L"39509FB9-39FB-4516-9464-3D891DD61D62", nullptr, "x", &filter),
-      NLE_E_INVALIDARG);
+  EXPECT_EQ(CreateFilterFromGUID(plain, tfx_test::kWhiteBalance, nullptr, "x", &filter),
+            NLE_E_INVALIDARG);
   EXPECT_EQ(filter, nullptr);
   EXPECT_EQ(device->GetRefCount(), 1u);  // failed filters released what they took
 
-  // Without a device every GUID has a CPU class.
-  for (int i = 0; i < 10; ++i) {
-    NLEComPtr<INLEProperties> desc = Descriptor(i);
-    std::wstring guid = StringOf(desc, Key::kFilterID);
+  // Without a device every GUID has a CPU class, and its creation is logged with file and line.
+  for (const wchar_t* guid : tfx_test::kGuids) {
+    tfx_test::LogCapture log;
     NLEComPtr<INLECGFilter> cpu;
-    ASSERT_EQ(CreateFilterFromGUID(nullptr, guid.c_str(), nullptr, nullptr,
-                                   reinterpret_cast<void**>(&cpu)),
+    ASSERT_EQ(CreateFilterFromGUID(nullptr, guid, nullptr, nullptr, reinterpret_cast<void**>(&cpu)),
               NLE_S_OK);
     ASSERT_TRUE(cpu);
+    ASSERT_EQ(log.lines.size(), 1u);
+    if (guid == tfx_test::kColorAdjust) {
+      EXPECT_EQ(log.lines[0].second,
+                L"CREATE <PureC> Filter: ColorAdjust  [CGFilterPlugin.cpp, 78]");
+    }
   }
-}
-
-TEST(CreateFilterFromGUID, LogsCreationWithFileAndLine) {
-  LogCapture log;
-  NLEComPtr<INLECGFilter> filter;
-  ASSERT_EQ(CreateFilterFromGUID(nullptr, L"18C6E879-4138-42D0-B0B9-6B4401AA97E6", nullptr, nullptr,
-                                 reinterpret_cast<void**>(&filter)),
-            NLE_S_OK);
-  ASSERT_EQ(log.lines.size(), 1u);
-  EXPECT_EQ(log.lines[0], L"CREATE <PureC> Filter: ColorAdjust  [CGFilterPlugin.cpp, 78]");
 }
 
 TEST(CreateFilterFromGUID, HostSettingsOverrideRegisteredDefaults) {
@@ -220,7 +189,7 @@ TEST(CreateFilterFromGUID, HostSettingsOverrideRegisteredDefaults) {
   props->SetString(L"Host.Note", L"kept");
 
   NLEComPtr<INLECGFilter> filter;
-  ASSERT_EQ(CreateFilterFromGUID(nullptr, L"39509FB9-39FB-4516-9464-3D891DD61D62", props, nullptr,
+  ASSERT_EQ(CreateFilterFromGUID(nullptr, tfx_test::kWhiteBalance, props, nullptr,
                                  reinterpret_cast<void**>(&filter)),
             NLE_S_OK);
   NLEComPtr<INLEProperties> own;
@@ -241,65 +210,218 @@ TEST(CreateFilterFromGUID, HostSettingsOverrideRegisteredDefaults) {
 }
 
 // Every CPU class reads the foreground, so without one it refuses and leaves the output alone.
-TEST(CreateFilterFromGUID, EveryCpuClassRefusesAMissingForeground) {
+// At the settings that ask it to do nothing, each gives its foreground back byte for byte, into
+// a packed destination and into a padded one. The combiner needs an opaque colour and a full
+// mask for that; everything else sees random alpha, none of it 0, which the alpha filler would
+// change.
+TEST(CreateFilterFromGUID, EveryEffectRefusesNoForegroundAndLeavesTheFrameAtNeutralSettings) {
   ASSERT_EQ(GetFilterCount(), 10u);
-  for (int i = 0; i < 10; ++i) {
-    const std::wstring guid = StringOf(Descriptor(i), Key::kFilterID);
-    SCOPED_TRACE(std::string(guid.begin(), guid.end()));
-    NLEComPtr<INLECGFilter> filter = tfx_test::CreateEffect(guid.c_str(), nullptr);
-    ASSERT_TRUE(filter);
-    tfx_test::ExpectRefusesMissingForeground(filter.get());
+  for (const wchar_t* guid : tfx_test::kGuids) {
+    SCOPED_TRACE(std::string(guid, guid + 36));
+    tfx_test::ExpectRefusesMissingForeground(CreateEffect(guid, nullptr).get());
   }
-}
-
-// Each effect at the settings that ask it to do nothing gives its foreground back byte for byte,
-// into a packed destination and into a padded one. The combiner needs an opaque colour and a
-// full mask for that; everything else sees random alpha, none of it 0, which the alpha filler
-// would change.
-TEST(CreateFilterFromGUID, EveryEffectLeavesTheFrameAloneAtNeutralSettings) {
-  using tfx_test::Settings;
   const struct {
     const wchar_t* guid;
     NLEComPtr<INLEProperties> settings;
     bool mask = false;
   } cases[] = {
-      {L"18C6E879-4138-42D0-B0B9-6B4401AA97E6",
+      {tfx_test::kColorAdjust,
        Settings({{L"u_exposure", 0}, {L"u_brightness", 0}, {L"u_contrast", 0}})},
-      {L"39509FB9-39FB-4516-9464-3D891DD61D62", nullptr},
-      {L"41AA934B-757A-4EAD-8F7B-85E2E2952B6A", nullptr, true},
+      {tfx_test::kWhiteBalance, nullptr},
+      {tfx_test::kCombine, nullptr, true},
       // No file there: the frame passes as it is.
-      {L"74EB022D-1D73-4D1E-9F70-487C356D46CD",
-       tfx_test::TextSettings(L"lut3dPath", L"/nonexistent/none.cube")},
+      {tfx_test::kLut, tfx_test::TextSettings(L"lut3dPath", L"/nonexistent/none.cube")},
       // Without an amount the shape settings change nothing.
-      {L"8622FC58-4DF1-44BD-9B37-2F633D4D3368", Settings({{L"feather", 10}, {L"size", 5}})},
-      {L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356", nullptr},
-      {L"AF91FF05-6577-4A4B-C81E-652EE7D6596E", Settings({{L"u_green_sat", 0}})},
-      {L"CFAAD60B-AC2B-4B39-A8E1-D25E35A6F735", Settings({{L"distortion", 0}, {L"fringing", 0}})},
-      {L"D8651B53-F47A-4B98-B8E9-35B491D5EADC", nullptr},
+      {tfx_test::kVignette, Settings({{L"feather", 10}, {L"size", 5}})},
+      {tfx_test::kAToWhite, nullptr},
+      {tfx_test::kHsl, Settings({{L"u_green_sat", 0}})},
+      {tfx_test::kLens, Settings({{L"distortion", 0}, {L"fringing", 0}})},
+      {tfx_test::kLight, nullptr},
       // Modes past mask (0) and beauty (1), on either side, are a plain copy.
-      {L"DB4BBA18-48FC-4164-B572-E59757B02796", Settings({{L"green", 200}, {L"mode", 2}})},
-      {L"DB4BBA18-48FC-4164-B572-E59757B02796", Settings({{L"green", 200}, {L"mode", -1}})},
+      {tfx_test::kChromeKey, Settings({{L"green", 200}, {L"mode", 2}})},
+      {tfx_test::kChromeKey, Settings({{L"green", 200}, {L"mode", -1}})},
   };
   for (const auto& c : cases) {
-    SCOPED_TRACE(std::string(c.guid, c.guid + std::wcslen(c.guid)));
-    NLEComPtr<INLECGFilter> filter = tfx_test::CreateEffect(c.guid, c.settings.get());
+    SCOPED_TRACE(std::string(c.guid, c.guid + 36));
+    NLEComPtr<INLECGFilter> filter = CreateEffect(c.guid, c.settings.get());
     ASSERT_TRUE(filter);
     for (const int stride : {0, 17 * 4 + 12}) {
-      TestFrame* fg = new TestFrame(17, 9);
-      TestFrame* bg = new TestFrame(17, 9, 0, false, 255);
+      Bytes fg = tfx_test::NoiseBytes(17 * 9 * 4, 17);
+      for (size_t i = 3; i < fg.size(); i += 4) fg[i] = c.mask ? 255 : std::max<uint8_t>(fg[i], 1);
       TestFrame* dst = new TestFrame(17, 9, stride, false, 0xEE);
-      NLEComPtr<INLEFrame> h1(fg), h2(bg), h3(dst);
-      tfx_test::FillRandom(fg, 17);
-      for (size_t i = 3; i < fg->pixels.size(); i += 4) {
-        fg->pixels[i] = c.mask ? 255 : std::max<uint8_t>(fg->pixels[i], 1);
-      }
-      filter->SetForeground(fg);
-      if (c.mask) filter->SetBackground(bg);
-      ASSERT_EQ(filter->Running(dst), NLE_S_OK);
+      const Bytes out = RunFrame(filter.get(), new TestFrame(17, 9, fg), dst,
+                                 c.mask ? new TestFrame(17, 9, 0, false, 255) : nullptr);
       for (int y = 0; y < 9; ++y) {
-        ASSERT_TRUE(std::equal(fg->Row(y), fg->Row(y) + 17 * 4, dst->Row(y))) << "row " << y;
+        const int at = y * (stride ? stride : 17 * 4);
+        ASSERT_TRUE(std::equal(&fg[y * 17 * 4], &fg[(y + 1) * 17 * 4], &out[at])) << "row " << y;
       }
     }
+  }
+}
+
+// Each effect applies its image form with the values its parameters carry: set at creation, or
+// changed after a frame (which must not leave tables built for the old values), into padded and
+// packed destinations, on every target. Distinct values show the argument order; the short lists
+// the defaults of missing parameters.
+TEST(CreateFilterFromGUID, EveryEffectAppliesItsImageFormWithItsParameters) {
+  using Form = std::function<void(CxImage*)>;
+  struct Case {
+    std::string name;
+    const wchar_t* guid;
+    EffectParams settings, changes;
+    int width, height, fgHeight;
+    std::vector<int> strides;
+    Form form;
+  };
+  std::vector<Case> cases;
+  const auto add = [&](std::string name, const wchar_t* guid, EffectParams settings,
+                       EffectParams changes, int w, int h, std::vector<int> strides, Form form,
+                       int fgHeight = 0) {
+    cases.push_back({name, guid, settings, changes, w, h, fgHeight, strides, form});
+  };
+  using tfx_test::kVignette;
+  add("colour at creation", tfx_test::kColorAdjust, {{L"u_brightness", 100}, {L"u_exposure", 0}},
+      {}, 64, 4, {300}, [](CxImage* i) { brightnessAdjustment(i, 100); });
+  add("colour changed", tfx_test::kColorAdjust, {{L"u_brightness", 100}, {L"u_exposure", 0}},
+      {{L"u_brightness", 0}, {L"u_exposure", 50}}, 5, 3, {0},
+      [](CxImage* i) { exposureAdjustment(i, 50); });
+  // Highlight, shadow, white level, black level, each seeing the previous one's output.
+  add("light", tfx_test::kLight,
+      EffectParams{
+          {L"u_blackLevel", -35}, {L"u_highLight", 60}, {L"u_shadow", 80}, {L"u_whiteLevel", 0}},
+      {{L"u_whiteLevel", -45}}, 64, 4, {300}, [](CxImage* i) {
+        hdrBlackLevel(hdrWhiteLevel(hdrShadow(hdrHighlight(i, 60), 80), -45), -35);
+      });
+  add("vignette, every parameter", kVignette,
+      EffectParams{{L"amount", -40},
+                   {L"size", 30},
+                   {L"roundness", 60},
+                   {L"feather", 80},
+                   {L"exposure", 25},
+                   {L"highlights", 70}},
+      {}, 61, 35, {260}, [](CxImage* i) { vignetteAdjustFilter(i, -40, 80, 70, 30, 60, 25); });
+  // Size 100, feather 50, highlights 50, roundness and exposure 0 unless given.
+  add("vignette, amount", kVignette, {{L"amount", -70}}, {}, 61, 35, {260},
+      [](CxImage* i) { vignetteAdjustFilter(i, -70, 50, 50, 100, 0, 0); });
+  add("vignette, exposure", kVignette, {{L"exposure", -60}, {L"roundness", 20}}, {}, 61, 35, {260},
+      [](CxImage* i) { vignetteAdjustFilter(i, 0, 50, 50, 100, 20, -60); });
+  // The gains are carried and not applied.
+  add("white balance", tfx_test::kWhiteBalance, {},
+      EffectParams{{L"u_temperature", 25},
+                   {L"u_tint", -40},
+                   {L"u_rgain", -50},
+                   {L"u_ggain", 0},
+                   {L"u_bgain", 99}},
+      33, 7, {0}, [](CxImage* i) {
+        cv::Mat m(int(i->GetHeight()), int(i->GetWidth()), CV_8UC4, i->GetBits());
+        AdjustWhiteBalance().Process(m, m, ColorGain{1, 1, 1}, 25 / 200.0f, -40 / 200.0f);
+      });
+  // One band value at a time (width and soft beside a hue shift, which they shape): each name
+  // must land in its own field. Then a packed frame whose 67 pixels leave a tail shorter than a
+  // vector, and a change of value.
+  const wchar_t* bandNames[] = {L"red",  L"orange", L"yellow", L"green",
+                                L"aqua", L"blue",   L"purple", L"magenta"};
+  for (int b = 0; b < kHSLBandCount; ++b) {
+    const std::wstring prefix = std::wstring(L"u_") + bandNames[b] + L"_";
+    const std::pair<EffectParams, HSLBandValues> values[] = {
+        {{{prefix + L"hue", 60}}, {60, 0, 0, 0, 0}},
+        {{{prefix + L"sat", -45}}, {0, -45, 0, 0, 0}},
+        {{{prefix + L"light", 35}}, {0, 0, 35, 0, 0}},
+        {{{prefix + L"hue", 60}, {prefix + L"width", 80}}, {60, 0, 0, 80, 0}},
+        {{{prefix + L"hue", 60}, {prefix + L"soft", -90}}, {60, 0, 0, 0, -90}},
+    };
+    for (const auto& [params, v] : values) {
+      HSLBands bands{};
+      bands.band[b] = v;
+      const std::wstring& name = params.back().first;
+      add(std::string(name.begin(), name.end()), tfx_test::kHsl, params, {}, 64, 8, {300},
+          [bands](CxImage* i) { hslAdjustment(i, bands); });
+    }
+  }
+  HSLBands packed{}, changed{};
+  packed.band[kHSLRed].hue = 40;
+  packed.band[kHSLAqua].sat = -70;
+  packed.band[kHSLBlue].light = 55;
+  changed.band[kHSLGreen].sat = -100;
+  add("hsl, packed", tfx_test::kHsl,
+      EffectParams{{L"u_red_hue", 40}, {L"u_aqua_sat", -70}, {L"u_blue_light", 55}}, {}, 67, 5, {0},
+      [packed](CxImage* i) { hslAdjustment(i, packed); });
+  add("hsl changed", tfx_test::kHsl, {{L"u_green_sat", 0}}, {{L"u_green_sat", -100}}, 33, 7, {0},
+      [changed](CxImage* i) { hslAdjustment(i, changed); });
+  // Frames of one size are resampled straight from the foreground, a taller foreground is cut
+  // to the output first. A distortion of -2000 sends samples out of the frame, where the
+  // foreground's own pixel stays. Padded output rows, then packed ones twice: a setting held for
+  // a second frame takes the single pass.
+  for (const auto& [d, f, fgHeight] : {std::tuple{-35.0, 60.0, 30},
+                                       {0.0, 45.0, 30},
+                                       {70.0, 0.0, 30},
+                                       {25.0, -40.0, 34},
+                                       {-2000.0, 30.0, 30}}) {
+    add(
+        "lens " + std::to_string(d) + " " + std::to_string(f), tfx_test::kLens,
+        {{L"distortion", d}, {L"fringing", f}}, {}, 50, 30, {216, 0, 0},
+        [d = float(d), f = float(f)](CxImage* i) { fringingFilter(distortFilter(i, d), f); },
+        fgHeight);
+  }
+  tfx_test::ForEveryTarget([&] {
+    for (const Case& c : cases) {
+      SCOPED_TRACE(c.name);
+      NLEComPtr<INLECGFilter> filter =
+          CreateEffect(c.guid, c.settings.empty() ? nullptr : Settings(c.settings).get());
+      ASSERT_TRUE(filter);
+      if (!c.changes.empty()) {
+        RunFrame(filter.get(), new TestFrame(c.width, c.height), new TestFrame(c.width, c.height));
+        for (const auto& [name, value] : c.changes) {
+          tfx_test::SetParam(filter.get(), name.c_str(), value);
+        }
+      }
+      for (const int stride : c.strides) {
+        tfx_test::ExpectMatchesImageForm(filter.get(), c.width, c.height, stride, c.form,
+                                         c.fgHeight);
+      }
+    }
+  });
+}
+
+// The alpha effects, byte by byte; destination bytes no source pixel reaches keep their 0xEE.
+TEST(CreateFilterFromGUID, AlphaEffectsWriteTheirStatedBytes) {
+  const struct {
+    const char* name;
+    const wchar_t* guid;
+    int width, height;  // the foreground's; the background's and the destination's follow
+    Bytes fg;
+    int bgWidth;  // 0: no background
+    Bytes bg;
+    int dstWidth, dstHeight;
+    HRESULT status;
+    Bytes expected;
+  } cases[] = {
+      // Despite the name, fully transparent pixels become opaque black; any other alpha passes.
+      {"to white", tfx_test::kAToWhite, 4, 1,
+       Bytes{10, 20, 30, 0, 10, 20, 30, 1, 10, 20, 30, 255, 0, 0, 0, 0}, 0, Bytes{}, 5, 1, NLE_S_OK,
+       Bytes{0, 0, 0, 255, 10, 20, 30, 1, 10, 20, 30, 255, 0, 0, 0, 255, 0xEE, 0xEE, 0xEE, 0xEE}},
+      // Colour premultiplied, alpha from byte 0 of the mask alone.
+      {"combine", tfx_test::kCombine, 4, 1,
+       Bytes{200, 100, 50, 128, 200, 100, 50, 9, 200, 100, 50, 10, 255, 255, 255, 255}, 4,
+       Bytes{77, 1, 2, 3, 200, 9, 9, 9, 200, 9, 9, 9, 0, 255, 255, 255}, 4, 1, NLE_S_OK,
+       Bytes{100, 50, 25, 77, 7, 3, 1, 0, 7, 3, 1, 200, 255, 255, 255, 0}},
+      // Pixels are matched by their index in each packed image; a smaller input limits the
+      // output to the pixels it holds.
+      {"combine, smaller colour", tfx_test::kCombine, 1, 2, Bytes(8, 255), 3, Bytes(12, 99), 3, 1,
+       NLE_S_OK, Bytes{255, 255, 255, 99, 255, 255, 255, 99, 0xEE, 0xEE, 0xEE, 0xEE}},
+      {"combine without a mask", tfx_test::kCombine, 2, 2, Bytes(16, 5), 0, Bytes{}, 2, 2,
+       NLE_E_INVALIDARG, Bytes(16, 0xEE)},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    HRESULT status = 0;
+    const Bytes out = RunFrame(
+        CreateEffect(c.guid, nullptr).get(), new TestFrame(c.width, c.height, c.fg),
+        new TestFrame(c.dstWidth, c.dstHeight, 0, false, 0xEE),
+        c.bgWidth ? new TestFrame(c.bgWidth, int(c.bg.size()) / 4 / c.bgWidth, c.bg) : nullptr,
+        &status);
+    EXPECT_EQ(status, c.status);
+    EXPECT_EQ(out, c.expected);
   }
 }
 

@@ -3,7 +3,6 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <random>
 
 namespace tfx_test {
 
@@ -50,8 +49,35 @@ NLEComPtr<INLECGFilter> CreateEffect(const wchar_t* guid, INLEProperties* settin
 }
 
 void FillRandom(TestFrame* frame, unsigned salt) {
-  std::mt19937 rng(salt);
-  for (auto& b : frame->pixels) b = static_cast<uint8_t>(rng());
+  frame->pixels = NoiseBytes(frame->pixels.size(), salt);
+}
+
+Bytes RunFrame(INLECGFilter* filter, TestFrame* fg, TestFrame* dst, TestFrame* bg,
+               HRESULT* status) {
+  NLEComPtr<INLEFrame> h1(fg), h2(dst), h3(bg);
+  filter->SetForeground(fg);
+  filter->SetBackground(bg);
+  const HRESULT hr = filter->Running(dst);
+  if (status) {
+    *status = hr;
+  } else {
+    EXPECT_EQ(hr, NLE_S_OK);
+  }
+  return dst->pixels;
+}
+
+LogCapture::LogCapture(int32_t level) : saved(NLEGetDefaultLogger()->GetLevel()) {
+  NLEGetDefaultLogger()->SetSink(
+      [](void* self, int32_t at, const wchar_t* message) {
+        static_cast<LogCapture*>(self)->lines.emplace_back(at, message);
+      },
+      this);
+  NLEGetDefaultLogger()->SetLevel(level);
+}
+
+LogCapture::~LogCapture() {
+  NLEGetDefaultLogger()->SetSink(nullptr, nullptr);
+  NLEGetDefaultLogger()->SetLevel(saved);
 }
 
 void SetParam(INLECGFilter* filter, const wchar_t* name, double value) {

@@ -8,11 +8,13 @@
 #include <memory>
 #include <vector>
 
+#include "tessarofx/CubeLut.h"
 #include "tessarofx/CxImage.h"
 
 namespace tfx_test {
 
 using Image = std::unique_ptr<CxImage>;
+using Bytes = std::vector<uint8_t>;
 
 Image Clone(const CxImage& src);
 
@@ -30,5 +32,11 @@ const CxImage& EveryColour();
 
 // Equal buffers, or the first differing byte with its pixel coordinates.
 ::testing::AssertionResult SameBuffer(const CxImage& expected, const CxImage& actual);
+
+// The three components of lattice point (i, j, k), red index first, in the 64-point storage.
+inline float* LatticePoint(CubeLut& lut, int i, int j, int k) {
+  return lut.getLut3DData(nullptr, nullptr, nullptr, nullptr) +
+         ((i * CubeLut::kMaxSize + j) * CubeLut::kMaxSize + k) * 3;
+}
 
 }  // namespace tfx_test

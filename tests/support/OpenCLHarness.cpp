@@ -7,9 +7,7 @@
 namespace tfx_test {
 
 void OpenCLEffectTest::SetUp() {
-  uint32_t count = 0;
-  ASSERT_EQ(NLECommon::ListOpenCLDevices(nullptr, 0, &count), NLE_S_OK);
-  if (count == 0) GTEST_SKIP() << "no OpenCL platform or device on this machine";
+  if (OpenCLDevices().empty()) GTEST_SKIP() << "no OpenCL platform or device on this machine";
   ASSERT_EQ(NLECommon::CreateOpenCLDevice(-1, &device_), NLE_S_OK);
 }
 

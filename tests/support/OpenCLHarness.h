@@ -5,9 +5,11 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <vector>
 
+#include "support/ImageBuilders.h"
 #include "support/ScopedVariable.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/NLEOpenCL.h"
@@ -15,7 +17,15 @@
 
 namespace tfx_test {
 
-using Bytes = std::vector<uint8_t>;
+// What the machine's OpenCL runtimes list, in the kit's order.
+inline std::vector<NLEOpenCLDeviceInfo> OpenCLDevices() {
+  uint32_t count = 0;
+  if (NLECommon::ListOpenCLDevices(nullptr, 0, &count) != NLE_S_OK) return {};
+  std::vector<NLEOpenCLDeviceInfo> devices(count);
+  NLECommon::ListOpenCLDevices(devices.data(), count, &count);
+  devices.resize(std::min<size_t>(count, devices.size()));
+  return devices;
+}
 
 class OpenCLEffectTest : public testing::Test {
  protected:

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <utility>
 #include <vector>
 
 #include "tessarofx/NLEFrame.h"
@@ -12,6 +13,10 @@ class TestFrame final : public scombase::CUnknown, public INLEFrame {
   // A frame of width x height pixels, rows `stride` bytes apart (0: packed), filled with `fill`.
   // With `surface` true the pixels are reached through a mapped surface (storage kind 32).
   TestFrame(int width, int height, int stride = 0, bool surface = false, uint8_t fill = 0);
+  // A packed frame holding `bytes`.
+  TestFrame(int w, int h, std::vector<uint8_t> bytes) : TestFrame(w, h) {
+    pixels = std::move(bytes);
+  }
 
   NLE_DECLARE_IUNKNOWN
   HRESULT NonDelegatingQueryInterface(REFIID iid, void** out) override;
