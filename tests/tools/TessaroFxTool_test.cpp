@@ -20,8 +20,8 @@
 #include <string_view>
 #include <vector>
 
+#include "support/OpenCLHarness.h"
 #include "support/TempDir.h"
-#include "tessarofx/NLEOpenCL.h"
 
 namespace {
 
@@ -133,65 +133,21 @@ TEST_F(ToolTest, ListShowsTheTenPublishedFiltersInIndexOrder) {
   EXPECT_NE(r.out.find("u_temperature"), npos);
   EXPECT_NE(r.out.find("u_exposure"), npos);
   EXPECT_NE(r.out.find("also registered as: ColorLut3dAdjust"), npos);
-}
 
-// Enough of a JSON reader to tell well-formed output from broken output.
-struct JsonChecker {
-  const std::string& s;
-  size_t i = 0;
-
-  bool Valid() {
-    const bool ok = Value();
-    Peek(' ');  // only white space may follow
-    return ok && i == s.size();
-  }
-  // Skips white space, then tells whether `c` comes next without taking it.
-  bool Peek(char c) {
-    while (i < s.size() && std::isspace(static_cast<unsigned char>(s[i]))) ++i;
-    return i < s.size() && s[i] == c;
-  }
-  bool Eat(char c) { return Peek(c) ? (++i, true) : false; }
-  bool String() {
-    if (!Eat('"')) return false;
-    while (i < s.size() && s[i] != '"') i += s[i] == '\\' ? 2 : 1;
-    return i++ < s.size();
-  }
-  bool Value() {
-    if (Peek('"')) return String();
-    for (const char* brackets : {"{}", "[]"}) {
-      if (!Eat(brackets[0])) continue;
-      if (Eat(brackets[1])) return true;
-      do {
-        if (brackets[0] == '{' && !(String() && Eat(':'))) return false;
-        if (!Value()) return false;
-      } while (Eat(','));
-      return Eat(brackets[1]);
-    }
-    for (const char* word : {"true", "false", "null"}) {
-      if (s.compare(i, std::strlen(word), word) == 0) return i += std::strlen(word), true;
-    }
-    char* end = nullptr;
-    std::strtod(s.c_str() + i, &end);
-    if (end == s.c_str() + i) return false;
-    i = static_cast<size_t>(end - s.c_str());
-    return true;
-  }
-};
-
-TEST_F(ToolTest, ListJsonIsWellFormedAndCarriesEveryFilter) {
-  const Outcome r = Run("list --json");
-  ASSERT_EQ(r.exitCode, 0) << r.err;
-  EXPECT_TRUE(JsonChecker{r.out}.Valid()) << r.out;
+  // The JSON form (whose syntax the Python tests parse) carries every filter and its parameters.
+  const Outcome json = Run("list --json");
+  ASSERT_EQ(json.exitCode, 0) << json.err;
   int guids = 0;
   const std::string key = "\"guid\": \"";
-  for (size_t at = r.out.find(key); at != npos; at = r.out.find(key, at + 1)) {
-    guids += IsGuid(r.out.substr(at + key.size(), 36)) ? 1 : 0;
+  for (size_t at = json.out.find(key); at != npos; at = json.out.find(key, at + 1)) {
+    guids += IsGuid(json.out.substr(at + key.size(), 36)) ? 1 : 0;
   }
   EXPECT_EQ(guids, 10);
-  EXPECT_NE(r.out.find(R"({"name": "u_temperature", "type": "double", "default": 0, "min": -100, )"
-                       R"("max": 100, "registered": true)"),
-            npos);
-  EXPECT_NE(r.out.find(R"({"name": "red", "type": "int")"), npos);
+  EXPECT_NE(
+      json.out.find(R"({"name": "u_temperature", "type": "double", "default": 0, "min": -100, )"
+                    R"("max": 100, "registered": true)"),
+      npos);
+  EXPECT_NE(json.out.find(R"({"name": "red", "type": "int")"), npos);
 }
 
 TEST_F(ToolTest, ApplyFindsFiltersByGuidAndNameInAnyCase) {
@@ -208,25 +164,20 @@ TEST_F(ToolTest, ApplyFindsFiltersByGuidAndNameInAnyCase) {
   }
 }
 
-TEST_F(ToolTest, ReadsGreyAndSixteenBitInputAsOpaqueBgra) {
+TEST_F(ToolTest, ReadsAnyInputAsBgraAndWritesAlphaOnlyWhereTheFormatHoldsIt) {
   // 0x12AB keeps its high byte.
   ASSERT_TRUE(cv::imwrite(Path("grey16.png"), cv::Mat(3, 5, CV_16UC1, cv::Scalar(0x12AB))));
   ASSERT_EQ(Run("apply ColorAdjust grey16.png out.png").exitCode, 0);
-  const cv::Mat out = Read("out.png");
-  ASSERT_EQ(out.type(), CV_8UC4);
-  EXPECT_EQ(out.at<cv::Vec4b>(2, 4), cv::Vec4b(0x12, 0x12, 0x12, 255));
-}
-
-TEST_F(ToolTest, WritesAlphaOnlyWhereTheFormatHoldsIt) {
+  ASSERT_EQ(Read("out.png").type(), CV_8UC4);
+  EXPECT_EQ(Read("out.png").at<cv::Vec4b>(2, 4), cv::Vec4b(0x12, 0x12, 0x12, 255));
   WriteInput("in.png");
   for (const std::string name : {"o.png", "o.tif", "o.webp", "o.jpg", "o.bmp"}) {
     SCOPED_TRACE(name);
     ASSERT_EQ(Run("apply ColorAdjust in.png " + name).exitCode, 0);
-    const cv::Mat out = Read(name);
     const bool alpha = name != "o.jpg" && name != "o.bmp";
-    ASSERT_EQ(out.channels(), alpha ? 4 : 3);
+    ASSERT_EQ(Read(name).channels(), alpha ? 4 : 3);
     if (alpha) {
-      EXPECT_EQ(cv::norm(out, Read("in.png"), cv::NORM_INF), 0);
+      EXPECT_EQ(cv::norm(Read(name), Read("in.png"), cv::NORM_INF), 0);
     }
   }
 }
@@ -235,9 +186,13 @@ TEST_F(ToolTest, FailuresNameTheirCauseAndLeaveNoOutput) {
   WriteInput("in.png");
   WriteInput("wide.png", 9, 4);
   WriteText("out.png", "previous");
+  WriteText("out.cube", "previous");
+  WriteText("big.cube", CubeText(65));
+  WriteText("bad.cube", "# c\n\nLUT_3D_SIZE 70\nTITLE \"a\"\n\nTITLE \"b\"\n");
+  WriteText("grade.lut", "LUT_3D_SIZE 2\n");
   const struct {
-    const char* args;
-    const char* cause;
+    std::string args;
+    std::string cause;
     std::string env = "";
     int exitCode = 1;
   } cases[] = {
@@ -268,10 +223,47 @@ TEST_F(ToolTest, FailuresNameTheirCauseAndLeaveNoOutput) {
       {"--plugin ./nowhere.so list", "nowhere.so"},
       {"list", "env.so", "TESSAROFX_PLUGIN=" + Path("env.so")},
       {"frobnicate", "unknown command 'frobnicate'", "", 2},
+      // The LUT commands; parse errors name the physical line.
+      {"lut convert big.cube out.cube",
+       "big.cube: 65 points per axis, more than the plug-in's 64: "
+       "pass --size 64 (or smaller)"},
+      {"lut convert big.cube out.cube --size 65", "bad --size '65': a whole number from 2 to 64"},
+      {"lut convert big.cube out.png --size 8", "lut convert writes .cube files"},
+      {"lut convert bad.cube out.cube --size 8",
+       "bad.cube, line 6 (\"TITLE \\\"b\\\"\"): status 20, unknown or repeated keyword"},
+      {"lut info grade.lut", "grade.lut: not a .cube or .3dl file"},
+      {"lut convert none.cube out.cube", "none.cube: cannot be opened"},
+      {"lut convert big.cube", "lut convert takes IN and OUT"},
+      {"lut bake -f VignetteAdjust out.cube",
+       "'VignetteAdjust' cannot be baked into a table (bakeable: ColorAdjust, LightAdjust, "
+       "WhiteBalanceAdjust)"},
+      {"lut bake -f LightAdjust -p u_glow=1 out.cube",
+       "LightAdjust has no parameter 'u_glow' (valid: u_highLight, u_shadow, u_whiteLevel, "
+       "u_blackLevel)"},
+      {"lut bake -p u_exposure=1 out.cube", "-p u_exposure=1 needs a -f FILTER before it"},
+      {"lut bake -f ColorAdjust -p u_contrast=300 out.cube", "-100..100"},
+      {"lut bake -f ColorAdjust -p u_sat=lots out.cube", "not a number"},
+      {"lut bake --size 1 out.cube", "bad --size '1'"},
+      {"lut bake -f ColorAdjust out.png", "lut bake writes .cube files"},
+      {"lut frobnicate", "unknown lut subcommand 'frobnicate'"},
+      // Mistakes about OpenCL the tool can see whatever the machine has.
+      {"apply --opencl ColorAdjust in.png out.png",
+       "ColorAdjust has no OpenCL class; see tessarofx list"},
+      {"apply --opencl -f ColorAdjust -f LightAdjust in.png out.png",
+       "none of the chain's filters has an OpenCL class"},
+      {"apply --device 0 WhiteBalanceAdjust in.png out.png", "--device only goes with --opencl"},
+      {"apply --kernels . WhiteBalanceAdjust in.png out.png", "--kernels only goes with --opencl"},
+      {"apply --opencl -b in.png WhiteBalanceAdjust in.png out.png",
+       "--background does not go with --opencl"},
+      {"apply --opencl --device gpu WhiteBalanceAdjust in.png out.png", "bad --device 'gpu'"},
+      {"apply --opencl --device -2 WhiteBalanceAdjust in.png out.png", "bad --device '-2'"},
+      {"apply --opencl WhiteBalanceAdjust in.png out.png", "no OpenCL device",
+       "OCL_ICD_VENDORS=" + Path("no-such-dir")},
   };
   const std::vector<std::string> before = Listing();
   for (const auto& c : cases) ExpectRefused(c.args, c.cause, before, c.env, c.exitCode);
   EXPECT_EQ(Slurp(Path("out.png")), "previous");
+  EXPECT_EQ(Slurp(Path("out.cube")), "previous");
   ASSERT_EQ(Run("apply ColorAdjust in.png out.png").exitCode, 0);
   EXPECT_EQ(Read("out.png").size(), cv::Size(6, 4));
 }
@@ -295,8 +287,9 @@ TEST_F(ToolTest, LogsFilterCreationOnlyWhenAsked) {
 }
 
 // Each -f runs on the result of the one before, with its own settings; the chain's result is
-// the same as applying the filters one at a time.
-TEST_F(ToolTest, ApplyChainRunsItsFiltersInOrder) {
+// the same as applying the filters one at a time. A function of the table with the same value
+// as a filter's parameter gives its bytes.
+TEST_F(ToolTest, ApplyChainRunsItsFiltersInOrderAndFxMatchesTheFilter) {
   WriteInput("in.png", 17, 9);
   const std::string first = "ColorAdjust -p u_exposure=30", second = "HSLAdjust -p u_red_sat=-50";
   ASSERT_EQ(Run("apply " + first + " in.png a.png").exitCode, 0);
@@ -308,16 +301,12 @@ TEST_F(ToolTest, ApplyChainRunsItsFiltersInOrder) {
   EXPECT_EQ(r.err, "");
   EXPECT_EQ(cv::norm(Read("chain.png"), Read("ab.png"), cv::NORM_INF), 0);
   EXPECT_NE(cv::norm(Read("ab.png"), Read("ba.png"), cv::NORM_INF), 0) << "order proves nothing";
-}
 
-TEST_F(ToolTest, FxExposureMatchesTheFilterWithTheSameValue) {
-  WriteInput("in.png", 17, 9);
   ASSERT_EQ(Run("fx exposure -37.5 in.png fx.png").exitCode, 0);
   ASSERT_EQ(Run("apply ColorAdjust -p u_exposure=-37.5 in.png apply.png").exitCode, 0);
-  const cv::Mat fx = Read("fx.png");
-  ASSERT_FALSE(fx.empty());
-  EXPECT_EQ(cv::norm(fx, Read("apply.png"), cv::NORM_INF), 0);
-  EXPECT_NE(cv::norm(fx, Read("in.png"), cv::NORM_INF), 0);
+  ASSERT_FALSE(Read("fx.png").empty());
+  EXPECT_EQ(cv::norm(Read("fx.png"), Read("apply.png"), cv::NORM_INF), 0);
+  EXPECT_NE(cv::norm(Read("fx.png"), Read("in.png"), cv::NORM_INF), 0);
 }
 
 TEST_F(ToolTest, EveryFxCallingKindRunsWithTheOutputSizeItPromises) {
@@ -459,27 +448,25 @@ std::vector<std::array<double, 3>> CubeRows(const std::string& text) {
   return rows;
 }
 
-TEST_F(ToolTest, LutInfoShowsSizeTitleAndDomain) {
-  WriteText("grade.CUBE", CubeText(5, "# made by hand\nTITLE \"Warm\"\nDOMAIN_MIN 0.5 0.5 0.5\n"));
-  const Outcome r = Run("lut info grade.CUBE");
-  ASSERT_EQ(r.exitCode, 0) << r.err;
-  EXPECT_NE(r.out.find("size:    5 points per axis"), npos) << r.out;
-  EXPECT_NE(r.out.find("title:   Warm\n"), npos) << r.out;
-  EXPECT_NE(r.out.find("domain:  0.5 0.5 0.5 .. 1 1 1"), npos) << r.out;
-}
-
 // A refused file names the status, its meaning and the physical line where the plug-in's reader
 // stopped, counting the comments and blank lines it skipped; the variety of failures is the LUT
 // file tests' business.
-TEST_F(ToolTest, LutInfoSaysWhereAndWhyTheReaderStopped) {
+TEST_F(ToolTest, LutInfoShowsSizeTitleAndDomainOrWhereTheReaderStopped) {
+  WriteText("grade.CUBE", CubeText(5, "# made by hand\nTITLE \"Warm\"\nDOMAIN_MIN 0.5 0.5 0.5\n"));
+  const Outcome r = Run("lut info grade.CUBE");
+  ASSERT_EQ(r.exitCode, 0) << r.err;
+  for (const char* line :
+       {"size:    5 points per axis", "title:   Warm\n", "domain:  0.5 0.5 0.5 .. 1 1 1"}) {
+    EXPECT_NE(r.out.find(line), npos) << r.out;
+  }
   WriteText("big.cube", CubeText(65, "# 65 points\n\n"));
-  const Outcome r = Run("lut info big.cube");
-  EXPECT_EQ(r.exitCode, 1);
-  EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
+  const Outcome big = Run("lut info big.cube");
+  EXPECT_EQ(big.exitCode, 1);
+  EXPECT_EQ(std::count(big.err.begin(), big.err.end(), '\n'), 1) << big.err;
   for (const char* cause :
        {"big.cube, line 3 (\"LUT_3D_SIZE 65\"): status 23, the size is missing or outside 2..64",
         "tessarofx lut convert big.cube OUT.cube --size 64"}) {
-    EXPECT_NE(r.err.find(cause), npos) << r.err;
+    EXPECT_NE(big.err.find(cause), npos) << big.err;
   }
 }
 
@@ -520,101 +507,54 @@ TEST_F(ToolTest, LutConvertResamplesATableTooBigForThePlugin) {
   }
 }
 
-TEST_F(ToolTest, LutConvertTurnsA3dlFileIntoACube) {
+TEST_F(ToolTest, LutConvertTurnsA3dlFileIntoACubeAndKeepsTheDomainScaling) {
   // 17 points with a 10-bit input range; every ".3DL" output is taken as 12-bit. Blue changes
   // fastest, and the table is the channel rotation.
   std::ostringstream text;
   text << "3DMESH\nMesh 4 12\n";
   for (int i = 0; i < 17; ++i) text << (i == 16 ? 1023 : i * 64) << (i == 16 ? "\n" : " ");
+  const auto level = [](size_t i) { return std::lround(double(i) * 4095 / 16.0); };
   for (int r = 0; r < 17; ++r) {
     for (int g = 0; g < 17; ++g) {
-      for (int b = 0; b < 17; ++b) {
-        text << std::lround(g * 4095 / 16.0) << " " << std::lround(b * 4095 / 16.0) << " "
-             << std::lround(r * 4095 / 16.0) << "\n";
-      }
+      for (int b = 0; b < 17; ++b) text << level(g) << " " << level(b) << " " << level(r) << "\n";
     }
   }
   WriteText("look.3DL", text.str());
   const Outcome r = Run("lut convert look.3DL look.cube");
   ASSERT_EQ(r.exitCode, 0) << r.err;
-  const std::vector<std::array<double, 3>> rows = CubeRows(Slurp(Path("look.cube")));
+  std::vector<std::array<double, 3>> rows = CubeRows(Slurp(Path("look.cube")));
   ASSERT_EQ(rows.size(), 17u * 17 * 17);
   for (size_t at = 0; at < rows.size(); at += 97) {  // red fastest now
     SCOPED_TRACE(at);
-    EXPECT_NEAR(rows[at][0], std::lround(at / 17 % 17 * 4095 / 16.0) / 4095.0, 1e-7);
-    EXPECT_NEAR(rows[at][1], std::lround(at / 289 * 4095 / 16.0) / 4095.0, 1e-7);
-    EXPECT_NEAR(rows[at][2], std::lround(at % 17 * 4095 / 16.0) / 4095.0, 1e-7);
+    EXPECT_NEAR(rows[at][0], level(at / 17 % 17) / 4095.0, 1e-7);
+    EXPECT_NEAR(rows[at][1], level(at / 289) / 4095.0, 1e-7);
+    EXPECT_NEAR(rows[at][2], level(at % 17) / 4095.0, 1e-7);
   }
-}
 
-TEST_F(ToolTest, LutConvertKeepsThePluginsDomainScaling) {
   // The plug-in multiplies by the domain's width and does not subtract its minimum; the
   // converted table means the same, now over the plain domain.
   WriteText("half.cube", CubeText(3, "DOMAIN_MIN 0.5 0.5 0.5\n"));
   ASSERT_EQ(Run("lut convert half.cube plain.cube").exitCode, 0);
-  const std::vector<std::array<double, 3>> rows = CubeRows(Slurp(Path("plain.cube")));
+  rows = CubeRows(Slurp(Path("plain.cube")));
   ASSERT_EQ(rows.size(), 27u);
   EXPECT_EQ(rows[26], (std::array<double, 3>{0.5, 0.5, 0.5}));
   EXPECT_EQ(rows[1], (std::array<double, 3>{0.25, 0, 0}));
 }
 
-// Refusals name the cause (with the physical line for parse errors) and leave no output behind.
-TEST_F(ToolTest, LutCommandsRefuseWithoutWritingAnything) {
-  WriteText("big.cube", CubeText(65));
-  WriteText("bad.cube", "# c\n\nLUT_3D_SIZE 70\nTITLE \"a\"\n\nTITLE \"b\"\n");
-  WriteText("grade.lut", "LUT_3D_SIZE 2\n");
-  WriteText("out.cube", "previous");
-  const struct {
-    std::string args;
-    std::string cause;
-  } cases[] = {
-      {"lut convert big.cube out.cube",
-       "big.cube: 65 points per axis, more than the plug-in's 64: "
-       "pass --size 64 (or smaller)"},
-      {"lut convert big.cube out.cube --size 65", "bad --size '65': a whole number from 2 to 64"},
-      {"lut convert big.cube out.png --size 8", "lut convert writes .cube files"},
-      {"lut convert bad.cube out.cube --size 8",
-       "bad.cube, line 6 (\"TITLE \\\"b\\\"\"): status 20, unknown or repeated keyword"},
-      {"lut info grade.lut", "grade.lut: not a .cube or .3dl file"},
-      {"lut convert none.cube out.cube", "none.cube: cannot be opened"},
-      {"lut convert big.cube", "lut convert takes IN and OUT"},
-      {"lut bake -f VignetteAdjust out.cube",
-       "'VignetteAdjust' cannot be baked into a table (bakeable: ColorAdjust, LightAdjust, "
-       "WhiteBalanceAdjust)"},
-      {"lut bake -f LightAdjust -p u_glow=1 out.cube",
-       "LightAdjust has no parameter 'u_glow' (valid: u_highLight, u_shadow, u_whiteLevel, "
-       "u_blackLevel)"},
-      {"lut bake -p u_exposure=1 out.cube", "-p u_exposure=1 needs a -f FILTER before it"},
-      {"lut bake -f ColorAdjust -p u_contrast=300 out.cube", "-100..100"},
-      {"lut bake -f ColorAdjust -p u_sat=lots out.cube", "not a number"},
-      {"lut bake --size 1 out.cube", "bad --size '1'"},
-      {"lut bake -f ColorAdjust out.png", "lut bake writes .cube files"},
-      {"lut frobnicate", "unknown lut subcommand 'frobnicate'"},
-  };
-  const std::vector<std::string> before = Listing();
-  for (const auto& c : cases) ExpectRefused(c.args, c.cause, before);
-  EXPECT_EQ(Slurp(Path("out.cube")), "previous");
-}
-
-TEST_F(ToolTest, LutBakeOfExposureAppliesLikeTheFilter) {
+TEST_F(ToolTest, LutBakeAppliesLikeTheFiltersItBakes) {
   WriteInput("in.png", 33, 21);
   ASSERT_EQ(Run("lut bake -f ColorAdjust -p u_exposure=20 exposure.cube").exitCode, 0);
   EXPECT_EQ(CubeRows(Slurp(Path("exposure.cube"))).size(), 33u * 33 * 33);  // the default size
-  const Outcome baked =
-      Run("apply ColorLut3dAdjust -p lut3dPath=" + Path("exposure.cube") + " in.png baked.png");
-  ASSERT_EQ(baked.exitCode, 0) << baked.err;
+  const std::string lut = "apply ColorLut3dAdjust -p lut3dPath=";
+  ASSERT_EQ(Run(lut + Path("exposure.cube") + " in.png baked.png").exitCode, 0);
   ASSERT_EQ(Run("apply ColorAdjust -p u_exposure=20 in.png direct.png").exitCode, 0);
   // One level: the filter truncates where doLUT rounds, and the table is exact between its
   // points for a per-channel gain except in the cell where the gain clips at 255, where it
   // draws a line under the knee (less than a level).
-  const cv::Mat in = Read("in.png"), a = Read("baked.png"), b = Read("direct.png");
-  ASSERT_EQ(a.size(), in.size());
-  EXPECT_LE(cv::norm(a, b, cv::NORM_INF), 1);
-  EXPECT_GT(cv::norm(a, in, cv::NORM_INF), 5);
-}
+  ASSERT_EQ(Read("baked.png").size(), Read("in.png").size());
+  EXPECT_LE(cv::norm(Read("baked.png"), Read("direct.png"), cv::NORM_INF), 1);
+  EXPECT_GT(cv::norm(Read("baked.png"), Read("in.png"), cv::NORM_INF), 5);
 
-TEST_F(ToolTest, LutBakeOfAChainStaysCloseToTheFiltersInTurn) {
-  WriteInput("in.png", 33, 21);
   const std::string steps[] = {
       "ColorAdjust -p u_contrast=30 -p u_vib=40",
       "LightAdjust -p u_highLight=-40 -p u_shadow=50 -p u_whiteLevel=20 -p u_blackLevel=-20",
@@ -622,31 +562,21 @@ TEST_F(ToolTest, LutBakeOfAChainStaysCloseToTheFiltersInTurn) {
   std::string bake = "lut bake", last = "in.png";
   for (const std::string& step : steps) {
     bake += " -f " + step;
-    const std::string next = "after-" + last;
-    ASSERT_EQ(Run("apply " + step + " " + last + " " + next).exitCode, 0) << step;
-    last = next;
+    ASSERT_EQ(Run("apply " + step + " " + last + " after-" + last).exitCode, 0) << step;
+    last = "after-" + last;
   }
   const Outcome r = Run(bake + " --size 17 chain.cube");
   ASSERT_EQ(r.exitCode, 0) << r.err;
-  ASSERT_EQ(Run("apply ColorLut3dAdjust -p lut3dPath=" + Path("chain.cube") + " in.png baked.png")
-                .exitCode,
-            0);
+  ASSERT_EQ(Run(lut + Path("chain.cube") + " in.png chain.png").exitCode, 0);
   // The filters truncate after every operation and the baked table does not: over every colour
   // that is up to 13 levels, 2.4 on average, with interpolation adding at most 11 at size 17.
-  const cv::Mat a = Read("baked.png"), b = Read(last);
+  const cv::Mat a = Read("chain.png"), b = Read(last);
   ASSERT_EQ(a.size(), b.size());
   EXPECT_LE(cv::norm(a, b, cv::NORM_INF), 24);
   EXPECT_LE(cv::norm(a, b, cv::NORM_L1) / (3.0 * a.total()), 3.0);
 }
 
-std::vector<NLEOpenCLDeviceInfo> OpenCLDevices() {
-  uint32_t count = 0;
-  NLECommon::ListOpenCLDevices(nullptr, 0, &count);
-  std::vector<NLEOpenCLDeviceInfo> devices(count);
-  NLECommon::ListOpenCLDevices(devices.data(), count, &count);
-  devices.resize(std::min<size_t>(count, devices.size()));
-  return devices;
-}
+using tfx_test::OpenCLDevices;
 
 #define SKIP_WITHOUT_OPENCL()                                                    \
   if (OpenCLDevices().empty()) {                                                 \
@@ -716,8 +646,9 @@ TEST_F(ToolTest, DevicesListsEveryDeviceAndMarksTheDefaultChoice) {
 
 TEST_F(ToolTest, ApplyOpenCLAgreesWithTheCpuClass) {
   SKIP_WITHOUT_OPENCL();
-  // Some pixels fully transparent, which lutAToWhiteEffect fills; 33 columns leave a ragged
-  // edge for any vector width a runtime picks.
+  // The option's plumbing: the classes' agreement over many settings is the OpenCL effect tests'
+  // business. Some pixels fully transparent, which lutAToWhiteEffect fills; 33 columns leave a
+  // ragged edge for any vector width a runtime picks.
   WriteInput("in.png", 33, 7);
   cv::Mat in = Read("in.png");
   in.forEach<cv::Vec4b>([](cv::Vec4b& p, const int* at) {
@@ -730,7 +661,6 @@ TEST_F(ToolTest, ApplyOpenCLAgreesWithTheCpuClass) {
   } cases[] = {
       {"lutAToWhiteEffect", 0},
       {"WhiteBalanceAdjust -p u_temperature=40 -p u_tint=-20", 1},
-      {"WhiteBalanceAdjust -p u_temperature=-100 -p u_tint=100", 1},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.args);
@@ -743,30 +673,6 @@ TEST_F(ToolTest, ApplyOpenCLAgreesWithTheCpuClass) {
     EXPECT_LE(cv::norm(a, b, cv::NORM_INF), c.tolerance);
     EXPECT_NE(cv::norm(b, in, cv::NORM_INF), 0) << "the case proves nothing";
   }
-}
-
-// Mistakes the tool can see whatever the machine has: one line, exit 1, nothing written.
-TEST_F(ToolTest, ApplyOpenCLRefusesOptionsThatDoNotFit) {
-  WriteInput("in.png");
-  const struct {
-    const char* args;
-    const char* cause;
-  } cases[] = {
-      {"apply --opencl ColorAdjust in.png out.png",
-       "ColorAdjust has no OpenCL class; see tessarofx list"},
-      {"apply --opencl -f ColorAdjust -f LightAdjust in.png out.png",
-       "none of the chain's filters has an OpenCL class"},
-      {"apply --device 0 WhiteBalanceAdjust in.png out.png", "--device only goes with --opencl"},
-      {"apply --kernels . WhiteBalanceAdjust in.png out.png", "--kernels only goes with --opencl"},
-      {"apply --opencl -b in.png WhiteBalanceAdjust in.png out.png",
-       "--background does not go with --opencl"},
-      {"apply --opencl --device gpu WhiteBalanceAdjust in.png out.png", "bad --device 'gpu'"},
-      {"apply --opencl --device -2 WhiteBalanceAdjust in.png out.png", "bad --device '-2'"},
-  };
-  const std::vector<std::string> before = Listing();
-  for (const auto& c : cases) ExpectRefused(c.args, c.cause, before);
-  ExpectRefused("apply --opencl WhiteBalanceAdjust in.png out.png", "no OpenCL device", before,
-                "OCL_ICD_VENDORS=" + Path("no-such-dir"));
 }
 
 TEST_F(ToolTest, ApplyOpenCLNamesTheDeviceOrProgramThatFailed) {
