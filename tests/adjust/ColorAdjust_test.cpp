@@ -304,22 +304,6 @@ TEST(ColorAdjust, ToneAdjustEqualsTheThreeCurvesInTurn) {
   }
 }
 
-TEST(ColorAdjust, LeavesImageUntouchedAtZeroStrengthOrWithoutPixels) {
-  const Image image = NoiseImage(9, 4, 24, IPF_BGR, 36, 3);
-  const Image original = Clone(*image);
-  CxImage empty;
-  uint8_t* none = nullptr;
-  CxImage headerOnly(&none, 8, 8, 32, 32, IPF_BGRA);
-  for (const Operation* op : kOperations) {
-    SCOPED_TRACE(op->name);
-    EXPECT_EQ(op->exported(image.get(), 0.0f), image.get());
-    EXPECT_TRUE(SameBuffer(*original, *image));
-    EXPECT_EQ(op->exported(nullptr, 50.0f), nullptr);
-    EXPECT_EQ(op->exported(&empty, 50.0f), &empty);
-    EXPECT_EQ(op->exported(&headerOnly, 50.0f), &headerOnly);
-  }
-}
-
 TEST(ColorAdjust, FollowsTheCurvesAtTheirLandmarks) {
   const struct {
     const Operation* op;

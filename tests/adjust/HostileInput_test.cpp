@@ -3,12 +3,19 @@
 #include <gtest/gtest.h>
 
 #include <climits>
+#include <cmath>
 #include <cstdint>
+#include <functional>
+#include <limits>
 #include <memory>
 #include <vector>
 
+#include "adjust/LightAdjustTables.h"
+#include "support/ImageBuilders.h"
 #include "tessarofx/ColorAdjust.h"
 #include "tessarofx/CxImage.h"
+#include "tessarofx/Denoise.h"
+#include "tessarofx/DetailFilters.h"
 #include "tessarofx/HSLAdjust.h"
 #include "tessarofx/HueAdjust.h"
 #include "tessarofx/LensAdjust.h"
@@ -17,6 +24,11 @@
 #include "tessarofx/WhiteBalance.h"
 
 namespace {
+
+using tfx_test::Clone;
+using tfx_test::Image;
+using tfx_test::NoiseImage;
+using tfx_test::SameBuffer;
 
 TEST(CxImageCreate, RefusesSizesWhoseBytesDoNotFit32Bits) {
   // Each of these wrapped to a small buffer in 32-bit arithmetic; 16384 x 65536 x 32 bits is
@@ -115,53 +127,113 @@ TEST(CxImageWrapping, NeverGrowsPastTheCallersBuffer) {
   EXPECT_EQ(r.GetWidth(), 0u);
 }
 
-TEST(AdjustFunctions, LeaveInconsistentHeadersUntouched) {
+// Every image function, at a strength that changes pixels and at the settings that change
+// nothing. The 8- and 16-bit layouts are only refused by the functions that need three colour
+// bytes in four.
+struct Function {
+  const char* name;
+  std::function<CxImage*(CxImage*, float)> run;
+  float strength;
+  std::vector<float> idle;
+  bool fourBytes = false;
+};
+
+std::vector<Function> Functions() {
+  const float nan = std::nanf(""), inf = std::numeric_limits<float>::infinity();
+  const std::vector<float> zero = {0}, any = {0, -0.0f, nan, inf, -inf};
+  return {
+      {"exposure", exposureAdjustment, 50, zero},
+      {"brightness", brightnessAdjustment, 50, zero},
+      {"contrast", contrastAdjustment, 50, zero},
+      {"vibrance", vibranceAdjustment, 50, zero},
+      {"saturation", saturationAdjustment, 50, zero},
+      {"highlight", hdrHighlight, 50, zero},
+      {"shadow", hdrShadow, 50, zero},
+      {"white level", hdrWhiteLevel, 50, zero},
+      {"black level", hdrBlackLevel, 50, zero},
+      {"light", [](CxImage* i, float s) { return tfx::LightAdjust(i, s, s, s, s); }, 10, zero},
+      // Negative v puts the threshold on the top sum, above which nothing lies.
+      {"balance", whiteBalanceAdjustment, 50, {0, -20}},
+      {"temperature",
+       [](CxImage* i, float t) { return temperatureAdjustment(i, long(t)); },
+       5000,
+       {11500}},
+      {"tint", tintAdjustment, 50, zero},
+      // Without amount and exposure the shape settings change nothing.
+      {"vignette",
+       [](CxImage* i, float s) { return vignetteAdjustFilter(i, s, 80, 90, 10, 50, s); }, -50,
+       zero},
+      {"hue", hueAdjustment, 90, {0, nan, inf}},
+      {"distortion", distortFilter, 30, zero},
+      {"fringing", fringingFilter, 30, zero},
+      // Zero hue, sat and light: a no-op whatever the shapes.
+      {"hsl",
+       [](CxImage* i, float s) {
+         HSLBands bands{};
+         for (HSLBandValues& v : bands.band) v = {s, 0, 0, 70, -90};
+         return hslAdjustment(i, bands);
+       },
+       50, zero},
+      {"dehaze", dehaze, 60, any, true},
+      {"sharpen", sharpen, 60, any, true},
+      // Clarity blurs only for 2 < |amount| < 254; without a blur the values stay.
+      {"clarity", clarity, 60, {0, -0.0f, nan, inf, -inf, 1, -1, 2, -2, 254, 300}, true},
+      {"diffuse", diffuse, 60, any, true},
+      {"grain", [](CxImage* i, float a) { return addNoiseFilter(i, a, 80.0f); }, 60, any, true},
+      {"grain factor", [](CxImage* i, float f) { return addNoiseFilter(i, 50.0f, f); }, 80, zero,
+       true},
+      {"denoise", deNoiseRGB, 50, zero, true},
+      {"denoise, lightness", deNoiseLumiance, 50, zero, true},
+  };
+}
+
+TEST(ImageFunctions, LeaveImagesAloneAtIdleSettings) {
+  const Image original = NoiseImage(9, 4, 32, IPF_BGRA, 40, 3);
+  for (const Function& f : Functions()) {
+    for (const float idle : f.idle) {
+      SCOPED_TRACE(testing::Message() << f.name << " " << idle);
+      const Image image = Clone(*original);
+      EXPECT_EQ(f.run(image.get(), idle), image.get());
+      EXPECT_TRUE(SameBuffer(*original, *image));
+    }
+  }
+}
+
+TEST(ImageFunctions, LeaveMissingPixelsAndInconsistentHeadersUntouched) {
   const struct {
     const char* name;
     unsigned width, height, bpp, effWidth;
     _ImagePixelFormat format;
+    bool fourBytesOnly = false;
   } headers[] = {
       {"32-bit rows longer than the stride", 8, 4, 32, 16, IPF_BGRA},
       {"24-bit rows longer than the stride", 8, 4, 24, 16, IPF_BGR},
       {"size wrapped to 128 bytes", 16, (1u << 26) + 2, 32, 64, IPF_BGRA},
+      {"size wrapped to 0", 16384, 65536, 32, 65536, IPF_BGRA},
       {"5-byte pixels", 4, 4, 40, 20, IPF_BGRA},
+      {"no columns", 0, 4, 32, 16, IPF_BGRA},
+      {"grey", 8, 8, 8, 8, IPF_Gray8, true},
+      {"16-bit pixels", 4, 8, 16, 8, IPF_BGR, true},
   };
-  HSLBands bands{};
-  bands.band[kHSLRed].hue = 50.0f;
-  const struct {
-    const char* name;
-    CxImage* (*run)(CxImage*);
-  } functions[] = {
-      {"exposure", [](CxImage* i) { return exposureAdjustment(i, 50.0f); }},
-      {"brightness", [](CxImage* i) { return brightnessAdjustment(i, 50.0f); }},
-      {"contrast", [](CxImage* i) { return contrastAdjustment(i, 50.0f); }},
-      {"vibrance", [](CxImage* i) { return vibranceAdjustment(i, 50.0f); }},
-      {"saturation", [](CxImage* i) { return saturationAdjustment(i, 50.0f); }},
-      {"highlight", [](CxImage* i) { return hdrHighlight(i, 50.0f); }},
-      {"shadow", [](CxImage* i) { return hdrShadow(i, 50.0f); }},
-      {"white level", [](CxImage* i) { return hdrWhiteLevel(i, 50.0f); }},
-      {"black level", [](CxImage* i) { return hdrBlackLevel(i, 50.0f); }},
-      {"balance", [](CxImage* i) { return whiteBalanceAdjustment(i, 50.0f); }},
-      {"temperature", [](CxImage* i) { return temperatureAdjustment(i, 5000); }},
-      {"tint", [](CxImage* i) { return tintAdjustment(i, 50.0f); }},
-      {"vignette", [](CxImage* i) { return vignetteAdjustFilter(i, -50, 50, 50, 20, 0, 30); }},
-      {"hue", [](CxImage* i) { return hueAdjustment(i, 90.0f); }},
-      {"distortion", [](CxImage* i) { return distortFilter(i, 30.0f); }},
-      {"fringing", [](CxImage* i) { return fringingFilter(i, 30.0f); }},
-  };
-  for (const auto& h : headers) {
-    std::vector<uint8_t> buffer = Patterned(512);
-    const std::vector<uint8_t> original = buffer;
-    uint8_t* bits = buffer.data();
-    CxImage image(&bits, h.width, h.height, h.bpp, h.effWidth, h.format);
-    for (const auto& f : functions) {
-      SCOPED_TRACE(testing::Message() << f.name << ", " << h.name);
-      EXPECT_EQ(f.run(&image), &image);
+  CxImage empty;
+  uint8_t* none = nullptr;
+  CxImage headerOnly(&none, 8, 8, 32, 32, IPF_BGRA);
+  for (const Function& f : Functions()) {
+    SCOPED_TRACE(f.name);
+    EXPECT_EQ(f.run(nullptr, f.strength), nullptr);
+    EXPECT_EQ(f.run(&empty, f.strength), &empty);
+    EXPECT_EQ(f.run(&headerOnly, f.strength), &headerOnly);
+    for (const auto& h : headers) {
+      if (h.fourBytesOnly && !f.fourBytes) continue;
+      SCOPED_TRACE(h.name);
+      std::vector<uint8_t> buffer = Patterned(512);
+      const std::vector<uint8_t> original = buffer;
+      uint8_t* bits = buffer.data();
+      CxImage image(&bits, h.width, h.height, h.bpp, h.effWidth, h.format);
+      EXPECT_EQ(f.run(&image, f.strength), &image);
+      EXPECT_EQ(image.GetBits(), buffer.data());
       ASSERT_EQ(buffer, original);
     }
-    SCOPED_TRACE(testing::Message() << "hsl, " << h.name);
-    EXPECT_EQ(hslAdjustment(&image, bands), &image);
-    ASSERT_EQ(buffer, original);
   }
 }
 

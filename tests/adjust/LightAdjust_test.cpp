@@ -116,25 +116,6 @@ TEST(LightAdjust, MatchesReferenceOnPaddedRowsAndOtherLayouts) {
   }
 }
 
-TEST(LightAdjust, LeavesImageUntouchedAtZeroStrengthOrWithoutPixels) {
-  const Image image = NoiseImage(9, 4, 32, IPF_BGRA, 36, 3);
-  const Image original = Clone(*image);
-  CxImage empty;
-  uint8_t* none = nullptr;
-  CxImage headerOnly(&none, 8, 8, 32, 32, IPF_BGRA);
-  for (const Operation* op : kOperations) {
-    SCOPED_TRACE(op->name);
-    EXPECT_EQ(op->exported(image.get(), 0.0f), image.get());
-    EXPECT_EQ(op->exported(nullptr, 50.0f), nullptr);
-    EXPECT_EQ(op->exported(&empty, 50.0f), &empty);
-    EXPECT_EQ(op->exported(&headerOnly, 50.0f), &headerOnly);
-  }
-  EXPECT_EQ(tfx::LightAdjust(image.get(), 0, 0, 0, 0), image.get());
-  EXPECT_TRUE(SameBuffer(*original, *image));
-  EXPECT_EQ(tfx::LightAdjust(nullptr, 10, 10, 10, 10), nullptr);
-  EXPECT_EQ(tfx::LightAdjust(&headerOnly, 10, 10, 10, 10), &headerOnly);
-}
-
 TEST(LightAdjust, ImageFunctionsScaleStrengthAsThePerPixelFormsExpect) {
   // Shadow lifts four times as strongly as it deepens, black level the other way round. Absurd
   // strengths overflow the curve; the tables must still give the per-pixel bytes.

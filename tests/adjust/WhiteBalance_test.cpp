@@ -235,26 +235,6 @@ TEST(WhiteBalance, OtherLayoutsAndPaddedRowsMatchThePerPixelForm) {
   }
 }
 
-TEST(WhiteBalance, NeutralStrengthsAndMissingPixelsChangeNothing) {
-  const Image image = NoiseImage(9, 4, 32, IPF_BGRA, 36, 3);
-  const Image original = Clone(*image);
-  EXPECT_EQ(temperatureAdjustment(image.get(), 11500), image.get());
-  EXPECT_EQ(tintAdjustment(image.get(), 0.0f), image.get());
-  EXPECT_EQ(whiteBalanceAdjustment(image.get(), 0.0f), image.get());
-  // Negative v: the threshold lands on the top sum, above which nothing lies.
-  EXPECT_EQ(whiteBalanceAdjustment(image.get(), -20.0f), image.get());
-  EXPECT_TRUE(SameBuffer(*original, *image));
-
-  CxImage empty;
-  uint8_t* none = nullptr;
-  CxImage headerOnly(&none, 8, 8, 32, 32, IPF_BGRA);
-  for (CxImage* target : {static_cast<CxImage*>(nullptr), &empty, &headerOnly}) {
-    EXPECT_EQ(temperatureAdjustment(target, 3000), target);
-    EXPECT_EQ(tintAdjustment(target, 50.0f), target);
-    EXPECT_EQ(whiteBalanceAdjustment(target, 50.0f), target);
-  }
-}
-
 TEST(WhiteBalance, BalanceCountsFromTheTopSumAndLeavesBlackAlone) {
   std::vector<int> hist(768, 0);
   hist[767] = 2;

@@ -208,34 +208,10 @@ TEST(DetailFilters, MatchTheirDefinitionsOnEveryTarget) {
   });
 }
 
-TEST(DetailFilters, LeaveTheImageAloneWhereTheyDoNothing) {
-  const float nan = std::numeric_limits<float>::quiet_NaN(),
-              inf = std::numeric_limits<float>::infinity();
-  std::vector<std::pair<std::string, std::function<void(CxImage*)>>> cases;
-  for (const Named& f : kFilters) {
-    for (const float s : {0.0f, -0.0f, nan, inf, -inf}) {
-      cases.push_back(
-          {f.name + (" " + std::to_string(s)), [&f, s](CxImage* i) { f.filter(i, s); }});
-    }
-  }
-  // Clarity blurs only for 2 < |amount| < 254; without a blur the values stay.
-  for (const float a : {1.0f, -1.0f, 2.0f, -2.0f, 254.0f, 300.0f}) {
-    cases.push_back({"clarity " + std::to_string(a), [a](CxImage* i) { clarity(i, a); }});
-  }
-  cases.push_back({"grain factor 0", [](CxImage* i) { addNoiseFilter(i, 50.0f, 0.0f); }});
-  for (const auto& [name, run] : cases) {
-    SCOPED_TRACE(name);
-    const Image original = Noise(9, 7, 32, 3);
-    const Image image = tfx_test::Clone(*original);
-    run(image.get());
-    EXPECT_TRUE(SameBuffer(*original, *image));
-  }
-}
-
-TEST(DetailFilters, ReturnImagesTheyCannotWalkUntouched) {
+// Images the walk cannot take have no dark channel (the filters leave them alone).
+TEST(Dehaze, NoDarkChannelForImagesItCannotWalk) {
   std::vector<uint8_t> buffer(64, 0x5a);
   uint8_t* bits = buffer.data();
-  CxImage empty;
   std::unique_ptr<CxImage> cases[] = {
       std::make_unique<CxImage>(&bits, 8u, 8u, 8u, 8u, IPF_Gray8),
       std::make_unique<CxImage>(&bits, 4u, 8u, 16u, 8u, IPF_BGR),
@@ -245,16 +221,8 @@ TEST(DetailFilters, ReturnImagesTheyCannotWalkUntouched) {
       std::make_unique<CxImage>(&bits, 0u, 4u, 32u, 16u, IPF_BGRA),
   };
   for (const auto& image : cases) {
-    for (const Named& f : kFilters) {
-      SCOPED_TRACE(testing::Message() << f.name << ' ' << image->GetWidth() << 'x'
-                                      << image->GetHeight() << " bpp " << image->GetBpp());
-      EXPECT_EQ(f.filter(image.get(), 60.0f), image.get());
-      EXPECT_EQ(f.filter(image.get(), -60.0f), image.get());
-      EXPECT_EQ(f.filter(nullptr, 60.0f), nullptr);
-      EXPECT_EQ(f.filter(&empty, 60.0f), &empty);
-    }
     uint32_t maxRGB = 7, maxDark = 7;
-    EXPECT_EQ(getMinDarkChannel(image.get(), &maxRGB, &maxDark), nullptr);
+    EXPECT_EQ(getMinDarkChannel(image.get(), &maxRGB, &maxDark), nullptr) << image->GetBpp();
     EXPECT_EQ(maxRGB + maxDark, 0u);
   }
   EXPECT_TRUE(std::all_of(buffer.begin(), buffer.end(), [](uint8_t v) { return v == 0x5a; }));
