@@ -3,13 +3,16 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <array>
 #include <cmath>
 #include <cstdint>
 #include <cstring>
+#include <functional>
 #include <iostream>
 #include <limits>
 #include <memory>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include <hwy/targets.h>
@@ -33,19 +36,27 @@ struct Operation {
   void (*reference)(CxImage*, float);
   float typical;  // for the tests that sweep layouts rather than strengths
   // Both signs, the extremes and the points where the formulas change branch. Contrast 1 gives
-  // lo = 0 (compression with d = 255), 100 a stretch, 184 the clamped lo.
+  // lo = 0 (compression with d = 255), 100 a stretch, 183 lo = 127 with d = 1, 184 the clamped
+  // lo (120, d = 15), -255 lo = -50; t infinite (255) or negative (300) puts lo below -127,
+  // where it becomes -120. The smallest darkening, -0.01, is already 1.55 levels.
   std::vector<float> sweep;
 };
 
 const Operation kExposure = {
     "Exposure", tfx::ExposureAdjust, exposureAdjustment, tfx_test::ReferenceExposure,
     70.0f,      {50, -50, 100, -100}};
-const Operation kBrightness = {
-    "Brightness", tfx::BrightnessAdjust,    brightnessAdjustment, tfx_test::ReferenceBrightness,
-    -37.0f,       {100, 33.3f, -0.5f, -100}};
-const Operation kContrast = {
-    "Contrast", tfx::ContrastAdjust,     contrastAdjustment, tfx_test::ReferenceContrast,
-    61.0f,      {1, 100, 184, -60, -255}};
+const Operation kBrightness = {"Brightness",
+                               tfx::BrightnessAdjust,
+                               brightnessAdjustment,
+                               tfx_test::ReferenceBrightness,
+                               -37.0f,
+                               {100, 33.3f, -0.5f, -0.01f, -100}};
+const Operation kContrast = {"Contrast",
+                             tfx::ContrastAdjust,
+                             contrastAdjustment,
+                             tfx_test::ReferenceContrast,
+                             61.0f,
+                             {1, 100, 183, 184, -60, -255, 255, 300}};
 const Operation kVibrance = {
     "Vibrance", tfx::VibranceAdjust, vibranceAdjustment, tfx_test::ReferenceVibrance,
     70.0f,      {100, 37, -100}};
@@ -110,25 +121,19 @@ TEST(ColorAdjustPlan, OnePassEqualsTheFiveOperationsInTurn) {
 
 TEST(ColorAdjustRows, OneSetPerTargetCompiledAndSupported) {
   // Every test that loops over the sets then covers every Highway target this machine runs.
-  std::vector<std::string> expected;
+  std::vector<std::string> expected, names;
   for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
     expected.push_back(hwy::TargetName(target));
   }
-  std::vector<std::string> names;
-  std::string list;
   for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
     names.push_back(rows->name);
-    list += ' ' + names.back();
+    std::cout << (names.size() == 1 ? "[ targets  ] " : " ") << rows->name;
   }
-  std::cout << "[ targets  ]" << list << std::endl;
+  std::cout << std::endl;
   EXPECT_EQ(names, expected);
   ASSERT_FALSE(names.empty());
-  const tfx::ColorAdjustRows& best = tfx::BestColorAdjustRows();
-  const tfx::ColorAdjustRows& first = *tfx::SupportedColorAdjustRows().front();
-  EXPECT_STREQ(best.name, first.name);
-  EXPECT_EQ(best.applyTable, first.applyTable);
-  EXPECT_EQ(best.vibrance, first.vibrance);
-  EXPECT_EQ(best.saturation, first.saturation);
+  EXPECT_STREQ(tfx::BestColorAdjustRows().name, names[0].c_str());
+  EXPECT_EQ(tfx::BestColorAdjustRows().vibrance, tfx::SupportedColorAdjustRows()[0]->vibrance);
 }
 
 tagRGBQUAD VibranceByPixel(tagRGBQUAD c, float strength) {
@@ -178,71 +183,66 @@ TEST(ColorAdjustRows, MatchThePerPixelFormsAtExtremeStrengths) {
   }
 }
 
-TEST(ColorAdjustRows, ScaleChannelsLimitsEachProductLikeTheByteForm) {
-  // Gains of every sign and size, NaN included, each on its own channel; src and dst apart and
-  // the same buffer; counts that leave tails.
+// The table and gain kernels against their byte forms, on every tail length, into another buffer
+// (whose bytes past the pixels stay) and in place. Random tables, unlike the monotonic curves of
+// the operations, catch a lookup that only works for ordered entries; gains of every sign and
+// size, NaN included, each on its own channel.
+TEST(ColorAdjustRows, TableAndGainKernelsMatchTheirByteForms) {
+  using Kernel = std::function<void(const tfx::ColorAdjustRows&, uint8_t*, const uint8_t*, size_t)>;
+  using Pixel = std::function<void(uint8_t*)>;  // the three colour bytes of one pixel
+  std::vector<std::tuple<std::string, Kernel, Pixel>> cases;
   constexpr float kNan = std::numeric_limits<float>::quiet_NaN();
-  const float gains[][3] = {{0.5f, 1.5f, 1.0f},
-                            {2.0f, 0.0f, -0.25f},
-                            {1.2345f, 0.9876f, 3e9f},
-                            {kNan, -kNan, std::numeric_limits<float>::infinity()}};
   const auto byte = [](float v) -> uint8_t {
     if (v < 0.0f) return 0;
     return static_cast<uint8_t>(static_cast<int>(v < 255.0f ? v : 255.0f));
   };
+  for (const std::array<float, 3> gain : {std::array<float, 3>{0.5f, 1.5f, 1.0f},
+                                          {2.0f, 0.0f, -0.25f},
+                                          {1.2345f, 0.9876f, 3e9f},
+                                          {kNan, -kNan, std::numeric_limits<float>::infinity()}}) {
+    cases.emplace_back(
+        "gain " + std::to_string(gain[0]),
+        [gain](const auto& rows, uint8_t* dst, const uint8_t* src, size_t n) {
+          rows.scaleChannels(dst, src, n, gain.data());
+        },
+        [gain, byte](uint8_t* p) {
+          for (int c = 0; c < 3; ++c) p[c] = byte(static_cast<float>(p[c]) * gain[c]);
+        });
+  }
+  for (uint32_t salt = 1; salt <= 4; ++salt) {
+    const std::vector<uint8_t> table = NoiseBytes(256, salt);
+    cases.emplace_back(
+        "table " + std::to_string(salt),
+        [table](const auto& rows, uint8_t* dst, const uint8_t* src, size_t n) {
+          rows.applyTable(dst, src, n, table.data());
+        },
+        [table](uint8_t* p) {
+          for (int c = 0; c < 3; ++c) p[c] = table[p[c]];
+        });
+  }
+  // The brightest table looks up in the row of the largest channel.
+  const std::vector<uint8_t> rowsTable = NoiseBytes(tfx::kBrightestTableBytes, 3);
+  cases.emplace_back(
+      "brightest table",
+      [&](const auto& rows, uint8_t* dst, const uint8_t* src, size_t n) {
+        rows.brightestTable(dst, src, n, rowsTable.data());
+      },
+      [&](uint8_t* p) {
+        const uint8_t* row = &rowsTable[256 * std::max({p[0], p[1], p[2]})];
+        for (int c = 0; c < 3; ++c) p[c] = row[p[c]];
+      });
   for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
-    for (const auto& gain : gains) {
-      for (size_t count : {1, 17, 4099}) {
-        SCOPED_TRACE(testing::Message() << rows->name << " gain " << gain[0] << " count " << count);
-        std::vector<uint8_t> src = NoiseBytes(count * 4, 5), expected = src;
-        for (size_t i = 0; i < expected.size(); ++i) {
-          if (i % 4 != 3) expected[i] = byte(static_cast<float>(expected[i]) * gain[i % 4]);
-        }
-        std::vector<uint8_t> dst(src.size());
-        rows->scaleChannels(dst.data(), src.data(), count, gain);
-        ASSERT_EQ(dst, expected);
-        rows->scaleChannels(src.data(), src.data(), count, gain);
+    for (const auto& [name, kernel, pixel] : cases) {
+      for (size_t count : {0, 1, 7, 8, 15, 16, 17, 33, 300, 4099}) {
+        SCOPED_TRACE(testing::Message() << rows->name << ' ' << name << " count " << count);
+        std::vector<uint8_t> src = NoiseBytes(count * 4 + 8, uint32_t(count)), expected = src;
+        for (size_t i = 0; i < count; ++i) pixel(&expected[4 * i]);
+        std::vector<uint8_t> apart = NoiseBytes(src.size(), 77), expectedApart = apart;
+        std::copy_n(expected.begin(), 4 * count, expectedApart.begin());
+        kernel(*rows, apart.data(), src.data(), count);
+        ASSERT_EQ(apart, expectedApart);
+        kernel(*rows, src.data(), src.data(), count);
         ASSERT_EQ(src, expected);
-      }
-    }
-  }
-}
-
-TEST(ColorAdjustRows, BrightestTableLooksUpInTheRowOfTheLargestChannel) {
-  const std::vector<uint8_t> table = NoiseBytes(tfx::kBrightestTableBytes, 3);
-  for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
-    for (size_t count : {1, 17, 4099}) {
-      SCOPED_TRACE(testing::Message() << rows->name << " count " << count);
-      std::vector<uint8_t> pixels = NoiseBytes(count * 4, 9), expected = pixels;
-      for (size_t i = 0; i < expected.size(); i += 4) {
-        const uint8_t* row =
-            &table[256 * std::max({expected[i], expected[i + 1], expected[i + 2]})];
-        for (size_t c = 0; c < 3; ++c) expected[i + c] = row[expected[i + c]];
-      }
-      std::vector<uint8_t> apart(pixels.size());
-      rows->brightestTable(apart.data(), pixels.data(), count, table.data());
-      ASSERT_EQ(apart, expected);
-      rows->brightestTable(pixels.data(), pixels.data(), count, table.data());
-      ASSERT_EQ(pixels, expected);
-    }
-  }
-}
-
-TEST(ColorAdjustRows, TableKernelsMapColourBytesOnly) {
-  // Random tables, unlike the monotonic curves of the operations, catch a lookup that only
-  // works for ordered entries.
-  for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
-    for (uint32_t salt = 1; salt <= 4; ++salt) {
-      const std::vector<uint8_t> table = NoiseBytes(256, salt);
-      for (size_t count : {0, 1, 7, 8, 15, 16, 17, 33, 300}) {
-        SCOPED_TRACE(testing::Message() << rows->name << " table " << salt << " count " << count);
-        std::vector<uint8_t> pixels = NoiseBytes(count * 4 + 8, salt + 10);
-        std::vector<uint8_t> expected = pixels;
-        for (size_t i = 0; i < count * 4; ++i) {
-          if (i % 4 != 3) expected[i] = table[expected[i]];
-        }
-        rows->applyTable(pixels.data(), pixels.data(), count, table.data());
-        ASSERT_EQ(pixels, expected);
       }
     }
   }
@@ -266,19 +266,11 @@ TEST(ColorAdjust, MatchesReferenceForEveryLayoutWidthAndPaddedStride) {
         }
       }
     }
-    const struct {
-      unsigned bpp, effWidth;
-      _ImagePixelFormat format;
-    } layouts[] = {{24, 40, IPF_BGR},
-                   {24, 40, IPF_RGB},
-                   {32, 56, IPF_RGBA},
-                   {16, 28, IPF_RGB},
-                   {8, 16, IPF_Gray8}};
-    for (const auto& layout : layouts) {
+    for (const tfx_test::Layout& layout : tfx_test::kLayouts) {
       // Narrow pixels give brightness overlapping windows; see the walk test below.
       if (op == &kBrightness && layout.bpp < 24) continue;
-      SCOPED_TRACE(testing::Message() << op->name << ' ' << layout.bpp << " bpp");
-      const Image actual = NoiseImage(13, 5, layout.bpp, layout.format, layout.effWidth, 9);
+      SCOPED_TRACE(testing::Message() << op->name << ' ' << layout.bpp << " bpp " << layout.format);
+      const Image actual = NoiseImage(layout, 13, 5, 12, 9);
       const Image expected = Clone(*actual);
       op->reference(expected.get(), op->typical);
       EXPECT_EQ(op->exported(actual.get(), op->typical), actual.get());
@@ -304,64 +296,11 @@ TEST(ColorAdjust, ToneAdjustEqualsTheThreeCurvesInTurn) {
   }
 }
 
-TEST(ColorAdjust, FollowsTheCurvesAtTheirLandmarks) {
-  const struct {
-    const Operation* op;
-    float strength;
-    int in, out;
-  } cases[] = {
-      // the smallest darkening is already 1.55 levels
-      {&kBrightness, -0.01f, 100, 98},
-      // 183: lo = 127, hi = 128, d = 1
-      {&kContrast, 183, 127, 0},
-      {&kContrast, 183, 128, 255},
-      // 184: lo = 120, hi = 127, d = 15; the ramp tops at 119, then jumps
-      {&kContrast, 184, 120, 0},
-      {&kContrast, 184, 121, 17},
-      {&kContrast, 184, 127, 119},
-      {&kContrast, 184, 128, 255},
-      // -255: lo = -50, d = 155
-      {&kContrast, -255, 0, 50},
-      {&kContrast, -255, 255, 205},
-      // t infinite (255) or negative (300): lo falls below -127 and becomes -120, d = 15
-      {&kContrast, 255, 0, 120},
-      {&kContrast, 300, 255, 135},
-  };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(testing::Message() << c.op->name << ' ' << c.strength << " at " << c.in);
-    const uint8_t v = static_cast<uint8_t>(c.in);
-    CxImage image(1, 1, 32, IPF_BGRA);
-    image.SetPixelColor(0, 0, tagRGBQUAD{v, v, v, 200});
-    c.op->exported(&image, c.strength);
-    const tagRGBQUAD out = image.GetPixelColor(0, 0, true);
-    EXPECT_EQ(out.rgbBlue, c.out);
-    EXPECT_EQ(out.rgbRed, c.out);
-    EXPECT_EQ(out.rgbReserved, 200);
-  }
-}
-
-TEST(ColorAdjust, BrightnessWalksPixelsIgnoringRowPadding) {
-  // 3 x 2 pixels, one 4-byte gap per row: the walk takes 6 consecutive pixels from the first
-  // byte, so the first gap is treated as a pixel and the last real pixel is never reached.
-  std::vector<uint8_t> frame(32, 100);
-  uint8_t* bits = frame.data();
-  CxImage image(&bits, 3, 2, 32, 16, IPF_BGRA);
-  brightnessAdjustment(&image, 100.0f);
-  std::vector<uint8_t> expected(32, 100);
-  for (int i = 0; i < 24; ++i) expected[i] = i % 4 == 3 ? 100 : 200;
-  EXPECT_EQ(frame, expected);
-
-  // 3-byte pixels: 9 bytes and 3 of padding per row; the walk covers the first 18 bytes.
-  std::vector<uint8_t> packed(24, 100);
-  bits = packed.data();
-  CxImage rgb(&bits, 3, 2, 24, 12, IPF_BGR);
-  brightnessAdjustment(&rgb, 100.0f);
-  for (int i = 0; i < 24; ++i) EXPECT_EQ(packed[i], i < 18 ? 200 : 100) << i;
-
-  // One-byte pixels still get three bytes each: the windows overlap, and stop at the buffer's
-  // end instead of running past it.
+TEST(ColorAdjust, BrightnessGivesOneBytePixelsOverlappingWindowsInsideTheBuffer) {
+  // Three bytes for each pixel: the windows overlap, and stop at the buffer's end instead of
+  // running past it.
   std::vector<uint8_t> grey(4, 10);
-  bits = grey.data();
+  uint8_t* bits = grey.data();
   CxImage narrow(&bits, 4, 1, 8, 4, IPF_Gray8);
   brightnessAdjustment(&narrow, 100.0f);
   EXPECT_EQ(grey, (std::vector<uint8_t>{20, 40, 80, 80}));

@@ -26,6 +26,21 @@ std::vector<uint8_t> NoiseBytes(size_t count, uint32_t salt);
 Image NoiseImage(unsigned width, unsigned height, unsigned bpp, _ImagePixelFormat format,
                  unsigned effWidth, uint32_t salt);
 
+// The layouts besides packed BGRA that the image functions take through the accessors.
+struct Layout {
+  unsigned bpp;
+  _ImagePixelFormat format;
+};
+inline constexpr Layout kLayouts[] = {{32, IPF_BGRA}, {32, IPF_RGBA}, {24, IPF_BGR},
+                                      {24, IPF_RGB},  {16, IPF_RGB},  {8, IPF_Gray8}};
+
+// A noise image in `layout` whose rows hold `pad` bytes beyond Create()'s padding to 4.
+inline Image NoiseImage(const Layout& layout, unsigned width, unsigned height, unsigned pad,
+                        uint32_t salt) {
+  return NoiseImage(width, height, layout.bpp, layout.format,
+                    (width * layout.bpp / 8 + 3) / 4 * 4 + pad, salt);
+}
+
 // Every 24-bit colour once, in a 4096-wide BGRA image, with an alpha that varies independently.
 // Sanitizer builds, being many times slower, take every seventh colour.
 const CxImage& EveryColour();
