@@ -182,19 +182,13 @@ TEST(HSLAdjust, MatchesThePerPixelFormulasOnEveryColourAndTarget) {
 TEST(HSLAdjust, MatchesTheFormulasInEveryLayoutWidthAndPadding) {
   // Rows shorter than a vector, tails, padded rows (left alone) and packed frames taken as one
   // run; other layouts go through the accessors.
-  const struct {
-    unsigned bpp;
-    _ImagePixelFormat format;
-  } layouts[] = {{32, IPF_BGRA}, {32, IPF_RGBA}, {24, IPF_BGR},
-                 {24, IPF_RGB},  {16, IPF_RGB},  {8, IPF_Gray8}};
   ForEveryTarget([&] {
-    for (const auto& l : layouts) {
+    for (const tfx_test::Layout& l : tfx_test::kLayouts) {
       for (const unsigned width : {1u, 5u, 17u, 40u}) {
         for (const unsigned pad : {0u, 12u}) {
           SCOPED_TRACE(testing::Message() << l.bpp << " bpp, format " << l.format << ", width "
                                           << width << ", padding " << pad);
-          const unsigned effWidth = (width * l.bpp / 8 + 3) / 4 * 4 + pad;
-          const Image actual = NoiseImage(width, 6, l.bpp, l.format, effWidth, width + pad);
+          const Image actual = NoiseImage(l, width, 6, pad, width + pad);
           const Image expected = Clone(*actual);
           ReferenceHsl(expected.get(), kEveryBand);
           hslAdjustment(actual.get(), kEveryBand);

@@ -78,18 +78,10 @@ TEST(HueAdjust, MatchesTheSequentialFormulaOnEveryColourAndTarget) {
 TEST(HueAdjust, WalksPixelsFromTheFirstByteInEveryLayout) {
   // Padded rows are walked as if packed; narrow pixels give overlapping windows that stop
   // before leaving the buffer.
-  const struct {
-    unsigned width, bpp, effWidth;
-    _ImagePixelFormat format;
-  } layouts[] = {{13, 32, 60, IPF_BGRA},
-                 {13, 32, 52, IPF_RGBA},
-                 {13, 24, 40, IPF_BGR},
-                 {13, 16, 28, IPF_RGB},
-                 {13, 8, 13, IPF_Gray8}};
   ForEveryTarget([&] {
-    for (const auto& l : layouts) {
-      SCOPED_TRACE(l.bpp);
-      const Image actual = NoiseImage(l.width, 5, l.bpp, l.format, l.effWidth, l.bpp);
+    for (const tfx_test::Layout& l : tfx_test::kLayouts) {
+      SCOPED_TRACE(testing::Message() << l.bpp << " bpp " << l.format);
+      const Image actual = NoiseImage(l, 13, 5, 8, l.bpp);
       const Image expected = Clone(*actual);
       ReferenceHue(expected.get(), 65.0f);
       hueAdjustment(actual.get(), 65.0f);

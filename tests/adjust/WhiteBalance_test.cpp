@@ -218,15 +218,10 @@ TEST(WhiteBalance, TemperatureKernelsOfEverySetMatchThePerPixelForm) {
 }
 
 TEST(WhiteBalance, OtherLayoutsAndPaddedRowsMatchThePerPixelForm) {
-  const struct {
-    unsigned bpp, effWidth;
-    _ImagePixelFormat format;
-  } layouts[] = {{32, 76, IPF_BGRA}, {32, 56, IPF_RGBA}, {24, 40, IPF_BGR},
-                 {24, 40, IPF_RGB},  {16, 28, IPF_RGB},  {8, 16, IPF_Gray8}};
-  for (const auto& layout : layouts) {
+  for (const tfx_test::Layout& layout : tfx_test::kLayouts) {
     for (const Operation* op : kOperations) {
-      SCOPED_TRACE(testing::Message() << op->name << ' ' << layout.bpp << " bpp");
-      const Image actual = NoiseImage(13, 5, layout.bpp, layout.format, layout.effWidth, 9);
+      SCOPED_TRACE(testing::Message() << op->name << ' ' << layout.bpp << " bpp " << layout.format);
+      const Image actual = NoiseImage(layout, 13, 5, 12, 9);
       const Image expected = Clone(*actual);
       op->reference(expected.get(), op->typical);
       op->run(actual.get(), op->typical);
@@ -244,11 +239,11 @@ TEST(WhiteBalance, BalanceCountsFromTheTopSumAndLeavesBlackAlone) {
   EXPECT_EQ(calThreshold(hist.data(), 5, 2, 0.2f), 700);
   EXPECT_EQ(calThreshold(hist.data(), 5, 2, 1.0f), 0);
   EXPECT_EQ(calThreshold(nullptr, 5, 2, 0.2f), 0);
-
   CxImage black(6, 3, 32, IPF_BGRA);
   std::memset(black.GetBits(), 0, black.GetSize());
   whiteBalanceAdjustment(&black, 100.0f);
-  for (uint32_t i = 0; i < black.GetSize(); ++i) ASSERT_EQ(black.GetBits()[i], 0);
+  EXPECT_TRUE(std::all_of(black.GetBits(), black.GetBits() + black.GetSize(),
+                          [](uint8_t v) { return v == 0; }));
 }
 
 TEST(WhiteBalance, BlackBodyColoursFollowTheFormulaAndFillTheGradient) {
