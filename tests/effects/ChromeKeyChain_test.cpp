@@ -16,9 +16,9 @@
 namespace {
 
 using tfx_test::CreateEffect;
+using tfx_test::kChromeKey;
+using tfx_test::kCombine;
 using tfx_test::Settings;
-constexpr const wchar_t* kChromeKey = L"DB4BBA18-48FC-4164-B572-E59757B02796";
-constexpr const wchar_t* kCombine = L"41AA934B-757A-4EAD-8F7B-85E2E2952B6A";
 
 NLEComPtr<INLEFrame> FrameOf(const cv::Mat& bgra) {
   TestFrame* frame = new TestFrame(bgra.cols, bgra.rows);

@@ -11,9 +11,9 @@
 namespace {
 
 using tfx_test::CreateEffect;
+using tfx_test::kChromeKey;
 using tfx_test::SetParam;
 using tfx_test::Settings;
-constexpr const wchar_t* kChromeKey = L"DB4BBA18-48FC-4164-B572-E59757B02796";
 
 // B, G, R, A: the screen, skin, a grey, a warm colour with green spill (half the screen's
 // chroma), a grey as bright as the screen with a quarter of its chroma.

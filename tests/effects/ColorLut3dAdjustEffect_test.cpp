@@ -16,8 +16,8 @@ namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
 using tfx_test::CubeText;
 using tfx_test::FillRandom;
+using tfx_test::kLut;
 using tfx_test::Wide;
-constexpr const wchar_t* kColorLut = L"74EB022D-1D73-4D1E-9F70-487C356D46CD";
 
 NLEComPtr<INLEProperties> PathSettings(const std::wstring& path) {
   return tfx_test::TextSettings(L"lut3dPath", path);
@@ -76,7 +76,7 @@ class ColorLut3dAdjustEffect : public ::testing::Test {
 };
 
 TEST_F(ColorLut3dAdjustEffect, AppliesTheFileAndReloadsOnlyWhenThePathTextChanges) {
-  NLEComPtr<INLECGFilter> filter = CreateEffect(kColorLut, PathSettings(Wide(Path("invert.cube"))));
+  NLEComPtr<INLECGFilter> filter = CreateEffect(kLut, PathSettings(Wide(Path("invert.cube"))));
   EXPECT_EQ(Applied(filter.get()), "invert");
   SetPath(filter.get(), Wide(Path("halve.cube")));
   EXPECT_EQ(Applied(filter.get()), "halve");
@@ -96,7 +96,7 @@ TEST_F(ColorLut3dAdjustEffect, AppliesTheFileAndReloadsOnlyWhenThePathTextChange
 TEST_F(ColorLut3dAdjustEffect, RereadsAPathThatTranslationRewritesOnEveryFrame) {
   ASSERT_EQ(setenv("TFX_TEST_LUT_DIR", dir_.path.c_str(), 1), 0);
   NLEComPtr<INLECGFilter> filter =
-      CreateEffect(kColorLut, PathSettings(L"$TFX_TEST_LUT_DIR/halve.cube"));
+      CreateEffect(kLut, PathSettings(L"$TFX_TEST_LUT_DIR/halve.cube"));
   EXPECT_EQ(Applied(filter.get()), "halve");
   dir_.Write("halve.cube", CubeText(2, "", -1, 1));
   EXPECT_EQ(Applied(filter.get()), "invert");
@@ -108,11 +108,11 @@ TEST_F(ColorLut3dAdjustEffect, PassesFramesThroughWhenNoTableApplies) {
   dir_.Write("big.cube", CubeText(65));  // one point more than the lattice holds
   for (const std::string name : {"halve.txt", "missing.cube", "big.cube"}) {
     SCOPED_TRACE(name);
-    NLEComPtr<INLECGFilter> filter = CreateEffect(kColorLut, PathSettings(Wide(Path(name))));
+    NLEComPtr<INLECGFilter> filter = CreateEffect(kLut, PathSettings(Wide(Path(name))));
     EXPECT_EQ(Applied(filter.get()), "copy");
   }
   // A source smaller than the destination gives what it holds and no more.
-  NLEComPtr<INLECGFilter> filter = CreateEffect(kColorLut, PathSettings(Wide(Path("none.cube"))));
+  NLEComPtr<INLECGFilter> filter = CreateEffect(kLut, PathSettings(Wide(Path("none.cube"))));
   std::vector<uint8_t> in, out;
   EXPECT_EQ(Run(filter.get(), &in, &out, 1), NLE_S_OK);
   EXPECT_EQ(std::vector<uint8_t>(out.begin(), out.begin() + 32), in);
@@ -121,7 +121,7 @@ TEST_F(ColorLut3dAdjustEffect, PassesFramesThroughWhenNoTableApplies) {
 
 TEST_F(ColorLut3dAdjustEffect, EmptyPathFailsWithoutWriting) {
   for (NLEComPtr<INLEProperties> settings : {PathSettings(L""), NLEComPtr<INLEProperties>()}) {
-    NLEComPtr<INLECGFilter> filter = CreateEffect(kColorLut, settings.get());
+    NLEComPtr<INLECGFilter> filter = CreateEffect(kLut, settings.get());
     std::vector<uint8_t> in, out;
     EXPECT_EQ(Run(filter.get(), &in, &out), NLE_E_RESOURCE);
     EXPECT_EQ(out, std::vector<uint8_t>(64, 0xEE));

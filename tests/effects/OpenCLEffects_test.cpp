@@ -21,16 +21,12 @@ namespace {
 using tfx_test::Bytes;
 using tfx_test::CompareBytes;
 namespace Key = NLEKey::Filter;
-constexpr const wchar_t* kAToWhite = L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356";
-constexpr const wchar_t* kWhiteBalance = L"39509FB9-39FB-4516-9464-3D891DD61D62";
-constexpr const wchar_t* kLut = L"74EB022D-1D73-4D1E-9F70-487C356D46CD";
-constexpr const wchar_t* kChromeKey = L"DB4BBA18-48FC-4164-B572-E59757B02796";
+using tfx_test::kChromeKey;
+using tfx_test::kLut;
+using tfx_test::kWhiteBalance;
 
 Bytes RandomPixels(int width, int height, unsigned salt) {
-  std::mt19937 rng(salt);
-  Bytes out(static_cast<size_t>(width) * height * 4);
-  for (auto& b : out) b = static_cast<uint8_t>(rng());
-  return out;
+  return tfx_test::NoiseBytes(size_t(width) * height * 4, salt);
 }
 
 Bytes DemoPixels() {
@@ -39,15 +35,6 @@ Bytes DemoPixels() {
 }
 
 class OpenCLEffects : public tfx_test::OpenCLEffectTest {};
-
-TEST_F(OpenCLEffects, AToWhiteMatchesTheCpuClassExactly) {
-  Bytes pixels = RandomPixels(333, 97, 1);
-  for (size_t i = 3; i < pixels.size(); i += 16) pixels[i] = 0;  // every fourth pixel clear
-  NLEComPtr<INLECGFilter> cpu = tfx_test::CreateEffect(kAToWhite, nullptr);
-  NLEComPtr<INLECGFilter> gpu = CreateOnDevice(kAToWhite, nullptr);
-  const Bytes expected = RunOnCpu(cpu.get(), pixels, 333, 97);
-  EXPECT_EQ(RunOnDevice(gpu.get(), pixels, 333, 97), expected);
-}
 
 TEST_F(OpenCLEffects, WhiteBalanceFollowsTheCpuClassWithinALevel) {
   const Bytes pixels = RandomPixels(256, 64, 2);
@@ -76,7 +63,6 @@ TEST_F(OpenCLEffects, WhiteBalanceFollowsTheCpuClassWithinALevel) {
 // above 255, exact halves, NaN, infinities and values outside 32 bits.
 void FillHostileLattice(CubeLut* lut, int n, unsigned salt) {
   lut->generateLUT3DData(n);
-  float* lattice = lut->getLut3DData(nullptr, nullptr, nullptr, nullptr);
   std::mt19937 rng(salt);
   std::uniform_real_distribution<float> value(-300.0f, 600.0f);
   const float specials[] = {std::numeric_limits<float>::quiet_NaN(),
@@ -93,7 +79,7 @@ void FillHostileLattice(CubeLut* lut, int n, unsigned salt) {
   for (int i = 0; i < n; ++i) {
     for (int j = 0; j < n; ++j) {
       for (int k = 0; k < n; ++k) {
-        float* p = lattice + ((i * 64 + j) * 64 + k) * 3;
+        float* p = tfx_test::LatticePoint(*lut, i, j, k);
         for (int c = 0; c < 3; ++c) {
           const uint32_t pick = rng() % 64;
           p[c] = pick < std::size(specials) ? specials[pick]
@@ -201,10 +187,7 @@ TEST_F(OpenCLLutFiles, LutMatchesTheCpuClassOnTheDemoGradeAndPassesUnreadableFil
 
 TEST_F(OpenCLLutFiles, LutFollowsThePathFromFrameToFrame) {
   const std::wstring warm = Write("warm.cube", tfxtool::MakeDemoLut(9));
-  const std::wstring flat = Write("flat.cube", "LUT_3D_SIZE 2\n" + std::string(8, ' ') +
-                                                   "0.5 0.5 0.5\n0.5 0.5 0.5\n0.5 0.5 0.5\n"
-                                                   "0.5 0.5 0.5\n0.5 0.5 0.5\n0.5 0.5 0.5\n"
-                                                   "0.5 0.5 0.5\n0.5 0.5 0.5\n");
+  const std::wstring flat = Write("flat.cube", tfx_test::CubeText(2, "", 0, 0.5));
   NLEComPtr<INLEProperties> settings = tfx_test::TextSettings(L"lut3dPath", warm);
   NLEComPtr<INLECGFilter> gpu = CreateOnDevice(kLut, settings.get());
   NLEComPtr<INLECGFilter> cpu = tfx_test::CreateEffect(kLut, settings.get());

@@ -1,8 +1,5 @@
 #include <gtest/gtest.h>
 
-#include <algorithm>
-#include <iterator>
-
 #include "host/CountedObject.h"
 #include "tessarofx/NLECGFilter.h"
 #include "tessarofx/NLEHost.h"
@@ -66,17 +63,6 @@ TEST(HostFactory, RejectsUnknownClassesInterfacesNullOutputsAndOuterNotAskingFor
   EXPECT_EQ(NLECommon::GetInterface(CLSID_NLEProperties, nullptr, 0, IID_IUnknown, nullptr),
             NLE_E_POINTER);
   EXPECT_EQ(NLECommon::CreateProperties(nullptr), NLE_E_POINTER);
-}
-
-TEST(HostIdentifiers, AreDistinctAndIUnknownHasTheStandardValue) {
-  const IID ids[] = {IID_IUnknown,       IID_INLEProperties,      CLSID_NLEProperties,
-                     IID_INLEFrame,      IID_INLEFrameBuffer,     IID_INLEFrameSurface,
-                     IID_INLECGDevice,   IID_INLECGOpenCLOperate, CLSID_NLEEnviroment,
-                     IID_INLEEnviroment, CLSID_NLEMemoryFrame,    IID_INLEMemoryFrame,
-                     IID_INLECGFilter};
-  for (const IID& id : ids)
-    EXPECT_EQ(std::count(std::begin(ids), std::end(ids), id), 1) << &id - ids;
-  EXPECT_EQ(IID_IUnknown, (IID{0, 0, 0, {0xC0, 0, 0, 0, 0, 0, 0, 0x46}}));
 }
 
 }  // namespace

@@ -7,15 +7,10 @@
 #include <utility>
 #include <vector>
 
+#include "support/EffectHarness.h"
 #include "tessarofx/NLEHost.h"
 
 namespace {
-
-using Lines = std::vector<std::pair<int32_t, std::wstring>>;
-
-void CaptureSink(void* context, int32_t level, const wchar_t* message) {
-  static_cast<Lines*>(context)->emplace_back(level, message);
-}
 
 // Each test gets the logger at its default level with the default sink back afterwards.
 class Logger : public testing::Test {
@@ -29,9 +24,7 @@ class Logger : public testing::Test {
 };
 
 TEST_F(Logger, FormatsMessagesAtOrAboveTheLevelAndDropsTheRest) {
-  Lines got;
-  log_->SetSink(&CaptureSink, &got);
-  log_->SetLevel(kNLELogWarning);
+  tfx_test::LogCapture got(kNLELogWarning);
   EXPECT_FALSE(log_->IsLevelEnabled(kNLELogInfo));
   EXPECT_TRUE(log_->IsLevelEnabled(kNLELogWarning));
   log_->Log(kNLELogInfo, L"dropped");
@@ -42,11 +35,11 @@ TEST_F(Logger, FormatsMessagesAtOrAboveTheLevelAndDropsTheRest) {
   log_->SetLevel(kNLELogOff);
   log_->Log(kNLELogError, L"silenced");
   log_->Log(kNLELogOff, L"silenced too");
-  const Lines expected = {
+  const decltype(got.lines) expected = {
       {kNLELogWarning,
        L"CREATE <PureC> Filter: Vignette  [F0F0F0F0-0000-0000-0000-000000000000, 1]"},
       {kNLELogError, L"<" + longText + L">"}};
-  EXPECT_EQ(got, expected);
+  EXPECT_EQ(got.lines, expected);
 }
 
 TEST_F(Logger, DefaultSinkWritesTaggedUtf8LinesToStderr) {

@@ -10,25 +10,14 @@
 #include <utility>
 #include <vector>
 
-#include "support/ScopedVariable.h"
+#include "support/EffectHarness.h"
+#include "support/OpenCLHarness.h"
 #include "tessarofx/NLEHost.h"
 #include "tessarofx/NLEOpenCL.h"
 
 namespace {
 
-using Lines = std::vector<std::pair<int32_t, std::wstring>>;
-
-void CaptureSink(void* context, int32_t level, const wchar_t* message) {
-  static_cast<Lines*>(context)->emplace_back(level, message);
-}
-
-std::vector<NLEOpenCLDeviceInfo> ListDevices() {
-  uint32_t count = 0;
-  EXPECT_EQ(NLECommon::ListOpenCLDevices(nullptr, 0, &count), NLE_S_OK);
-  std::vector<NLEOpenCLDeviceInfo> devices(count);
-  EXPECT_EQ(NLECommon::ListOpenCLDevices(devices.data(), count, &count), NLE_S_OK);
-  return devices;
-}
+using tfx_test::OpenCLDevices;
 
 std::string NameOf(INLECGDevice* device) {
   wchar_t name[128];
@@ -54,7 +43,7 @@ kernel void copy_words(global const int* src, global int* dst) {
 class OpenCL : public testing::Test {
  protected:
   void SetUp() override {
-    if (ListDevices().empty()) GTEST_SKIP() << "no OpenCL platform or device on this machine";
+    if (OpenCLDevices().empty()) GTEST_SKIP() << "no OpenCL platform or device on this machine";
     ASSERT_EQ(NLECommon::CreateOpenCLDevice(-1, &device_), NLE_S_OK);
     NLEComPtr<INLECGOpenCLOperate> operate;
     ASSERT_EQ(device_.QueryInterface(IID_INLECGOpenCLOperate, &operate), NLE_S_OK);
@@ -111,28 +100,23 @@ TEST_F(OpenCL, ProgramsAreSharedByNameAndBuiltOnce) {
   auto* fresh = static_cast<OPENCL::openclProgramManager*>(otherPrograms);
   EXPECT_EQ(fresh->getOpenCLProgram("tfx_copy"), nullptr);
   // ... where the file is now missing.
-  Lines log;
-  NLEGetDefaultLogger()->SetSink(&CaptureSink, &log);
+  tfx_test::LogCapture log;
   EXPECT_FALSE(fresh->createOpenCLProgram("tfx_copy")->loadProgram(dir.c_str(), 0, 0, 0));
-  NLEGetDefaultLogger()->SetSink(nullptr, nullptr);
-  ASSERT_EQ(log.size(), 1u);
-  EXPECT_NE(log[0].second.find(L"tfx_copy.cl"), std::wstring::npos) << log[0].second.c_str();
+  ASSERT_EQ(log.lines.size(), 1u);
+  EXPECT_NE(log.lines[0].second.find(L"tfx_copy.cl"), std::wstring::npos);
 }
 
 TEST_F(OpenCL, BuildErrorIsLoggedWithTheCompilerLog) {
   OPENCL::openclProgram* program = programs_->createOpenCLProgram("broken");
   ASSERT_NE(program, nullptr);
-  Lines log;
-  NLEGetDefaultLogger()->SetSink(&CaptureSink, &log);
-  const bool built = program->loadProgram(
-      nullptr, nullptr, "kernel void k(global int* p) { p[0] = undeclared_value; }", 0);
-  NLEGetDefaultLogger()->SetSink(nullptr, nullptr);
-  EXPECT_FALSE(built);
+  tfx_test::LogCapture log;
+  EXPECT_FALSE(program->loadProgram(
+      nullptr, nullptr, "kernel void k(global int* p) { p[0] = undeclared_value; }", 0));
   EXPECT_FALSE(program->isLoaded());
   EXPECT_EQ(program->getopenclKernel("k"), nullptr);
-  ASSERT_EQ(log.size(), 1u);
-  EXPECT_EQ(log[0].first, kNLELogError);
-  const std::wstring& message = log[0].second;
+  ASSERT_EQ(log.lines.size(), 1u);
+  EXPECT_EQ(log.lines[0].first, kNLELogError);
+  const std::wstring& message = log.lines[0].second;
   EXPECT_NE(message.find(L"\"broken\""), std::wstring::npos) << message.c_str();
   EXPECT_NE(message.find(L"undeclared_value"), std::wstring::npos) << message.c_str();
 }
@@ -276,7 +260,7 @@ TEST_F(OpenCL, ParameterBlockMemoryNeedsItsContents) {
 }
 
 TEST_F(OpenCL, DeviceIsChosenByIndexOrEnvironment) {
-  const std::vector<NLEOpenCLDeviceInfo> all = ListDevices();
+  const std::vector<NLEOpenCLDeviceInfo> all = OpenCLDevices();
   const int count = static_cast<int>(all.size());
   // Unset: the first GPU, else the first CPU.
   int expected = -1;

@@ -12,8 +12,8 @@
 
 namespace {
 
-constexpr const wchar_t* kChromeKey = L"DB4BBA18-48FC-4164-B572-E59757B02796";
-constexpr const wchar_t* kColorLut = L"74EB022D-1D73-4D1E-9F70-487C356D46CD";
+using tfx_test::kChromeKey;
+using tfx_test::kLut;
 
 TEST(CubeLutInstance, NeverHandsOutOrDestroysAFiltersTable) {
   CubeLut::releaseInstance();
@@ -21,7 +21,7 @@ TEST(CubeLutInstance, NeverHandsOutOrDestroysAFiltersTable) {
   NLEComPtr<INLECGFilter> keyer = tfx_test::CreateEffect(
       kChromeKey, tfx_test::Settings({{L"green", 200}, {L"contrast", 50}, {L"mode", 0}}));
   NLEComPtr<INLECGFilter> lut =
-      tfx_test::CreateEffect(kColorLut, tfx_test::TextSettings(L"lut3dPath", L"/nonexistent.cube"));
+      tfx_test::CreateEffect(kLut, tfx_test::TextSettings(L"lut3dPath", L"/nonexistent.cube"));
   TestFrame* fg = new TestFrame(7, 3, 0, false, 90);
   TestFrame* dst = new TestFrame(7, 3);
   NLEComPtr<INLEFrame> holdFg(fg), holdDst(dst);

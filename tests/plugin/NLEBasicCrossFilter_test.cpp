@@ -12,10 +12,10 @@
 namespace {
 
 using tfx_test::Bytes;
-constexpr const wchar_t* kAToWhite = L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356";
-constexpr const wchar_t* kWhiteBalance = L"39509FB9-39FB-4516-9464-3D891DD61D62";
-constexpr const wchar_t* kLut = L"74EB022D-1D73-4D1E-9F70-487C356D46CD";
-constexpr const wchar_t* kChromeKey = L"DB4BBA18-48FC-4164-B572-E59757B02796";
+using tfx_test::kAToWhite;
+using tfx_test::kChromeKey;
+using tfx_test::kLut;
+using tfx_test::kWhiteBalance;
 
 // Device memory that counts the uploads made into it.
 class CountingMemory final : public OPENCL::openclMemory {
