@@ -29,9 +29,7 @@ struct Lattice {
 
   explicit Lattice(int n) { lut->generateLUT3DData(n); }
 
-  float* Point(int i, int j, int k) {
-    return lut->getLut3DData(nullptr, nullptr, nullptr, nullptr) + ((i * 64 + j) * 64 + k) * 3;
-  }
+  float* Point(int i, int j, int k) { return tfx_test::LatticePoint(*lut, i, j, k); }
 
   // Grey: every point's three components the same value, as in a key mask.
   template <class Value>

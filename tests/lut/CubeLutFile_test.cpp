@@ -13,6 +13,7 @@
 #include <string>
 #include <vector>
 
+#include "support/ImageBuilders.h"
 #include "support/TempDir.h"
 #include "tessarofx/CubeLut.h"
 
@@ -46,9 +47,7 @@ std::unique_ptr<CubeLut> Load(const TempDir& dir, const std::string& name, const
   return lut;
 }
 
-float* Point(CubeLut& lut, int i, int j, int k) {
-  return lut.getLut3DData(nullptr, nullptr, nullptr, nullptr) + ((i * 64 + j) * 64 + k) * 3;
-}
+constexpr auto Point = tfx_test::LatticePoint;
 
 // Whatever a read did, the size is one the lattice holds and the atlas matches it.
 void ExpectBounded(const CubeLut& lut) {

@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include <array>
+#include <climits>
 #include <cmath>
 #include <cstring>
 #include <limits>
@@ -12,16 +13,14 @@
 #include <vector>
 
 #include "lut/CubeLutApply.h"
+#include "support/EffectHarness.h"
 #include "support/EveryTarget.h"
 #include "support/ImageBuilders.h"
 
 namespace {
 
 using tfx_test::ForEveryTarget;
-
-float* Point(CubeLut& lut, int i, int j, int k) {
-  return lut.getLut3DData(nullptr, nullptr, nullptr, nullptr) + ((i * 64 + j) * 64 + k) * 3;
-}
+constexpr auto At = tfx_test::LatticePoint;
 
 std::unique_ptr<CubeLut> Generated(int n) {
   auto lut = std::make_unique<CubeLut>();
@@ -34,8 +33,6 @@ std::vector<uint8_t> Apply(CubeLut& lut, std::vector<uint8_t> pixel) {
   EXPECT_EQ(0, lut.doLUT(pixel.data(), 1, 1, 4, 4));
   return pixel;
 }
-
-int AtlasIndex(int n, int i, int j, int k) { return ((k % 8 + (k / 8 * n + j) * 8) * n + i) * 3; }
 
 TEST(CubeLut, TablesPlaceEveryByteInItsCell) {
   for (const int n : {2, 17, 33, 64}) {
@@ -62,7 +59,7 @@ TEST(CubeLut, GeneratedLatticeDividesBy31WhateverTheSize) {
   EXPECT_EQ((std::vector<uint8_t>{0, 0, 0, 77}), Apply(*two, {0, 0, 0, 77}));
   EXPECT_EQ((std::vector<uint8_t>{8, 8, 8, 77}), Apply(*two, {255, 255, 255, 77}));
   EXPECT_EQ((std::vector<uint8_t>{8, 0, 0, 1}), Apply(*two, {255, 0, 0, 1}));  // blue alone
-  EXPECT_EQ(32.0f * 255.0f / 31.0f, Point(*Generated(33), 32, 1, 0)[0]);       // past 255
+  EXPECT_EQ(32.0f * 255.0f / 31.0f, At(*Generated(33), 32, 1, 0)[0]);          // past 255
 }
 
 // With fr = fg = fb the last case reads C000, C010, C110 and C111. NaN in every other corner
@@ -71,12 +68,11 @@ TEST(CubeLut, EqualFractionsTakeTheLastCase) {
   const float nan = std::numeric_limits<float>::quiet_NaN();
   auto lut = Generated(17);
   for (int x = 0; x < 8; ++x) {
-    for (int ch = 0; ch < 3; ++ch)
-      Point(*lut, 6 + (x & 1), 6 + (x >> 1 & 1), 6 + (x >> 2))[ch] = nan;
+    for (int ch = 0; ch < 3; ++ch) At(*lut, 6 + (x & 1), 6 + (x >> 1 & 1), 6 + (x >> 2))[ch] = nan;
   }
   // C000, C010, C110 and C111 of cell 6, as (red, green, blue) offsets.
   for (const auto& at : {std::array<int, 3>{0, 0, 0}, {0, 1, 0}, {1, 1, 0}, {1, 1, 1}}) {
-    for (int ch = 0; ch < 3; ++ch) Point(*lut, 6 + at[0], 6 + at[1], 6 + at[2])[ch] = 100.0f;
+    for (int ch = 0; ch < 3; ++ch) At(*lut, 6 + at[0], 6 + at[1], 6 + at[2])[ch] = 100.0f;
   }
   ForEveryTarget([&] {
     // 100 is 6.27 cells: every pixel of equal bytes in cell 6 has equal fractions.
@@ -104,7 +100,7 @@ TEST(CubeLut, ResultsAreRoundedCappedAndWrapped) {
   for (const ConversionCase& test : cases) {
     SCOPED_TRACE(test.value);
     // Black reads C000 alone with weight 1; the other corners are finite and weigh 0.
-    float* p = Point(*lut, 0, 0, 0);
+    float* p = At(*lut, 0, 0, 0);
     p[0] = test.value;  // red
     p[1] = 10.0f;
     p[2] = 20.0f;
@@ -119,7 +115,7 @@ TEST(CubeLut, OnlyTheFirstThreeBytesOfEachPixelChange) {
   for (int i = 0; i < 17; ++i) {
     for (int j = 0; j < 17; ++j) {
       for (int k = 0; k < 17; ++k) {
-        float* p = Point(*lut, i, j, k);
+        float* p = At(*lut, i, j, k);
         p[0] = 255.0f - 15.0f * k;
         p[1] = 7.0f * i + 3.0f;
         p[2] = 15.0f * j;
@@ -153,7 +149,6 @@ TEST(CubeLut, OnlyTheFirstThreeBytesOfEachPixelChange) {
 TEST(CubeLut, RefusalsLeaveThePixelsAlone) {
   const std::vector<uint8_t> pixels = tfx_test::NoiseBytes(64 * 4, 5);
   std::vector<uint8_t> work = pixels;
-
   auto fresh = std::make_unique<CubeLut>();
   EXPECT_EQ(1, fresh->getStatus());
   EXPECT_EQ(23, fresh->doLUT(work.data(), 64, 1, 256, 4));
@@ -162,11 +157,7 @@ TEST(CubeLut, RefusalsLeaveThePixelsAlone) {
   fresh->generateLUT3DData(65);
   EXPECT_EQ(0, fresh->getLutSize());
   EXPECT_EQ(23, fresh->doLUT(work.data(), 64, 1, 256, 4));
-  EXPECT_EQ(pixels, work);
-
-  auto lut = Generated(2);
-  EXPECT_EQ(0, lut->doLUT(work.data(), 64, 0, 256, 4));
-  EXPECT_EQ(0, lut->doLUT(work.data(), 64, -3, 256, 4));
+  auto lut = Generated(2);  // maps 255 to 8: every applied pixel would change
   lut->setRowTable(new float[8][3]());
   EXPECT_EQ(0, lut->doLUT(work.data(), 64, 1, 256, 4));
   EXPECT_EQ(pixels, work);
@@ -174,9 +165,33 @@ TEST(CubeLut, RefusalsLeaveThePixelsAlone) {
   EXPECT_EQ(0, lut->doLUT(work.data(), 64, 1, 256, 4));
   EXPECT_NE(pixels, work);
 
+  // Arguments that cannot describe the pixels, given exactly the bytes a sound call would need,
+  // so that any overreach is out of bounds.
+  struct Case {
+    const char* name;
+    bool null;
+    int width, height, pitch, bytesPerPixel;
+  };
+  for (const Case& c : {Case{"null pixels", true, 4, 2, 16, 4},
+                        {"no rows", false, 4, 0, 16, 4},
+                        {"negative height", false, 4, -3, 16, 4},
+                        {"pitch below a row", false, 4, 2, 15, 4},
+                        {"negative short pitch", false, 4, 2, -8, 4},
+                        {"zero width", false, 0, 2, 16, 4},
+                        {"two bytes a pixel", false, 4, 2, 16, 2},
+                        {"negative width", false, -4, 2, 16, 4},
+                        {"rows past INT_MAX bytes", false, 4, 3, INT_MAX / 2 + 1, 4}}) {
+    SCOPED_TRACE(c.name);
+    std::vector<uint8_t> bytes(32, 255);
+    uint8_t* start = c.pitch < 0 ? bytes.data() + 16 : bytes.data();
+    EXPECT_EQ(lut->doLUT(c.null ? nullptr : start, c.width, c.height, c.pitch, c.bytesPerPixel), 0);
+    EXPECT_EQ(bytes, std::vector<uint8_t>(32, 255));
+  }
+  std::vector<uint8_t> row(12, 255);
+  EXPECT_EQ(lut->doLUT(row.data(), 3, 1, 0, 4), 0);  // one row needs no pitch
+  EXPECT_EQ(row[0], 8);
   // One point per axis: every colour maps to it.
-  auto one = Generated(1);
-  EXPECT_EQ((std::vector<uint8_t>{0, 0, 0, 4}), Apply(*one, {255, 128, 3, 4}));
+  EXPECT_EQ((std::vector<uint8_t>{0, 0, 0, 4}), Apply(*Generated(1), {255, 128, 3, 4}));
 }
 
 TEST(CubeLut, LastConstructedObjectIsTheInstance) {
@@ -203,7 +218,7 @@ TEST(CubeLut, LastConstructedObjectIsTheInstance) {
 
 TEST(CubeLut, CloneCopiesAllButTheRowTable) {
   auto lut = Generated(5);
-  Point(*lut, 4, 3, 2)[1] = -7.25f;
+  At(*lut, 4, 3, 2)[1] = -7.25f;
   lut->updateCalcuatedData(2, 3, 4, CubeLut::PR{1.0f, 2.0f, 3.0f});
   lut->setRowTable(new float[4][3]());
   const std::unique_ptr<CubeLut> copy(lut->clone());
@@ -212,7 +227,7 @@ TEST(CubeLut, CloneCopiesAllButTheRowTable) {
   EXPECT_EQ(5, copy->getLutSize());
   EXPECT_EQ(0, std::memcmp(lut->getFTData(nullptr), copy->getFTData(nullptr), 256 * sizeof(float)));
   EXPECT_EQ(0, std::memcmp(lut->getGTData(nullptr), copy->getGTData(nullptr), 256 * sizeof(int)));
-  EXPECT_EQ(0, std::memcmp(Point(*lut, 0, 0, 0), Point(*copy, 0, 0, 0), 64 * 64 * 64 * 3 * 4));
+  EXPECT_EQ(0, std::memcmp(At(*lut, 0, 0, 0), At(*copy, 0, 0, 0), 64 * 64 * 64 * 3 * 4));
   int bytes = 0, copyBytes = 0;
   const uint8_t* atlas = lut->getAtlasData(&bytes);
   const uint8_t* copyAtlas = copy->getAtlasData(&copyBytes);
@@ -225,58 +240,56 @@ TEST(CubeLut, CloneCopiesAllButTheRowTable) {
   EXPECT_EQ((std::vector<uint8_t>{33, 33, 33, 0}), Apply(*copy, {255, 255, 255, 0}));  // 4*255/31
 }
 
-// Every point's texel holds its value truncated to int and cut to 8 bits.
-void ExpectAtlasMatches(CubeLut& lut) {
-  const int n = lut.getLutSize();
-  int bytes = 0;
-  const uint8_t* atlas = lut.getAtlasData(&bytes);
-  ASSERT_NE(nullptr, atlas);
-  ASSERT_EQ(8 * n * ((n + 7) / 8) * n * 3, bytes);
-  for (int k = 0; k < n; ++k) {
-    for (int j = 0; j < n; ++j) {
-      for (int i = 0; i < n; ++i) {
-        ASSERT_LE(AtlasIndex(n, i, j, k) + 3, bytes);
-        const uint8_t* a = atlas + AtlasIndex(n, i, j, k);
-        for (int c = 0; c < 3; ++c) {
-          ASSERT_EQ(static_cast<uint8_t>(static_cast<int>(Point(lut, i, j, k)[c])), a[c])
-              << i << "," << j << "," << k;
-        }
-      }
-    }
-  }
+TEST(CubeLutInstance, NeverHandsOutOrDestroysAFiltersTable) {
+  CubeLut::releaseInstance();
+  CubeLut* hosts = new CubeLut();  // the host's own, now the instance
+  NLEComPtr<INLECGFilter> keyer = tfx_test::CreateEffect(
+      tfx_test::kChromeKey, tfx_test::Settings({{L"green", 200}, {L"contrast", 50}, {L"mode", 0}}));
+  NLEComPtr<INLECGFilter> lut = tfx_test::CreateEffect(
+      tfx_test::kLut, tfx_test::TextSettings(L"lut3dPath", L"/nonexistent.cube"));
+  // The keyer's mask, then the LUT filter, whose unreadable file passes frames through.
+  const auto run = [&] {
+    const tfx_test::Bytes fg(7 * 3 * 4, 90);
+    EXPECT_EQ(tfx_test::RunFrame(lut.get(), new TestFrame(7, 3, fg), new TestFrame(7, 3)), fg);
+    return tfx_test::RunFrame(keyer.get(), new TestFrame(7, 3, fg), new TestFrame(7, 3));
+  };
+  const tfx_test::Bytes first = run();
+  EXPECT_EQ(CubeLut::getInstance(), hosts);
+  // Releasing whatever is registered, twice, leaves both filters working: under the sanitizers a
+  // filter whose table had been released would read freed memory here.
+  CubeLut::releaseInstance();
+  CubeLut::releaseInstance();
+  EXPECT_EQ(run(), first);
 }
 
-// The atlas is the whole tile image, 8N by ceil(N/8)N texels, so every point has its texel even
-// when N is not a multiple of 8 and the last tile row is part empty.
+// The whole tile image, so every point has its texel even when N is not a multiple of 8 and the
+// last tile row is part empty.
 TEST(CubeLut, AtlasHoldsTheLatticeInTiles) {
-  for (const int n : {2, 8, 17, 32, 33}) {
-    SCOPED_TRACE(n);
-    ExpectAtlasMatches(*Generated(n));
-  }
+  for (const int n : {2, 8, 17, 32, 33}) EXPECT_TRUE(tfx_test::AtlasMatches(*Generated(n))) << n;
   // The first argument is the blue index, the third the red; values keep their low 8 bits.
   auto lut = Generated(17);
   lut->updateCalcuatedData(9, 2, 5, CubeLut::PR{300.9f, -1.5f, 7.0f});
-  const uint8_t* a = lut->getAtlasData(nullptr) + AtlasIndex(17, 5, 2, 9);
+  const uint8_t* a = lut->getAtlasData(nullptr) + ((9 % 8 + (9 / 8 * 17 + 2) * 8) * 17 + 5) * 3;
   EXPECT_EQ(44, a[0]);
   EXPECT_EQ(255, a[1]);
   EXPECT_EQ(7, a[2]);
   // Nothing in the library clears the atlas state, so the atlas is not copied back.
   lut->updateLUT3DData();
-  EXPECT_EQ(5.0f * 255.0f / 31.0f, Point(*lut, 5, 2, 9)[0]);
+  EXPECT_EQ(5.0f * 255.0f / 31.0f, At(*lut, 5, 2, 9)[0]);
 }
 
 // reset() truncates i * 255 / 31 where generateLUT3DData keeps the fraction (8, not 8.2258 for
 // index 1), and the atlas follows, 263 keeping its low 8 bits.
 TEST(CubeLut, ResetWritesTheIntegerPattern) {
   auto lut = Generated(33);
-  Point(*lut, 1, 2, 3)[0] = 99.0f;
+  At(*lut, 1, 2, 3)[0] = 99.0f;
   lut->reset();
   for (int p = 0; p < 33 * 33 * 33; ++p) {
     const int i = p / 33 / 33, j = p / 33 % 33, k = p % 33;
     const float expected[3] = {float(i * 255 / 31), float(j * 255 / 31), float(k * 255 / 31)};
-    ASSERT_EQ(0, std::memcmp(expected, Point(*lut, i, j, k), sizeof expected)) << i << j << k;
+    ASSERT_EQ(0, std::memcmp(expected, At(*lut, i, j, k), sizeof expected)) << i << j << k;
   }
-  ExpectAtlasMatches(*lut);
+  EXPECT_TRUE(tfx_test::AtlasMatches(*lut));
 
   // Without a size there is nothing to reset.
   auto empty = std::make_unique<CubeLut>();

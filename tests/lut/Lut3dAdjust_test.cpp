@@ -13,6 +13,7 @@
 #include <string>
 #include <vector>
 
+#include "support/ImageBuilders.h"
 #include "tessarofx/ColorAdjust.h"
 #include "tessarofx/LightAdjust.h"
 #include "tessarofx/WhiteBalance.h"
@@ -22,9 +23,7 @@ namespace {
 constexpr int kN = 32;
 constexpr int kCap = CubeLut::kMaxSize;
 
-float* Point(CubeLut* lut, int i, int j, int k) {
-  return lut->getLut3DData(nullptr, nullptr, nullptr, nullptr) + ((i * kCap + j) * kCap + k) * 3;
-}
+float* Point(CubeLut* lut, int i, int j, int k) { return tfx_test::LatticePoint(*lut, i, j, k); }
 
 // The identity of size 32 with its points on whole levels (reset() truncates i * 255 / 31), so
 // that an image form, which only takes bytes, can be given exactly each point's colour.
@@ -211,19 +210,7 @@ TEST(Lut3dAdjust, KeepsTheAtlasInStepWithTheLattice) {
   auto lut = std::make_unique<CubeLut>();
   lut->generateLUT3DData(8);
   lut3d_exposureAdjustment(lut3d_saturationAdjustment(lut.get(), 60), 35);
-  int bytes = 0;
-  const uint8_t* atlas = lut->getAtlasData(&bytes);
-  ASSERT_EQ(bytes, 8 * 8 * 8 * 3);
-  for (int k = 0; k < 8; ++k) {
-    for (int j = 0; j < 8; ++j) {
-      for (int i = 0; i < 8; ++i) {
-        // Blue slice k is tile k % 8 of row k / 8; inside it x is red, y green.
-        const uint8_t* a = atlas + ((k % 8 + (k / 8 * 8 + j) * 8) * 8 + i) * 3;
-        const float* p = Point(lut.get(), i, j, k);
-        for (int c = 0; c < 3; ++c) EXPECT_EQ(a[c], static_cast<uint8_t>(p[c]));
-      }
-    }
-  }
+  EXPECT_TRUE(tfx_test::AtlasMatches(*lut));
 }
 
 }  // namespace

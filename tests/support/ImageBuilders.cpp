@@ -82,4 +82,26 @@ std::vector<uint8_t> NoiseBytes(size_t count, uint32_t salt) {
   return bytes;
 }
 
+::testing::AssertionResult AtlasMatches(CubeLut& lut) {
+  const int n = lut.getLutSize();
+  int bytes = 0;
+  const uint8_t* atlas = lut.getAtlasData(&bytes);
+  if (!atlas || bytes != 8 * n * ((n + 7) / 8) * n * 3) {
+    return ::testing::AssertionFailure() << "atlas of " << bytes << " bytes for " << n << " points";
+  }
+  for (int k = 0; k < n; ++k) {
+    for (int j = 0; j < n; ++j) {
+      for (int i = 0; i < n; ++i) {
+        const uint8_t* a = atlas + ((k % 8 + (k / 8 * n + j) * 8) * n + i) * 3;
+        for (int c = 0; c < 3; ++c) {
+          if (a[c] != static_cast<uint8_t>(static_cast<int>(LatticePoint(lut, i, j, k)[c]))) {
+            return ::testing::AssertionFailure() << "texel of point " << i << "," << j << "," << k;
+          }
+        }
+      }
+    }
+  }
+  return ::testing::AssertionSuccess();
+}
+
 }  // namespace tfx_test

@@ -54,4 +54,9 @@ inline float* LatticePoint(CubeLut& lut, int i, int j, int k) {
          ((i * CubeLut::kMaxSize + j) * CubeLut::kMaxSize + k) * 3;
 }
 
+// The atlas is the whole tile image, 8N by ceil(N/8)N texels: blue slice k is tile k % 8 of tile
+// row k / 8, red across and green down in it. Every point's texel holds its value truncated to
+// int and cut to 8 bits.
+::testing::AssertionResult AtlasMatches(CubeLut& lut);
+
 }  // namespace tfx_test
