@@ -20,41 +20,27 @@ using tfx_test::kChromeKey;
 using tfx_test::kCombine;
 using tfx_test::Settings;
 
-NLEComPtr<INLEFrame> FrameOf(const cv::Mat& bgra) {
-  TestFrame* frame = new TestFrame(bgra.cols, bgra.rows);
-  NLEComPtr<INLEFrame> held(frame);
-  std::memcpy(frame->pixels.data(), bgra.data, frame->pixels.size());
-  return held;
-}
-
-cv::Mat MatOf(INLEFrame* frame) {
-  TestFrame* f = static_cast<TestFrame*>(frame);
-  return cv::Mat(f->height, f->width, CV_8UC4, f->pixels.data()).clone();
-}
-
-// One filter over `fg` (and `bg`) into a new frame of the same size.
-cv::Mat RunFilter(INLECGFilter* filter, INLEFrame* fg, INLEFrame* bg = nullptr) {
-  const cv::Mat in = MatOf(fg);
-  NLEComPtr<INLEFrame> dst = FrameOf(cv::Mat(in.size(), CV_8UC4, cv::Scalar::all(0)));
-  filter->SetForeground(fg);
-  filter->SetBackground(bg);
-  EXPECT_EQ(filter->Running(dst.get()), NLE_S_OK);
-  return MatOf(dst.get());
+// One filter over `fg` (and `bg`), BGRA images of one size, into a new image.
+cv::Mat RunFilter(INLECGFilter* filter, const cv::Mat& fg, const cv::Mat* bg = nullptr) {
+  const auto frame = [](const cv::Mat& m) {
+    return new TestFrame(m.cols, m.rows, tfx_test::Bytes(m.data, m.data + m.total() * 4));
+  };
+  tfx_test::Bytes out = tfx_test::RunFrame(filter, frame(fg), new TestFrame(fg.cols, fg.rows),
+                                           bg ? frame(*bg) : nullptr);
+  return cv::Mat(fg.rows, fg.cols, CV_8UC4, out.data()).clone();
 }
 
 cv::Mat Key(const cv::Mat& scene, int red, int green, int blue) {
   auto keyer = [&](double mode) {
-    return CreateEffect(kChromeKey, Settings({{L"red", red},
-                                              {L"green", green},
-                                              {L"blue", blue},
-                                              {L"contrast", 50},
-                                              {L"offset", 0},
-                                              {L"mode", mode}}));
+    return CreateEffect(kChromeKey, Settings(tfx_test::EffectParams{{L"red", red},
+                                                                    {L"green", green},
+                                                                    {L"blue", blue},
+                                                                    {L"contrast", 50},
+                                                                    {L"offset", 0},
+                                                                    {L"mode", mode}}));
   };
-  NLEComPtr<INLEFrame> in = FrameOf(scene);
-  NLEComPtr<INLEFrame> mask = FrameOf(RunFilter(keyer(0).get(), in.get()));
-  NLEComPtr<INLEFrame> colour = FrameOf(RunFilter(keyer(1).get(), in.get()));
-  return RunFilter(CreateEffect(kCombine, nullptr).get(), colour.get(), mask.get());
+  const cv::Mat mask = RunFilter(keyer(0).get(), scene);
+  return RunFilter(CreateEffect(kCombine, nullptr).get(), RunFilter(keyer(1).get(), scene), &mask);
 }
 
 struct Matte {

@@ -20,31 +20,20 @@ using tfx_test::Settings;
 const std::vector<uint8_t> kPixels = {60,  200, 40,  255, 138, 170, 222, 200, 128, 128,
                                       128, 9,   120, 200, 150, 0,   165, 200, 160, 255};
 
-struct Frames {
-  explicit Frames(int dstStride = 0)
-      : fg(new TestFrame(5, 1)), dst(new TestFrame(5, 1, dstStride)), h1(fg), h2(dst) {
-    fg->pixels = kPixels;
-  }
-  TestFrame* fg;
-  TestFrame* dst;
-  NLEComPtr<INLEFrame> h1, h2;
-};
-
 // One frame through the filter; the five output pixels.
 std::vector<uint8_t> RunFrame(INLECGFilter* filter, int dstStride = 0) {
-  Frames f(dstStride);
-  filter->SetForeground(f.fg);
-  EXPECT_EQ(filter->Running(f.dst), NLE_S_OK);
-  return std::vector<uint8_t>(f.dst->pixels.begin(), f.dst->pixels.begin() + 20);
+  const std::vector<uint8_t> out =
+      tfx_test::RunFrame(filter, new TestFrame(5, 1, kPixels), new TestFrame(5, 1, dstStride));
+  return std::vector<uint8_t>(out.begin(), out.begin() + 20);
 }
 
 NLEComPtr<INLECGFilter> GreenKey(double mode) {
-  return CreateEffect(kChromeKey, Settings({{L"red", 40},
-                                            {L"green", 200},
-                                            {L"blue", 60},
-                                            {L"contrast", 50},
-                                            {L"offset", 0},
-                                            {L"mode", mode}}));
+  return CreateEffect(kChromeKey, Settings(tfx_test::EffectParams{{L"red", 40},
+                                                                  {L"green", 200},
+                                                                  {L"blue", 60},
+                                                                  {L"contrast", 50},
+                                                                  {L"offset", 0},
+                                                                  {L"mode", mode}}));
 }
 
 TEST(ChromeKeyLut3dEffect, ModeSelectsMaskOrBeauty) {

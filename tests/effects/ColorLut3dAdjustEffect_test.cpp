@@ -15,7 +15,6 @@ namespace {
 namespace Key = NLEKey::Filter;
 using tfx_test::CreateEffect;
 using tfx_test::CubeText;
-using tfx_test::FillRandom;
 using tfx_test::kLut;
 using tfx_test::Wide;
 
@@ -39,25 +38,19 @@ class ColorLut3dAdjustEffect : public ::testing::Test {
 
   std::string Path(const std::string& name) const { return dir_.Path(name); }
 
-  // One 8x2 frame of noise through the filter into a destination filled with 0xEE. Returns the
-  // result code; the source goes to *in and the output to *out.
-  int Run(INLECGFilter* filter, std::vector<uint8_t>* in, std::vector<uint8_t>* out,
-          int srcHeight = 2) {
-    TestFrame* fg = new TestFrame(8, srcHeight);
-    TestFrame* dst = new TestFrame(8, 2, 0, false, 0xEE);
-    NLEComPtr<INLEFrame> h1(fg), h2(dst);
-    FillRandom(fg, ++salt_);
-    filter->SetForeground(fg);
-    const int result = filter->Running(dst);
-    *in = fg->pixels;
-    *out = dst->pixels;
-    return result;
+  // An 8x2 frame of noise (`height` rows of it) through the filter into a destination filled
+  // with 0xEE; the source lands in *in.
+  tfx_test::Bytes Run(INLECGFilter* filter, tfx_test::Bytes* in, HRESULT* status = nullptr,
+                      int height = 2) {
+    *in = tfx_test::NoiseBytes(8 * height * 4, ++salt_);
+    return tfx_test::RunFrame(filter, new TestFrame(8, height, *in),
+                              new TestFrame(8, 2, 0, false, 0xEE), nullptr, status);
   }
 
   // Which of the two test tables the filter applied: "invert", "halve", "copy" or "other".
   std::string Applied(INLECGFilter* filter) {
-    std::vector<uint8_t> in, out;
-    EXPECT_EQ(Run(filter, &in, &out), NLE_S_OK);
+    tfx_test::Bytes in;
+    const tfx_test::Bytes out = Run(filter, &in);
     bool invert = true, halve = true;
     for (size_t i = 0; i < in.size(); ++i) {
       if (i % 4 == 3) {
@@ -113,8 +106,8 @@ TEST_F(ColorLut3dAdjustEffect, PassesFramesThroughWhenNoTableApplies) {
   }
   // A source smaller than the destination gives what it holds and no more.
   NLEComPtr<INLECGFilter> filter = CreateEffect(kLut, PathSettings(Wide(Path("none.cube"))));
-  std::vector<uint8_t> in, out;
-  EXPECT_EQ(Run(filter.get(), &in, &out, 1), NLE_S_OK);
+  tfx_test::Bytes in;
+  const tfx_test::Bytes out = Run(filter.get(), &in, nullptr, 1);
   EXPECT_EQ(std::vector<uint8_t>(out.begin(), out.begin() + 32), in);
   EXPECT_EQ(std::vector<uint8_t>(out.begin() + 32, out.end()), std::vector<uint8_t>(32, 0xEE));
 }
@@ -122,9 +115,10 @@ TEST_F(ColorLut3dAdjustEffect, PassesFramesThroughWhenNoTableApplies) {
 TEST_F(ColorLut3dAdjustEffect, EmptyPathFailsWithoutWriting) {
   for (NLEComPtr<INLEProperties> settings : {PathSettings(L""), NLEComPtr<INLEProperties>()}) {
     NLEComPtr<INLECGFilter> filter = CreateEffect(kLut, settings.get());
-    std::vector<uint8_t> in, out;
-    EXPECT_EQ(Run(filter.get(), &in, &out), NLE_E_RESOURCE);
-    EXPECT_EQ(out, std::vector<uint8_t>(64, 0xEE));
+    tfx_test::Bytes in;
+    HRESULT status = 0;
+    EXPECT_EQ(Run(filter.get(), &in, &status), std::vector<uint8_t>(64, 0xEE));
+    EXPECT_EQ(status, NLE_E_RESOURCE);
   }
 }
 

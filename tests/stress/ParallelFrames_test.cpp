@@ -47,15 +47,12 @@ Bytes RunFilter(const wchar_t* guid, EffectParams params, int width, int height,
   for (size_t frame = 0; frame < values.size(); ++frame) {
     if (animated) tfx_test::SetParam(filter.get(), animated, values[frame]);
     TestFrame* fg = new TestFrame(width, height, width * 4 + padding);
-    TestFrame* bg = new TestFrame(width, height);
-    TestFrame* dst = new TestFrame(width, height, width * 4 + padding, false, 7);
-    NLEComPtr<INLEFrame> h1(fg), h2(bg), h3(dst);
+    TestFrame* bg = mask ? new TestFrame(width, height) : nullptr;
     tfx_test::FillRandom(fg, static_cast<unsigned>(frame * 31 + width));
-    tfx_test::FillRandom(bg, static_cast<unsigned>(frame + height));
-    filter->SetForeground(fg);
-    if (mask) filter->SetBackground(bg);
-    EXPECT_EQ(filter->Running(dst), NLE_S_OK);
-    out.insert(out.end(), dst->pixels.begin(), dst->pixels.end());
+    if (bg) tfx_test::FillRandom(bg, static_cast<unsigned>(frame + height));
+    const Bytes dst = tfx_test::RunFrame(
+        filter.get(), fg, new TestFrame(width, height, width * 4 + padding, false, 7), bg);
+    out.insert(out.end(), dst.begin(), dst.end());
   }
   return out;
 }
@@ -96,52 +93,42 @@ std::vector<Job> Jobs(const std::wstring& cube) {
     jobs.push_back(
         {name, [=] { return RunFilter(guid, params, w, h, padding, animated, values, mask); }});
   };
-  const wchar_t* kColor = L"18C6E879-4138-42D0-B0B9-6B4401AA97E6";
-  const wchar_t* kLight = L"D8651B53-F47A-4B98-B8E9-35B491D5EADC";
-  const wchar_t* kBalance = L"39509FB9-39FB-4516-9464-3D891DD61D62";
-  const wchar_t* kVignette = L"8622FC58-4DF1-44BD-9B37-2F633D4D3368";
-  const wchar_t* kHsl = L"AF91FF05-6577-4A4B-C81E-652EE7D6596E";
-  const wchar_t* kLens = L"CFAAD60B-AC2B-4B39-A8E1-D25E35A6F735";
-  const wchar_t* kKey = L"DB4BBA18-48FC-4164-B572-E59757B02796";
-  const wchar_t* kCombine = L"41AA934B-757A-4EAD-8F7B-85E2E2952B6A";
-  const wchar_t* kToWhite = L"969C6D5D-43AC-42F9-8F6C-9AB868BA9356";
-  filter("ColorAdjust a", kColor,
+  filter("ColorAdjust a", tfx_test::kColorAdjust,
          {{L"u_exposure", 20}, {L"u_brightness", -30}, {L"u_contrast", 40}, {L"u_vib", 50}}, 33, 17,
          0, L"u_sat", {-20, 35});
-  filter("ColorAdjust b", kColor, {{L"u_contrast", -60}, {L"u_vib", -40}}, 48, 9, 12);
-  filter("LightAdjust", kLight, {{L"u_highLight", -40}, {L"u_shadow", 50}, {L"u_blackLevel", -20}},
-         29, 13, 4, L"u_whiteLevel", {20, -30});
-  filter("WhiteBalanceAdjust", kBalance, {{L"u_tint", 10}}, 40, 11, 0, L"u_temperature", {40, -60});
-  filter("VignetteAdjust", kVignette,
+  filter("ColorAdjust b", tfx_test::kColorAdjust, {{L"u_contrast", -60}, {L"u_vib", -40}}, 48, 9,
+         12);
+  filter("LightAdjust", tfx_test::kLight,
+         {{L"u_highLight", -40}, {L"u_shadow", 50}, {L"u_blackLevel", -20}}, 29, 13, 4,
+         L"u_whiteLevel", {20, -30});
+  filter("WhiteBalanceAdjust", tfx_test::kWhiteBalance, {{L"u_tint", 10}}, 40, 11, 0,
+         L"u_temperature", {40, -60});
+  filter("VignetteAdjust", tfx_test::kVignette,
          {{L"size", 80}, {L"roundness", 20}, {L"feather", 40}, {L"highlights", 30}}, 37, 21, 8,
          L"amount", {-50, 70});
-  filter("HSLAdjust", kHsl, {{L"u_red_hue", 30}, {L"u_green_sat", -40}, {L"u_blue_light", 25}}, 31,
-         15, 0, L"u_orange_width", {10, 60});
+  filter("HSLAdjust", tfx_test::kHsl,
+         {{L"u_red_hue", 30}, {L"u_green_sat", -40}, {L"u_blue_light", 25}}, 31, 15, 0,
+         L"u_orange_width", {10, 60});
   // Lens strengths change every frame and differ between jobs, so the shared map cache is built,
   // evicted and read from several threads at once.
-  filter("DistortionFringingAdjust a", kLens, {{L"fringing", 40}}, 45, 19, 0, L"distortion",
-         {30, -20, 30.5});
-  filter("DistortionFringingAdjust b", kLens, {{L"distortion", -10}}, 38, 22, 4, L"fringing",
-         {-50, 10.5, 75});
-  filter("ChromeKeyLut3d mask", kKey,
+  filter("DistortionFringingAdjust a", tfx_test::kLens, {{L"fringing", 40}}, 45, 19, 0,
+         L"distortion", {30, -20, 30.5});
+  filter("DistortionFringingAdjust b", tfx_test::kLens, {{L"distortion", -10}}, 38, 22, 4,
+         L"fringing", {-50, 10.5, 75});
+  filter("ChromeKeyLut3d mask", tfx_test::kChromeKey,
          {{L"red", 40}, {L"green", 200}, {L"blue", 60}, {L"contrast", 50}}, 26, 14, 0, L"offset",
          {0, 20});
-  filter("ChromeKeyLut3d colours", kKey,
+  filter("ChromeKeyLut3d colours", tfx_test::kChromeKey,
          {{L"red", 200}, {L"green", 30}, {L"blue", 90}, {L"mode", 1}}, 30, 10, 4, L"contrast",
          {50, 80});
-  filter("ChromeKeyCombine", kCombine, {}, 27, 12, 0, nullptr, {}, true);
-  filter("lutAToWhiteEffect", kToWhite, {}, 24, 16, 8);
+  filter("ChromeKeyCombine", tfx_test::kCombine, {}, 27, 12, 0, nullptr, {}, true);
+  filter("lutAToWhiteEffect", tfx_test::kAToWhite, {}, 24, 16, 8);
   jobs.push_back({"Lut", [cube] {
-                    NLEComPtr<INLECGFilter> f =
-                        tfx_test::CreateEffect(L"74EB022D-1D73-4D1E-9F70-487C356D46CD",
-                                               tfx_test::TextSettings(L"lut3dPath", cube).get());
-                    TestFrame* fg = new TestFrame(35, 18);
-                    TestFrame* dst = new TestFrame(35, 18);
-                    NLEComPtr<INLEFrame> h1(fg), h2(dst);
-                    tfx_test::FillRandom(fg, 5);
-                    f->SetForeground(fg);
-                    EXPECT_EQ(f->Running(dst), NLE_S_OK);
-                    return dst->pixels;
+                    NLEComPtr<INLECGFilter> f = tfx_test::CreateEffect(
+                        tfx_test::kLut, tfx_test::TextSettings(L"lut3dPath", cube).get());
+                    return tfx_test::RunFrame(
+                        f.get(), new TestFrame(35, 18, tfx_test::NoiseBytes(35 * 18 * 4, 5)),
+                        new TestFrame(35, 18));
                   }});
 
   const auto image = [&](const char* name, int w, int h, std::function<void(CxImage*)> fn) {
