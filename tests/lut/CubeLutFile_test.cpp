@@ -426,11 +426,6 @@ TEST(CubeLutFile, WidePathsBecomeUtf8) {
   EXPECT_FALSE(lut.loadFile(Wide("/" + fits).c_str()));
 }
 
-std::string ReadAll(const std::string& path) {
-  std::ifstream in(path, std::ios::binary);
-  return std::string(std::istreambuf_iterator<char>(in), {});
-}
-
 TEST(CubeLutFile, WriterHeaderAndRows) {
   EXPECT_EQ(convertFloat2String(-0.25f), "-0.25000000");
   EXPECT_EQ(convertFloat2String(1.0f / 3.0f), "0.33333334");  // the float, not the double third
@@ -451,11 +446,11 @@ TEST(CubeLutFile, WriterHeaderAndRows) {
   for (int r = 0; r < 8; ++r) {
     rows += (r & 1 ? s : z) + " " + (r & 2 ? s : z) + " " + (r & 4 ? s : z) + "\n";
   }
-  EXPECT_EQ(ReadAll(path), header + rows);
+  EXPECT_EQ(tfx_test::ReadFile(path), header + rows);
 
   CubeLut empty;
   ASSERT_TRUE(empty.writeLUT3D2File(path.c_str()));
-  EXPECT_EQ(ReadAll(path), Replace(header, "LUT_3D_SIZE 2", "LUT_3D_SIZE 0"));
+  EXPECT_EQ(tfx_test::ReadFile(path), Replace(header, "LUT_3D_SIZE 2", "LUT_3D_SIZE 0"));
 
   testing::internal::CaptureStdout();
   EXPECT_FALSE(lut.writeLUT3D2File(nullptr));

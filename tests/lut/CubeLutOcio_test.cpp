@@ -4,16 +4,14 @@
 // colour must agree within one level.
 #include <OpenColorIO/OpenColorIO.h>
 #include <gtest/gtest.h>
-#include <unistd.h>
 
-#include <cstdio>
 #include <cstdlib>
-#include <fstream>
 #include <memory>
 #include <sstream>
 #include <string>
 
 #include "support/ImageBuilders.h"
+#include "support/TempDir.h"
 #include "tessarofx/CubeLut.h"
 
 namespace OCIO = OCIO_NAMESPACE;
@@ -52,12 +50,6 @@ OCIO::ConstConfigRcPtr GradeConfig() {
   return config;
 }
 
-struct TempFile {
-  std::string path;
-  explicit TempFile(const std::string& name) : path(::testing::TempDir() + name) {}
-  ~TempFile() { std::remove(path.c_str()); }
-};
-
 // OCIO's "resolve_cube" writes a 1-D shaper section as well, which the reader refuses as an
 // unknown keyword; "iridas_cube" is a plain 3-D table.
 TEST(CubeLutOcio, BakedLookAgreesWithinOneLevel) {
@@ -72,18 +64,16 @@ TEST(CubeLutOcio, BakedLookAgreesWithinOneLevel) {
     std::ostringstream baked;
     baker->bake(baked);
 
-    // Test runs of several builds may share the directory.
-    const TempFile file("tfx_ocio_look_" + std::to_string(getpid()) + ".cube");
-    std::ofstream(file.path, std::ios::binary) << baked.str();
-    const std::wstring widePath(file.path.begin(), file.path.end());
+    const tfx_test::TempDir dir;
+    const std::string path = dir.Write("look.cube", baked.str());
     auto lut = std::make_unique<CubeLut>();
-    ASSERT_TRUE(lut->loadFile(widePath.c_str()))
+    ASSERT_TRUE(lut->loadFile(tfx_test::Wide(path).c_str()))
         << "status " << lut->getStatus() << "; the file begins:\n"
         << baked.str().substr(0, 300);
     ASSERT_EQ(33, lut->getLutSize());
 
     OCIO::FileTransformRcPtr transform = OCIO::FileTransform::Create();
-    transform->setSrc(file.path.c_str());
+    transform->setSrc(path.c_str());
     transform->setInterpolation(OCIO::INTERP_TETRAHEDRAL);
     transform->setDirection(OCIO::TRANSFORM_DIR_FORWARD);
     const OCIO::ConstCPUProcessorRcPtr cpu =

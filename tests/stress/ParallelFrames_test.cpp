@@ -4,10 +4,7 @@
 // The library's process-wide caches (lens maps, the hue matrix, the lattice instance, dispatch
 // tables) are shared by all of them; ThreadSanitizer runs this test in CI.
 #include <gtest/gtest.h>
-#include <unistd.h>
 
-#include <cstdio>
-#include <fstream>
 #include <functional>
 #include <string>
 #include <thread>
@@ -15,6 +12,7 @@
 
 #include "support/EffectHarness.h"
 #include "support/ImageBuilders.h"
+#include "support/TempDir.h"
 #include "tessarofx/Blur.h"
 #include "tessarofx/Compositing.h"
 #include "tessarofx/CxImage.h"
@@ -70,19 +68,6 @@ Bytes RunOnBuffer(size_t bytes, uint32_t salt, const std::function<void(uint8_t*
   Bytes buffer = tfx_test::NoiseBytes(bytes, salt);
   fn(buffer.data());
   return buffer;
-}
-
-std::string WriteCube() {
-  const std::string path =
-      "/tmp/tfx-parallel-" + std::to_string(getpid()) + ".cube";  // removed by the test
-  std::ofstream out(path);
-  out << "LUT_3D_SIZE 3\n";
-  for (int b = 0; b < 3; ++b) {
-    for (int g = 0; g < 3; ++g) {
-      for (int r = 0; r < 3; ++r) out << g * 0.4 << ' ' << b * 0.5 << ' ' << r * 0.3 << '\n';
-    }
-  }
-  return path;
 }
 
 std::vector<Job> Jobs(const std::wstring& cube) {
@@ -179,7 +164,8 @@ std::vector<Job> Jobs(const std::wstring& cube) {
 }
 
 TEST(ParallelFrames, EveryJobOnFourThreadsGivesItsSerialBytes) {
-  const std::string cube = WriteCube();
+  const tfx_test::TempDir dir;
+  const std::string cube = dir.Write("grade.cube", tfx_test::CubeText(3, "", 0.8, 0.1, true));
   const std::vector<Job> jobs = Jobs(std::wstring(cube.begin(), cube.end()));
   std::vector<Bytes> serial;
   for (const Job& job : jobs) {
@@ -207,7 +193,6 @@ TEST(ParallelFrames, EveryJobOnFourThreadsGivesItsSerialBytes) {
     });
   }
   for (std::thread& thread : threads) thread.join();
-  std::remove(cube.c_str());
   for (int t = 0; t < kThreads; ++t) {
     EXPECT_EQ(mismatches[t], 0) << "thread " << t;
     for (size_t i = 0; i < jobs.size(); ++i) {

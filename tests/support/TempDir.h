@@ -7,6 +7,7 @@
 
 #include <filesystem>
 #include <fstream>
+#include <iterator>
 #include <sstream>
 #include <string>
 
@@ -40,6 +41,12 @@ struct TempDir {
     return full;
   }
 };
+
+// The bytes of the file at `path`, or nothing.
+inline std::string ReadFile(const std::string& path) {
+  std::ifstream in(path, std::ios::binary);
+  return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
+}
 
 // Test paths are ASCII apart from the cases that build their wide path themselves.
 inline std::wstring Wide(const std::string& ascii) {

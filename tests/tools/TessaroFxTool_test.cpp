@@ -34,11 +34,6 @@ struct Outcome {
   std::string out, err;
 };
 
-std::string Slurp(const fs::path& path) {
-  std::ifstream in(path, std::ios::binary);
-  return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
-}
-
 // Upper-case hexadecimal digits in groups of 8-4-4-4-12.
 bool IsGuid(const std::string& s) {
   for (size_t i = 0; i < 36; ++i) {
@@ -60,7 +55,7 @@ class ToolTest : public ::testing::Test {
     const int status = std::system(command.c_str());
     // A crash is reported as 128 + signal, so it can never pass for a clean failure.
     Outcome r{WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status),
-              Slurp(Path(".stdout")), Slurp(Path(".stderr"))};
+              tfx_test::ReadFile(Path(".stdout")), tfx_test::ReadFile(Path(".stderr"))};
     fs::remove(Path(".stdout"));
     fs::remove(Path(".stderr"));
     return r;
@@ -156,7 +151,7 @@ TEST_F(ToolTest, ApplyFindsFiltersByGuidAndNameInAnyCase) {
   ASSERT_EQ(
       Run("apply {18c6e879-4138-42d0-b0b9-6b4401aa97e6} --param=U_SAT=-100 in.png b.png").exitCode,
       0);
-  EXPECT_EQ(Slurp(Path("a.png")), Slurp(Path("b.png")));
+  EXPECT_EQ(tfx_test::ReadFile(Path("a.png")), tfx_test::ReadFile(Path("b.png")));
   // Registered names behind a published one are found too, whatever the effect answers.
   for (const std::string hidden : {"ColorLut3dAdjust", "chromekeylut3d"}) {
     const Outcome r = Run("apply " + hidden + " in.png c.png");
@@ -262,8 +257,8 @@ TEST_F(ToolTest, FailuresNameTheirCauseAndLeaveNoOutput) {
   };
   const std::vector<std::string> before = Listing();
   for (const auto& c : cases) ExpectRefused(c.args, c.cause, before, c.env, c.exitCode);
-  EXPECT_EQ(Slurp(Path("out.png")), "previous");
-  EXPECT_EQ(Slurp(Path("out.cube")), "previous");
+  EXPECT_EQ(tfx_test::ReadFile(Path("out.png")), "previous");
+  EXPECT_EQ(tfx_test::ReadFile(Path("out.cube")), "previous");
   ASSERT_EQ(Run("apply ColorAdjust in.png out.png").exitCode, 0);
   EXPECT_EQ(Read("out.png").size(), cv::Size(6, 4));
 }
@@ -431,7 +426,8 @@ TEST_F(ToolTest, DemoWritesTheSceneEachFilterAndAContactSheet) {
   }
   // The demo is deterministic: a second run into another directory gives the same scene bytes.
   ASSERT_EQ(Run("demo " + Path("again")).exitCode, 0);
-  EXPECT_EQ(Slurp(Path("again/sample.png")), Slurp(Path("demo-out/sample.png")));
+  EXPECT_EQ(tfx_test::ReadFile(Path("again/sample.png")),
+            tfx_test::ReadFile(Path("demo-out/sample.png")));
 }
 
 // The table rows of a ".cube" file, in file order.
@@ -479,7 +475,7 @@ TEST_F(ToolTest, LutConvertResamplesATableTooBigForThePlugin) {
     const std::string out = "small" + std::to_string(n) + ".cube";
     const Outcome r = Run("lut convert big.cube " + out + " --size " + std::to_string(n));
     ASSERT_EQ(r.exitCode, 0) << r.err;
-    const std::vector<std::array<double, 3>> rows = CubeRows(Slurp(Path(out)));
+    const std::vector<std::array<double, 3>> rows = CubeRows(tfx_test::ReadFile(Path(out)));
     ASSERT_EQ(rows.size(), size_t(n) * n * n);
     double worst = 0;
     for (size_t at = 0; at < rows.size(); ++at) {
@@ -522,7 +518,7 @@ TEST_F(ToolTest, LutConvertTurnsA3dlFileIntoACubeAndKeepsTheDomainScaling) {
   WriteText("look.3DL", text.str());
   const Outcome r = Run("lut convert look.3DL look.cube");
   ASSERT_EQ(r.exitCode, 0) << r.err;
-  std::vector<std::array<double, 3>> rows = CubeRows(Slurp(Path("look.cube")));
+  std::vector<std::array<double, 3>> rows = CubeRows(tfx_test::ReadFile(Path("look.cube")));
   ASSERT_EQ(rows.size(), 17u * 17 * 17);
   for (size_t at = 0; at < rows.size(); at += 97) {  // red fastest now
     SCOPED_TRACE(at);
@@ -535,7 +531,7 @@ TEST_F(ToolTest, LutConvertTurnsA3dlFileIntoACubeAndKeepsTheDomainScaling) {
   // converted table means the same, now over the plain domain.
   WriteText("half.cube", CubeText(3, "DOMAIN_MIN 0.5 0.5 0.5\n"));
   ASSERT_EQ(Run("lut convert half.cube plain.cube").exitCode, 0);
-  rows = CubeRows(Slurp(Path("plain.cube")));
+  rows = CubeRows(tfx_test::ReadFile(Path("plain.cube")));
   ASSERT_EQ(rows.size(), 27u);
   EXPECT_EQ(rows[26], (std::array<double, 3>{0.5, 0.5, 0.5}));
   EXPECT_EQ(rows[1], (std::array<double, 3>{0.25, 0, 0}));
@@ -544,7 +540,8 @@ TEST_F(ToolTest, LutConvertTurnsA3dlFileIntoACubeAndKeepsTheDomainScaling) {
 TEST_F(ToolTest, LutBakeAppliesLikeTheFiltersItBakes) {
   WriteInput("in.png", 33, 21);
   ASSERT_EQ(Run("lut bake -f ColorAdjust -p u_exposure=20 exposure.cube").exitCode, 0);
-  EXPECT_EQ(CubeRows(Slurp(Path("exposure.cube"))).size(), 33u * 33 * 33);  // the default size
+  EXPECT_EQ(CubeRows(tfx_test::ReadFile(Path("exposure.cube"))).size(),
+            33u * 33 * 33);  // the default size
   const std::string lut = "apply ColorLut3dAdjust -p lut3dPath=";
   ASSERT_EQ(Run(lut + Path("exposure.cube") + " in.png baked.png").exitCode, 0);
   ASSERT_EQ(Run("apply ColorAdjust -p u_exposure=20 in.png direct.png").exitCode, 0);

@@ -3,7 +3,6 @@
 #include <gtest/gtest.h>
 #include <stdio.h>
 #include <stdlib.h>
-#include <unistd.h>
 
 #include <cstdlib>
 #include <filesystem>
@@ -12,6 +11,7 @@
 #include <string>
 #include <vector>
 
+#include "../support/TempDir.h"
 #include "Video.h"
 
 namespace fs = std::filesystem;
@@ -28,14 +28,7 @@ class VideoFiles : public ::testing::Test {
   static void SetUpTestSuite() {
     tfxtool::media::SetLibraryLog(tfxtool::media::LibraryLog::kErrors);
   }
-  void SetUp() override {
-    char name[] = "/tmp/tfx-video-XXXXXX";
-    ASSERT_NE(mkdtemp(name), nullptr);
-    dir_ = name;
-  }
-  void TearDown() override { fs::remove_all(dir_); }
-
-  std::string Path(const std::string& name) const { return (dir_ / name).string(); }
+  std::string Path(const std::string& name) const { return dir_.Path(name); }
 
   // Runs the ffmpeg tool quietly; its stdout and stderr come back together.
   static std::string Ffmpeg(const std::string& args, const std::string& level = "error") {
@@ -99,7 +92,7 @@ class VideoFiles : public ::testing::Test {
   // Nothing but the named files: no target after a failure, no hidden temporary left behind.
   std::vector<std::string> Listing() const {
     std::vector<std::string> names;
-    for (const auto& entry : fs::directory_iterator(dir_))
+    for (const auto& entry : fs::directory_iterator(dir_.path))
       names.push_back(entry.path().filename().string());
     std::sort(names.begin(), names.end());
     return names;
@@ -114,7 +107,7 @@ class VideoFiles : public ::testing::Test {
       EXPECT_NEAR(Seconds(a, i), Seconds(b, i), 1e-6) << "frame " << i;
   }
 
-  fs::path dir_;
+  tfx_test::TempDir dir_;
 };
 
 TEST_F(VideoFiles, LosslessRoundTripKeepsPixelsTimesAlphaAndSideStreams) {
