@@ -1,7 +1,9 @@
 #include "adjust/ColorAdjustReference.h"
 
 #include <algorithm>
+#include <climits>
 #include <cmath>
+#include <cstdint>
 #include <cstring>
 
 namespace tfx_test {
@@ -54,14 +56,18 @@ void ReferenceBrightness(CxImage* image, float b) {
 void ReferenceContrast(CxImage* image, float c) {
   if (c == 0) return;
   const float t = c > 0 ? 1.0f / (1.0f - c / 255.0f) - 1.0f : c / 255.0f;
-  int lo = static_cast<int>(t * 100.0f * 0.5f);
-  int hi;
-  if (255 - lo < lo) {
+  // Outside int's range (t is infinite at c = 255) the conversion gives INT_MIN, as the x86
+  // truncating instruction does.
+  const float scaled = t * 100.0f * 0.5f;
+  int lo = scaled >= -2147483648.0f && scaled < 2147483648.0f ? static_cast<int>(scaled) : INT_MIN;
+  int hi = 0;  // 255 minus the unclamped lo is not used once lo is clamped below
+  if (255 - int64_t{lo} < lo) {
     lo = 120;
     hi = 127;
+  } else if (lo < -127) {
+    lo = -120;
   } else {
     hi = 255 - lo;
-    if (lo < -127) lo = -120;
   }
   const int d = lo < 0 ? 255 + 2 * lo : 255 - 2 * lo;
   EveryPixel(image, [&](uint8_t* const* ch) {
