@@ -22,8 +22,6 @@ struct VignetteKernel {
 // The kernel Highway's dispatch picks at the time of the call (hwy::SetSupportedTargetsForTest
 // included).
 const VignetteKernel& BestVignetteKernel();
-// The kernels this machine runs, best first.
-const std::vector<const VignetteKernel*>& SupportedVignetteKernels();
 
 // What one call derives from its arguments: the blend constants, the kernel, and per-channel
 // tables for the mask weights where the three channels do not interact.

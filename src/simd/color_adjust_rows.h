@@ -5,7 +5,6 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <vector>
 
 namespace tfx {
 
@@ -53,7 +52,5 @@ inline constexpr size_t kBrightestTableBytes = 256 * 256 + 3;
 // The set Highway's dispatch picks at the time of the call (hwy::SetSupportedTargetsForTest
 // included).
 const ColorAdjustRows& BestColorAdjustRows();
-// One set per instruction set both compiled in and run by this CPU, best first.
-std::vector<const ColorAdjustRows*> SupportedColorAdjustRows();
 
 }  // namespace tfx

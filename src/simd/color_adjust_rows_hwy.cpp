@@ -680,17 +680,12 @@ const ColorAdjustRows* RowsOfThisTarget() {
 HWY_AFTER_NAMESPACE();
 
 #if HWY_ONCE
-#include "simd/dispatch.h"
 
 namespace tfx {
 
 HWY_EXPORT(RowsOfThisTarget);
 
 const ColorAdjustRows& BestColorAdjustRows() { return *HWY_DYNAMIC_DISPATCH(RowsOfThisTarget)(); }
-
-std::vector<const ColorAdjustRows*> SupportedColorAdjustRows() {
-  return EverySupportedSet(HWY_DISPATCH_TABLE(RowsOfThisTarget));
-}
 
 }  // namespace tfx
 #endif  // HWY_ONCE

@@ -5,7 +5,6 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <vector>
 
 namespace tfx {
 
@@ -37,7 +36,5 @@ const HslHueChoice& HslHueChoices();
 // The set Highway's dispatch picks at the time of the call (hwy::SetSupportedTargetsForTest
 // included).
 const HslRelightRows& BestHslRelightRows();
-// One set per instruction set both compiled in and run by this CPU, best first.
-std::vector<const HslRelightRows*> SupportedHslRelightRows();
 
 }  // namespace tfx

@@ -153,7 +153,6 @@ const HslRelightRows* RelightRowsOfThisTarget() {
 HWY_AFTER_NAMESPACE();
 
 #if HWY_ONCE
-#include "simd/dispatch.h"
 
 namespace tfx {
 
@@ -211,10 +210,6 @@ const HslHueChoice& HslHueChoices() {
 
 const HslRelightRows& BestHslRelightRows() {
   return *HWY_DYNAMIC_DISPATCH(RelightRowsOfThisTarget)();
-}
-
-std::vector<const HslRelightRows*> SupportedHslRelightRows() {
-  return EverySupportedSet(HWY_DISPATCH_TABLE(RelightRowsOfThisTarget));
 }
 
 }  // namespace tfx

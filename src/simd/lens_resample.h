@@ -5,7 +5,6 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <vector>
 
 #include "adjust/LensMaps.h"
 
@@ -56,7 +55,5 @@ struct LensResampleRows {
 // The set Highway's dispatch picks at the time of the call (hwy::SetSupportedTargetsForTest
 // included).
 const LensResampleRows& BestLensResampleRows();
-// One set per instruction set both compiled in and run by this CPU, best first.
-std::vector<const LensResampleRows*> SupportedLensResampleRows();
 
 }  // namespace tfx

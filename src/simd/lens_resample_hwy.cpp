@@ -403,7 +403,6 @@ const LensResampleRows* LensRowsOfThisTarget() {
 HWY_AFTER_NAMESPACE();
 
 #if HWY_ONCE
-#include "simd/dispatch.h"
 
 namespace tfx {
 
@@ -411,10 +410,6 @@ HWY_EXPORT(LensRowsOfThisTarget);
 
 const LensResampleRows& BestLensResampleRows() {
   return *HWY_DYNAMIC_DISPATCH(LensRowsOfThisTarget)();
-}
-
-std::vector<const LensResampleRows*> SupportedLensResampleRows() {
-  return EverySupportedSet(HWY_DISPATCH_TABLE(LensRowsOfThisTarget));
 }
 
 }  // namespace tfx

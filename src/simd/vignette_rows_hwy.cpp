@@ -108,19 +108,12 @@ const VignetteKernel* KernelOfThisTarget() {
 HWY_AFTER_NAMESPACE();
 
 #if HWY_ONCE
-#include "simd/dispatch.h"
 
 namespace tfx {
 
 HWY_EXPORT(KernelOfThisTarget);
 
 const VignetteKernel& BestVignetteKernel() { return *HWY_DYNAMIC_DISPATCH(KernelOfThisTarget)(); }
-
-const std::vector<const VignetteKernel*>& SupportedVignetteKernels() {
-  static const std::vector<const VignetteKernel*> kernels =
-      EverySupportedSet(HWY_DISPATCH_TABLE(KernelOfThisTarget));
-  return kernels;
-}
 
 }  // namespace tfx
 #endif  // HWY_ONCE

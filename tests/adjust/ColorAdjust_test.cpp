@@ -19,6 +19,7 @@
 
 #include "adjust/ColorAdjustReference.h"
 #include "adjust/ColorAdjustRows.h"
+#include "support/EveryTarget.h"
 
 namespace {
 
@@ -73,12 +74,13 @@ TEST_P(AllColours, MatchesReferenceOnEveryKernelSet) {
   for (const float strength : op.sweep) {
     const Image expected = Clone(EveryColour());
     op.reference(expected.get(), strength);
-    for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
-      SCOPED_TRACE(testing::Message() << rows->name << " strength " << strength);
+    tfx_test::ForEveryTarget([&] {
+      const tfx::ColorAdjustRows* const rows = &tfx::BestColorAdjustRows();
+      SCOPED_TRACE(testing::Message() << "strength " << strength);
       const Image actual = Clone(EveryColour());
       EXPECT_EQ(op.fast(actual.get(), strength, *rows), actual.get());
       EXPECT_TRUE(SameBuffer(*expected, *actual));
-    }
+    });
   }
 }
 
@@ -102,9 +104,10 @@ TEST(ColorAdjustPlan, OnePassEqualsTheFiveOperationsInTurn) {
     tfx_test::ReferenceContrast(expected.get(), c.c);
     tfx_test::ReferenceVibrance(expected.get(), c.v);
     tfx_test::ReferenceSaturation(expected.get(), c.s);
-    for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
-      SCOPED_TRACE(testing::Message() << rows->name << ' ' << c.e << ' ' << c.b << ' ' << c.c << ' '
-                                      << c.v << ' ' << c.s);
+    tfx_test::ForEveryTarget([&] {
+      const tfx::ColorAdjustRows* const rows = &tfx::BestColorAdjustRows();
+      SCOPED_TRACE(testing::Message()
+                   << c.e << ' ' << c.b << ' ' << c.c << ' ' << c.v << ' ' << c.s);
       const tfx::ColorAdjustPlan plan(c.e, c.b, c.c, c.v, c.s, *rows);
       EXPECT_TRUE(plan.Fused());
       // From the source into another image, as the effect runs it.
@@ -112,28 +115,11 @@ TEST(ColorAdjustPlan, OnePassEqualsTheFiveOperationsInTurn) {
       plan.ApplyInto(actual->GetBits(), EveryColour().GetBits(),
                      size_t{actual->GetWidth()} * actual->GetHeight());
       ASSERT_TRUE(SameBuffer(*expected, *actual));
-    }
+    });
   }
   const tfx::ColorAdjustRows& best = tfx::BestColorAdjustRows();
   EXPECT_FALSE(tfx::ColorAdjustPlan(10, 0, -60, 1e9f, 10, best).Fused());
   EXPECT_FALSE(tfx::ColorAdjustPlan(0, 0, 0, 30, std::nanf(""), best).Fused());
-}
-
-TEST(ColorAdjustRows, OneSetPerTargetCompiledAndSupported) {
-  // Every test that loops over the sets then covers every Highway target this machine runs.
-  std::vector<std::string> expected, names;
-  for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
-    expected.push_back(hwy::TargetName(target));
-  }
-  for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
-    names.push_back(rows->name);
-    std::cout << (names.size() == 1 ? "[ targets  ] " : " ") << rows->name;
-  }
-  std::cout << std::endl;
-  EXPECT_EQ(names, expected);
-  ASSERT_FALSE(names.empty());
-  EXPECT_STREQ(tfx::BestColorAdjustRows().name, names[0].c_str());
-  EXPECT_EQ(tfx::BestColorAdjustRows().vibrance, tfx::SupportedColorAdjustRows()[0]->vibrance);
 }
 
 tagRGBQUAD VibranceByPixel(tagRGBQUAD c, float strength) {
@@ -168,12 +154,13 @@ TEST(ColorAdjustRows, MatchThePerPixelFormsAtExtremeStrengths) {
       c = by_pixel(c, strength);
       std::memcpy(&expected[i], &c, 4);
     }
-    for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
-      SCOPED_TRACE(testing::Message() << rows->name << ' ' << label << ' ' << strength);
+    tfx_test::ForEveryTarget([&] {
+      const tfx::ColorAdjustRows* const rows = &tfx::BestColorAdjustRows();
+      SCOPED_TRACE(testing::Message() << label << ' ' << strength);
       std::vector<uint8_t> actual = noise;
       (rows->*kernel)(actual.data(), actual.size() / 4, strength);
       ASSERT_EQ(actual, expected);
-    }
+    });
   };
   for (const float strength : strengths) {
     check("vibrance", strength, &tfx::ColorAdjustRows::vibrance, VibranceByPixel);
@@ -231,10 +218,11 @@ TEST(ColorAdjustRows, TableAndGainKernelsMatchTheirByteForms) {
         const uint8_t* row = &rowsTable[256 * std::max({p[0], p[1], p[2]})];
         for (int c = 0; c < 3; ++c) p[c] = row[p[c]];
       });
-  for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
+  tfx_test::ForEveryTarget([&] {
+    const tfx::ColorAdjustRows* const rows = &tfx::BestColorAdjustRows();
     for (const auto& [name, kernel, pixel] : cases) {
       for (size_t count : {0, 1, 7, 8, 15, 16, 17, 33, 300, 4099}) {
-        SCOPED_TRACE(testing::Message() << rows->name << ' ' << name << " count " << count);
+        SCOPED_TRACE(testing::Message() << name << " count " << count);
         std::vector<uint8_t> src = NoiseBytes(count * 4 + 8, uint32_t(count)), expected = src;
         for (size_t i = 0; i < count; ++i) pixel(&expected[4 * i]);
         std::vector<uint8_t> apart = NoiseBytes(src.size(), 77), expectedApart = apart;
@@ -245,7 +233,7 @@ TEST(ColorAdjustRows, TableAndGainKernelsMatchTheirByteForms) {
         ASSERT_EQ(src, expected);
       }
     }
-  }
+  });
 }
 
 TEST(ColorAdjust, MatchesReferenceForEveryLayoutWidthAndPaddedStride) {
@@ -253,11 +241,11 @@ TEST(ColorAdjust, MatchesReferenceForEveryLayoutWidthAndPaddedStride) {
   // brightness, whose walk ignores rows (and the reference walks the same way). Other layouts
   // take the accessors through the exported functions.
   for (const Operation* op : kOperations) {
-    for (const tfx::ColorAdjustRows* rows : tfx::SupportedColorAdjustRows()) {
+    tfx_test::ForEveryTarget([&] {
+      const tfx::ColorAdjustRows* const rows = &tfx::BestColorAdjustRows();
       for (unsigned width = 1; width <= 40; ++width) {
         for (unsigned pad : {0u, 12u}) {
-          SCOPED_TRACE(testing::Message() << rows->name << ' ' << op->name << " width " << width
-                                          << " padding " << pad);
+          SCOPED_TRACE(testing::Message() << op->name << " width " << width << " padding " << pad);
           const Image actual = NoiseImage(width, 3, 32, IPF_BGRA, width * 4 + pad, width);
           const Image expected = Clone(*actual);
           op->reference(expected.get(), op->typical);
@@ -265,7 +253,7 @@ TEST(ColorAdjust, MatchesReferenceForEveryLayoutWidthAndPaddedStride) {
           ASSERT_TRUE(SameBuffer(*expected, *actual));
         }
       }
-    }
+    });
     for (const tfx_test::Layout& layout : tfx_test::kLayouts) {
       // Narrow pixels give brightness overlapping windows; see the walk test below.
       if (op == &kBrightness && layout.bpp < 24) continue;

@@ -16,6 +16,7 @@
 
 #include "simd/hsl_relight.h"
 #include "support/EffectHarness.h"
+#include "support/EveryTarget.h"
 #include "support/ImageBuilders.h"
 
 namespace {
@@ -203,8 +204,8 @@ TEST(WhiteBalance, TemperatureKernelsOfEverySetMatchThePerPixelForm) {
     const Image expectedRgba = NoiseImage(67, 9, 32, IPF_RGBA, 268, 5);
     const Image rgba = Clone(*expectedRgba);
     RefTemperature(expectedRgba.get(), t);
-    for (const tfx::HslRelightRows* rows : tfx::SupportedHslRelightRows()) {
-      SCOPED_TRACE(rows->name);
+    tfx_test::ForEveryTarget([&] {
+      const tfx::HslRelightRows* const rows = &tfx::BestHslRelightRows();
       const Image actual = Clone(EveryColour());
       rows->relight(actual->GetBits(), actual->GetSize() / 4, 2, mix.channel[0], mix.channel[1],
                     mix.channel[2]);
@@ -213,7 +214,7 @@ TEST(WhiteBalance, TemperatureKernelsOfEverySetMatchThePerPixelForm) {
       rows->relight(actualRgba->GetBits(), actualRgba->GetSize() / 4, 0, mix.channel[0],
                     mix.channel[1], mix.channel[2]);
       EXPECT_TRUE(SameBuffer(*expectedRgba, *actualRgba));
-    }
+    });
   }
 }
 

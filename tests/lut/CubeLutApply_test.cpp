@@ -94,14 +94,6 @@ void ExpectSameRows(const tfx::TetraTable& table, int bytesPerPixel, uint32_t sa
   }
 }
 
-TEST(CubeLutApply, DispatchFollowsTheTargetsInForce) {
-  for (const int64_t target : hwy::SupportedAndGeneratedTargets()) {
-    hwy::SetSupportedTargetsForTest(target);
-    EXPECT_STREQ(hwy::TargetName(target), tfx::TetraRowVectorTarget());
-  }
-  hwy::SetSupportedTargetsForTest(0);
-}
-
 // Random lattices, and hostile ones: mostly ordinary values, so that some corners mix with an
 // edge value and some do not; each also grey, which takes the one-float-a-point rows. The hostile
 // ones also have fraction tables the rows cannot read as positions.
