@@ -196,7 +196,7 @@ void TetraImage(const TetraPlan& plan, const uint8_t* in, int inPitch, uint8_t* 
     // Bands of about a million pixels: each reads the whole lattice into the cache once, slab by
     // slab, which is then a few bytes a pixel, and its sorted pixels stream through in order.
     // The storage is left uninitialised, so that only the part the pixels fill is ever touched.
-    const int bandRows = std::max(1, (1 << 20) / width);
+    const int bandRows = std::min(height, std::max(1, (1 << 20) / width));
     const size_t needed = TetraBandScratch(width, bandRows);
     thread_local std::unique_ptr<uint32_t[]> scratch;
     thread_local size_t scratchSize = 0;
