@@ -1,12 +1,7 @@
 // Hue rotation with the sequential 3 x 3 matrix, and the exact rotation for float colours.
 //
-// Packed 4-byte pixels go through a vector kernel, compiled once per instruction set by
-// foreach_target.h and picked at run time; its lanes evaluate the per-pixel rows below in the
-// same order and precision (no MulAdd; the build passes -ffp-contract=off), so every set gives
-// the same bytes.
-#ifndef TFX_ADJUST_HUEADJUST_SHARED
-#define TFX_ADJUST_HUEADJUST_SHARED
-
+// Packed 4-byte pixels go through the vector kernel of simd/hue_rotate_hwy.cpp, whose lanes
+// evaluate the per-pixel rows below in the same order and precision.
 #include "tessarofx/HueAdjust.h"
 
 #include <algorithm>
@@ -17,94 +12,11 @@
 #include <mutex>
 
 #include "image/ImageLayout.h"
-
-#endif  // TFX_ADJUST_HUEADJUST_SHARED
-
-#undef HWY_TARGET_INCLUDE
-#define HWY_TARGET_INCLUDE "adjust/HueAdjust.cpp"
-#include <hwy/foreach_target.h>  // IWYU pragma: keep
-#include <hwy/highway.h>
-
-HWY_BEFORE_NAMESPACE();
-namespace tfx {
-namespace HWY_NAMESPACE {
-
-namespace hn = hwy::HWY_NAMESPACE;
-
-using DU = hn::ScalableTag<uint32_t>;
-using DI = hn::RebindToSigned<DU>;
-using DF = hn::RebindToFloat<DU>;
-using VU = hn::Vec<DU>;
-using VF = hn::Vec<DF>;
-
-// The stored byte as a float: limited to 0..255, then truncated (Trunc gives the integer's
-// float exactly).
-HWY_INLINE VF StoreLane(VF v) {
-  const DF df;
-  return hn::Trunc(hn::Min(hn::Set(df, 255.0f), hn::Max(hn::Zero(df), v)));
-}
-
-HWY_INLINE VU RotateLanes(VU px, const float m[9]) {
-  const DU du;
-  const DI di;
-  const DF df;
-  const VU byte = hn::Set(du, 255u);
-  const VU u0 = hn::And(px, byte);
-  const VU u1 = hn::And(hn::ShiftRight<8>(px), byte);
-  const VU u2 = hn::And(hn::ShiftRight<16>(px), byte);
-  const auto grey = hn::And(hn::Eq(u0, u1), hn::Eq(u1, u2));
-  const VF b0 = hn::ConvertTo(df, hn::BitCast(di, u0));
-  const VF b1 = hn::ConvertTo(df, hn::BitCast(di, u1));
-  const VF b2 = hn::ConvertTo(df, hn::BitCast(di, u2));
-  const auto row = [&](int i, VF x, VF y, VF z) {
-    const VF sum =
-        hn::Add(hn::Add(hn::Mul(hn::Set(df, m[i]), x), hn::Mul(hn::Set(df, m[i + 1]), y)),
-                hn::Mul(hn::Set(df, m[i + 2]), z));
-    return StoreLane(sum);
-  };
-  const VF n0 = row(0, b0, b1, b2);
-  const VF n1 = row(3, n0, b1, b2);
-  const VF n2 = row(6, n0, n1, b2);
-  // A whole number 0..255 plus 2^23 is exact and holds the byte in its low mantissa bits, under
-  // exponent bits that the shifts by 8 and 16 push out of the lane: cheaper than ConvertTo, whose
-  // overflow fix-up these values never need.
-  const auto bits = [&](VF v) { return hn::BitCast(du, hn::Add(v, hn::Set(df, 8388608.0f))); };
-  const VU out = hn::Or(hn::Or(hn::And(px, hn::Set(du, 0xff000000u)), hn::And(bits(n0), byte)),
-                        hn::Or(hn::ShiftLeft<8>(bits(n1)), hn::ShiftLeft<16>(bits(n2))));
-  return hn::IfThenElse(grey, px, out);
-}
-
-// `count` consecutive 4-byte pixels.
-void RotatePixels(uint8_t* pixels, size_t count, const float* m) {
-  const DU du;
-  const size_t lanes = hn::Lanes(du);
-  size_t i = 0;
-  for (; i + lanes <= count; i += lanes) {
-    uint32_t* p = reinterpret_cast<uint32_t*>(pixels + 4 * i);
-    // A frame far beyond the caches streams in faster when asked for well ahead of use.
-    __builtin_prefetch(pixels + 4 * i + 4096, 1);
-    hn::StoreU(RotateLanes(hn::LoadU(du, p), m), du, p);
-  }
-  if (i < count) {
-    // The tail through a full vector, so that it sees the very same operations.
-    alignas(64) uint32_t tail[HWY_MAX_BYTES / 4] = {};
-    std::memcpy(tail, pixels + 4 * i, 4 * (count - i));
-    hn::Store(RotateLanes(hn::Load(du, tail), m), du, tail);
-    std::memcpy(pixels + 4 * i, tail, 4 * (count - i));
-  }
-}
-
-}  // namespace HWY_NAMESPACE
-}  // namespace tfx
-HWY_AFTER_NAMESPACE();
-
-#if HWY_ONCE
+#include "simd/hue_rotate.h"
 
 float matrix[9] = {1, 0, 0, 0, 1, 0, 0, 0, 1};
 
 namespace tfx {
-
-HWY_EXPORT(RotatePixels);
 
 namespace {
 
@@ -178,7 +90,7 @@ CxImage* hueAdjustment(CxImage* image, float angle) {
   const size_t size = image->GetSize();
   if (step == 4) {
     // Row padding is ignored on purpose: width * height pixels from the first byte.
-    HWY_DYNAMIC_DISPATCH(tfx::RotatePixels)(bits, std::min(pixels, size / 4), m);
+    tfx::RotatePixels(bits, std::min(pixels, size / 4), m);
     return image;
   }
   for (size_t i = 0, offset = 0; step != 0 && i < pixels && offset + 3 <= size;
@@ -213,4 +125,3 @@ _rgb transformHue2(_rgb c, float angle) {
   return _rgb{static_cast<float>(grey + 2.0 * u), static_cast<float>(grey - u + v),
               static_cast<float>(grey - u - v)};
 }
-#endif  // HWY_ONCE

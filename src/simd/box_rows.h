@@ -38,4 +38,7 @@ void BoxRowWindow(const uint8_t* row, size_t pitch, size_t taps, uint8_t* out, s
 void BoxRowStep16(uint16_t* sums, const uint8_t* entering, const uint8_t* leaving, uint8_t* out,
                   size_t lanes, size_t taps);
 
+// The name of the instruction set these rows would run on now.
+const char* BoxRowsTarget();
+
 }  // namespace tfx

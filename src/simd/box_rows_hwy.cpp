@@ -138,6 +138,8 @@ void BoxRowStep16OfTarget(uint16_t* HWY_RESTRICT sums, const uint8_t* entering,
   }
 }
 
+const char* BoxRowsTargetOfTarget() { return hwy::TargetName(HWY_TARGET); }
+
 }  // namespace HWY_NAMESPACE
 }  // namespace tfx
 HWY_AFTER_NAMESPACE();
@@ -150,6 +152,9 @@ HWY_EXPORT(BoxRowStepOfTarget);
 HWY_EXPORT(BoxRowDifferenceOfTarget);
 HWY_EXPORT(BoxRowWindowOfTarget);
 HWY_EXPORT(BoxRowStep16OfTarget);
+HWY_EXPORT(BoxRowsTargetOfTarget);
+
+const char* BoxRowsTarget() { return HWY_DYNAMIC_DISPATCH(BoxRowsTargetOfTarget)(); }
 
 void BoxRowDifference(const uint32_t* running, size_t span, uint8_t* out, size_t lanes,
                       BoxQuotient quotient) {

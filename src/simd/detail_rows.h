@@ -32,4 +32,7 @@ void GrainNoise(uint32_t* state, float scale, float* noise, size_t count);
 // c + noise[i], the same value on the three colour bytes of pixel i.
 void AddGrainRow(uint8_t* pixels, const float* noise, size_t count);
 
+// The name of the instruction set these rows would run on now.
+const char* DetailRowsTarget();
+
 }  // namespace tfx

@@ -242,6 +242,8 @@ void AddGrainRowOfTarget(uint8_t* pixels, const float* noise, size_t count) {
   AddGrainVectors(hn::CappedTag<uint32_t, 1>(), pixels, noise, count, i);
 }
 
+const char* DetailRowsTargetOfTarget() { return hwy::TargetName(HWY_TARGET); }
+
 }  // namespace HWY_NAMESPACE
 }  // namespace detail_rows
 }  // namespace tfx
@@ -256,8 +258,13 @@ HWY_EXPORT(SharpenRowOfTarget);
 HWY_EXPORT(UnsharpRowOfTarget);
 HWY_EXPORT(GrainNoiseOfTarget);
 HWY_EXPORT(AddGrainRowOfTarget);
+HWY_EXPORT(DetailRowsTargetOfTarget);
 
 }  // namespace detail_rows
+
+const char* DetailRowsTarget() {
+  return HWY_DYNAMIC_DISPATCH(detail_rows::DetailRowsTargetOfTarget)();
+}
 
 void HazeStretchRow(uint8_t* pixels, const uint8_t* dark, const uint8_t* mean, size_t count,
                     float k, float air) {

@@ -8,10 +8,14 @@
 #include <hwy/targets.h>
 
 #include "adjust/VignetteRows.h"
+#include "simd/box_rows.h"
 #include "simd/color_adjust_rows.h"
 #include "simd/dct8.h"
+#include "simd/detail_rows.h"
+#include "simd/hsl_adjust_rows.h"
 #include "simd/hsl_relight.h"
 #include "simd/hsl_rows.h"
+#include "simd/hue_rotate.h"
 #include "simd/lens_resample.h"
 #include "simd/lut_tetra_rows.h"
 #include "simd/stackblur_lanes.h"
@@ -26,10 +30,12 @@ TEST(KernelDispatch, EveryFamilyFollowsTheTargetInForce) {
     SCOPED_TRACE(name);
     std::cout << ' ' << name;
     hwy::SetSupportedTargetsForTest(target);
-    for (const char* family : {tfx::BestColorAdjustRows().name, tfx::BestHslRelightRows().name,
-                               tfx::BestLensResampleRows().name, tfx::BestVignetteKernel().name,
-                               tfx::Dct8Target(), tfx::HslRowsTarget(), tfx::TetraRowVectorTarget(),
-                               tfx::StackblurLanesTarget(), tfx::WindowHistogramTarget()}) {
+    for (const char* family :
+         {tfx::BestColorAdjustRows().name, tfx::BestHslRelightRows().name,
+          tfx::BestLensResampleRows().name, tfx::BestVignetteKernel().name, tfx::BoxRowsTarget(),
+          tfx::Dct8Target(), tfx::DetailRowsTarget(), tfx::HslAdjustRowsTarget(),
+          tfx::HslRowsTarget(), tfx::HueRotateTarget(), tfx::TetraRowVectorTarget(),
+          tfx::StackblurLanesTarget(), tfx::WindowHistogramTarget()}) {
       EXPECT_STREQ(family, name);
     }
   }
