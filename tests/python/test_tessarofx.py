@@ -19,7 +19,7 @@ def tool(*args):
     return run.stdout
 
 
-# Noise with the parts the filters treat apart: transparent rows and a green patch to key.
+# Noise with regions the filters handle differently: transparent rows and a green patch to key.
 def noisy_frame(h=48, w=64, seed=5):
     rng = np.random.default_rng(seed)
     img = rng.integers(0, 256, (h, w, 4), dtype=np.uint8)
