@@ -81,21 +81,6 @@ HWY_INLINE VU ComponentBytes(VF v) {
   return hn::And(hn::BitCast(du, rounded), hn::Set(du, 255u));
 }
 
-// Truncation toward zero of lanes known to lie inside int32, NaN excluded: the bare x86
-// instruction, without the repair of out-of-range lanes that ConvertTo adds at three more
-// operations a vector. Same results for every lane it is given.
-HWY_INLINE VI TruncateInRange(VF v) {
-#if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
-  return VI{_mm512_cvttps_epi32(v.raw)};
-#elif HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX2
-  return VI{_mm256_cvttps_epi32(v.raw)};
-#elif HWY_ARCH_X86 && HWY_TARGET <= HWY_SSSE3
-  return VI{_mm_cvttps_epi32(v.raw)};
-#else
-  return hn::ConvertTo(DI(), v);
-#endif
-}
-
 // Lanes whose byte is the truncation of the float sum v + 0.5f: from 0 up, where the sum rounds
 // across an integer only for the largest float below 0.5 (it rounds to 1). Above 0.5 the sum has
 // at most one more bit than v, and lies less than 0.5 above a power of two it crossed, so a
@@ -109,7 +94,7 @@ HWY_INLINE MF Plain(VF v) {
 HWY_INLINE VU PlainBytes(VF v) {
   const DF df;
   const VF c = hn::Min(v, hn::Set(df, 254.5f));
-  return hn::BitCast(DU(), TruncateInRange(hn::Add(c, hn::Set(df, 0.5f))));
+  return hn::BitCast(DU(), SmallToInt(hn::Add(c, hn::Set(df, 0.5f))));
 }
 
 // Pixels of a 64-byte line, and how far ahead of the first pass the pixels are prefetched.
@@ -173,7 +158,7 @@ struct Kernel {
         *axes[axis] = {hn::Sub(where, index),
                        hn::IfThenElseZero(hn::RebindMask(di, inside), hn::Set(di, stride[axis]))};
       }
-      p000 = TruncateInRange(offset);
+      p000 = SmallToInt(offset);  // below 2^22: at most 64^3 points of 4 floats
     } else {
       const VI ro = hn::GatherIndex(di, lower[0], r);
       const VI go = hn::GatherIndex(di, lower[1], g);
