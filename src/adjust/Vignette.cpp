@@ -163,19 +163,20 @@ void ApplyRun(uint8_t* dstRow, const uint8_t* srcRow, RunKind kind, size_t start
     blend.kernel->blendRun(px, from, mask, end - start, blend);
   } else {
     // Red, green and blue alike, alpha kept.
-    BestColorAdjustRows().applyTable(px, from, end - start,
-                                     kind == RunKind::kInside ? blend.inside : blend.outside);
+    blend.tables->applyTable(px, from, end - start,
+                             kind == RunKind::kInside ? blend.inside : blend.outside);
   }
 }
 
 }  // namespace
 
-VignetteBlend MakeVignetteBlend(float a, float e, float b, const VignetteKernel& kernel) {
+VignetteBlend MakeVignetteBlend(float a, float e, float b) {
   VignetteBlend p;
   p.a = a;
   p.e = e;
   p.b = b;
-  p.kernel = &kernel;
+  p.kernel = &BestVignetteKernel();
+  p.tables = &BestColorAdjustRows();
   // With g = 1 the tone curve is skipped, so each channel depends on itself alone. With g = 0 it
   // is applied with weight (...) * b, which is a signed zero, again channel by channel, when b is
   // 0 and the scaled channels and their sum stay finite.

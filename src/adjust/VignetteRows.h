@@ -23,24 +23,27 @@ struct VignetteKernel {
 // included).
 const VignetteKernel& BestVignetteKernel();
 
-// What one call derives from its arguments: the blend constants, the kernel, and per-channel
+struct ColorAdjustRows;
+
+// What one call derives from its arguments: the blend constants, the kernels, and per-channel
 // tables for the mask weights where the three channels do not interact.
 struct VignetteBlend {
   float a;
   float e;
   float b;
   const VignetteKernel* kernel;
-  uint8_t inside[256];   // g = 1: each channel times e alone
-  bool insideUnchanged;  // that table is the identity (no exposure)
-  bool outsideByTable;   // g = 0 with a zero tone-curve weight
+  const ColorAdjustRows* tables;  // for the runs that go through a table
+  uint8_t inside[256];            // g = 1: each channel times e alone
+  bool insideUnchanged;           // that table is the identity (no exposure)
+  bool outsideByTable;            // g = 0 with a zero tone-curve weight
   // b = 0 and every scaled channel finite: the curve's weight is a signed zero for every g, and
   // w * v = 0 exactly.
   bool zeroWeight;
   uint8_t outside[256];
 };
 
-VignetteBlend MakeVignetteBlend(float a, float e, float b,
-                                const VignetteKernel& kernel = BestVignetteKernel());
+// With the kernels Highway's dispatch picks now.
+VignetteBlend MakeVignetteBlend(float a, float e, float b);
 
 // Blends `count` BGRA pixels with their mask weights (in [0, 1], as the gradient makes them); the
 // same bytes as vignettePixel.

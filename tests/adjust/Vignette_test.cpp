@@ -128,8 +128,7 @@ TEST(VignetteRow, MatchesThePixelFormOnEveryColour) {
     }
     const std::vector<float> weights(4096, p.g);
     tfx_test::ForEveryTarget([&] {
-      const tfx::VignetteKernel* const kernel = &tfx::BestVignetteKernel();
-      const tfx::VignetteBlend blend = tfx::MakeVignetteBlend(p.a, p.e, p.b, *kernel);
+      const tfx::VignetteBlend blend = tfx::MakeVignetteBlend(p.a, p.e, p.b);
       ASSERT_EQ(blend.outsideByTable, p.b == 0.0f);
       std::vector<uint8_t> actual = all;
       for (size_t i = 0; i < actual.size() / 4; i += 4096) {
