@@ -21,7 +21,6 @@
 namespace {
 
 constexpr int kN = 32;
-constexpr int kCap = CubeLut::kMaxSize;
 
 float* Point(CubeLut* lut, int i, int j, int k) { return tfx_test::LatticePoint(*lut, i, j, k); }
 
@@ -185,9 +184,18 @@ TEST(Lut3dAdjust, NeutralStrengthNullAndEmptyLutsChangeNothing) {
   lut->generateLUT3DData(17);
   Point(lut.get(), 16, 16, 16)[0] = 300.0f;
   Point(lut.get(), 3, 0, 5)[2] = -7.5f;
-  const size_t latticeBytes = sizeof(float) * kCap * kCap * kCap * 3;
-  std::vector<uint8_t> lattice(latticeBytes);
-  std::memcpy(lattice.data(), Point(lut.get(), 0, 0, 0), latticeBytes);
+  // Only the 17^3 points: the rest of the 64-point lattice is never written.
+  const auto points = [&] {
+    std::vector<float> all;
+    for (int i = 0; i < 17; ++i) {
+      for (int j = 0; j < 17; ++j) {
+        const float* row = Point(lut.get(), i, j, 0);
+        all.insert(all.end(), row, row + 17 * 3);
+      }
+    }
+    return all;
+  };
+  const std::vector<float> lattice = points();
   int atlasBytes = 0;
   const uint8_t* atlas = lut->getAtlasData(&atlasBytes);
   const std::vector<uint8_t> atlasBefore(atlas, atlas + atlasBytes);
@@ -196,7 +204,7 @@ TEST(Lut3dAdjust, NeutralStrengthNullAndEmptyLutsChangeNothing) {
   for (const auto& [name, call] : neutral) {
     SCOPED_TRACE(name);
     EXPECT_EQ(call(lut.get()), lut.get());
-    EXPECT_EQ(std::memcmp(lattice.data(), Point(lut.get(), 0, 0, 0), latticeBytes), 0);
+    EXPECT_EQ(std::memcmp(lattice.data(), points().data(), lattice.size() * sizeof(float)), 0);
     EXPECT_EQ(std::memcmp(atlasBefore.data(), lut->getAtlasData(nullptr), atlasBefore.size()), 0);
     EXPECT_EQ(call(nullptr), nullptr);
     EXPECT_EQ(call(empty.get()), empty.get());
