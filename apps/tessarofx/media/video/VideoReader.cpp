@@ -38,6 +38,9 @@ struct VideoReader::Impl {
 
 namespace {
 
+// FFmpeg's AV_TIME_BASE_Q is a C compound literal, which C++ compilers reject under -Wpedantic.
+constexpr AVRational kMicroseconds{1, AV_TIME_BASE};
+
 // The native VP8/VP9 decoders drop the alpha plane that WebM keeps beside the picture; libvpx
 // reads it.
 const AVCodec* DecoderFor(const AVStream* stream, const AVCodec* found) {
@@ -281,11 +284,11 @@ void VideoReader::Impl::AccountForMissingTail() {
     end = (stream->start_time != AV_NOPTS_VALUE ? stream->start_time : 0) + stream->duration;
   else if (tag != nullptr && av_parse_time(&tagged, tag->value, 1) >= 0 && tagged > 0)
     // Matroska keeps each track's length only as a tag; the segment's may be the audio's.
-    end = av_rescale_q(tagged, AV_TIME_BASE_Q, stream->time_base);
+    end = av_rescale_q(tagged, kMicroseconds, stream->time_base);
   else if (input->duration != AV_NOPTS_VALUE && input->duration > 0)
     end = av_rescale_q(
         (input->start_time != AV_NOPTS_VALUE ? input->start_time : 0) + input->duration,
-        AV_TIME_BASE_Q, stream->time_base);
+        kMicroseconds, stream->time_base);
   const AVRational rate = av_guess_frame_rate(input.get(), stream, nullptr);
   if (end == AV_NOPTS_VALUE || rate.num <= 0) return;
   const double missing = (end - (lastPts + lastDuration)) * av_q2d(stream->time_base);
