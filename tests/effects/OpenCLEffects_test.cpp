@@ -4,6 +4,7 @@
 
 #include <cmath>
 #include <limits>
+#include <memory>
 #include <random>
 #include <string>
 #include <thread>
@@ -109,7 +110,8 @@ TEST_F(OpenCLEffects, LutKernelIsTheTetrahedralFormulaToTheByte) {
   };
   for (const Case& c : {Case{64, &every}, Case{2, &sample}, Case{17, &sample}, Case{33, &sample},
                         Case{52, &sample}}) {
-    CubeLut lut;
+    const auto lutOwned = std::make_unique<CubeLut>();  // about 3 MiB: never on the stack
+    CubeLut& lut = *lutOwned;
     FillHostileLattice(&lut, c.n, static_cast<unsigned>(c.n));
     const int width = 4096, height = static_cast<int>(c.pixels->size() / 4 / 4096);
     Bytes expected = *c.pixels;

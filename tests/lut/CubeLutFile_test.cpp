@@ -348,7 +348,8 @@ TEST(CubeLutFile, FailedReadsKeepWhatTheyRead) {
 
 TEST(CubeLutFile, RowTableTakesTheFirstRowsUnscaled) {
   TempDir dir;
-  CubeLut lut;
+  const auto lutOwned = std::make_unique<CubeLut>();  // about 3 MiB: never on the stack
+  CubeLut& lut = *lutOwned;
   lut.setRowTable(new float[CubeLut::kMaxSize][3]());
   const std::string narrow = Replace(kCube, "DOMAIN_MIN 0.0 0.0 0.0", "DOMAIN_MIN 0.5 0.5 0.5");
   ASSERT_TRUE(lut.loadFile(Wide(dir.Write("rows.cube", narrow)).c_str()));
@@ -384,7 +385,8 @@ TEST(CubeLutFile, ExtensionPicksTheReader) {
     // Neither reader runs on a refused name: the status is still the constructor's.
     EXPECT_EQ(lut->getStatus(), c.loads ? 0 : 1);
   }
-  CubeLut lut;
+  const auto lutOwned = std::make_unique<CubeLut>();
+  CubeLut& lut = *lutOwned;
   EXPECT_FALSE(lut.loadFile(nullptr));
   EXPECT_FALSE(lut.loadFile(Wide(dir.path + "/missing.cube").c_str()));
   // The wrong reader fails on the other format.
@@ -393,7 +395,8 @@ TEST(CubeLutFile, ExtensionPicksTheReader) {
 
 TEST(CubeLutFile, WidePathsBecomeUtf8) {
   TempDir dir;
-  CubeLut lut;
+  const auto lutOwned = std::make_unique<CubeLut>();
+  CubeLut& lut = *lutOwned;
   dir.Write("F\xC3\xA4rg \xE3\x82\xB0\xF0\x9F\x98\x80.Cube", kCube);
   EXPECT_TRUE(lut.loadFile((Wide(dir.path) + L"/F\u00e4rg \u30b0\U0001F600.Cube").c_str()));
   // A wide extension character is left alone by the upper-casing.
@@ -435,7 +438,8 @@ TEST(CubeLutFile, WriterHeaderAndRows) {
   const std::string header =
       "#LUT size\nLUT_3D_SIZE 2\n\n#data domain\nDOMAIN_MIN 0.0 0.0 0.0\nDOMAIN_MAX 1.0 1.0 1.0\n\n"
       "#LUT data points\n";
-  CubeLut lut;
+  const auto lutOwned = std::make_unique<CubeLut>();
+  CubeLut& lut = *lutOwned;
   lut.generateLUT3DData(2);
   const std::string path = dir.path + "/out.cube";
   ASSERT_TRUE(lut.writeLUT3D2File(path.c_str()));
@@ -448,7 +452,8 @@ TEST(CubeLutFile, WriterHeaderAndRows) {
   }
   EXPECT_EQ(tfx_test::ReadFile(path), header + rows);
 
-  CubeLut empty;
+  const auto emptyOwned = std::make_unique<CubeLut>();
+  CubeLut& empty = *emptyOwned;
   ASSERT_TRUE(empty.writeLUT3D2File(path.c_str()));
   EXPECT_EQ(tfx_test::ReadFile(path), Replace(header, "LUT_3D_SIZE 2", "LUT_3D_SIZE 0"));
 
@@ -466,7 +471,10 @@ TEST(CubeLutFile, WriteThenLoadGivesTheLatticeBack) {
   std::uniform_real_distribution<float> value(0.0f, 255.0f);
   for (const int n : {17, 64}) {
     SCOPED_TRACE(n);
-    CubeLut out, in;
+    const auto outOwned = std::make_unique<CubeLut>();
+    CubeLut& out = *outOwned;
+    const auto inOwned = std::make_unique<CubeLut>();
+    CubeLut& in = *inOwned;
     out.generateLUT3DData(n);
     const auto at = [n](CubeLut& lut, int p) {
       return &Point(lut, p / 3 / n / n, p / 3 / n % n, p / 3 % n)[p % 3];
