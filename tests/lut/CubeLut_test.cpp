@@ -227,7 +227,11 @@ TEST(CubeLut, CloneCopiesAllButTheRowTable) {
   EXPECT_EQ(5, copy->getLutSize());
   EXPECT_EQ(0, std::memcmp(lut->getFTData(nullptr), copy->getFTData(nullptr), 256 * sizeof(float)));
   EXPECT_EQ(0, std::memcmp(lut->getGTData(nullptr), copy->getGTData(nullptr), 256 * sizeof(int)));
-  EXPECT_EQ(0, std::memcmp(At(*lut, 0, 0, 0), At(*copy, 0, 0, 0), 64 * 64 * 64 * 3 * 4));
+  for (int i = 0; i < 5; ++i) {  // the points written; the rest of the array never is
+    for (int j = 0; j < 5; ++j) {
+      EXPECT_EQ(0, std::memcmp(At(*lut, i, j, 0), At(*copy, i, j, 0), 5 * 3 * sizeof(float)));
+    }
+  }
   int bytes = 0, copyBytes = 0;
   const uint8_t* atlas = lut->getAtlasData(&bytes);
   const uint8_t* copyAtlas = copy->getAtlasData(&copyBytes);
