@@ -28,7 +28,7 @@ cmake --preset tsan
 cmake --build --preset tsan -j "$jobs"
 ctest --preset tsan
 
-echo "== fuzz (libFuzzer, ASan + UBSan): each target replays its corpus, then runs for 30 s"
+echo "== fuzz (clang, libFuzzer, ASan + UBSan): the tool and the bridges build with clang too; each fuzzer replays its corpus, then runs for 30 s"
 cmake --preset fuzz
 cmake --build --preset fuzz -j "$jobs"
 mkdir -p build/fuzz/artifacts
