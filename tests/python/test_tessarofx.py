@@ -20,18 +20,17 @@ def tool(*args):
 
 
 # Noise with regions the filters handle differently: transparent rows and a green patch to key.
-def noisy_frame(h=48, w=64, seed=5):
-    rng = np.random.default_rng(seed)
-    img = rng.integers(0, 256, (h, w, 4), dtype=np.uint8)
-    img[: h // 4, :, 3] = 0  # transparent rows for the keyers and lutAToWhiteEffect
-    img[h // 2 :, : w // 3, :3] = (30, 220, 40)  # a green patch to key (BGR)
+def keyable_noise(seed, height=48, width=64):
+    img = np.random.default_rng(seed).integers(0, 256, (height, width, 4), dtype=np.uint8)
+    img[: height // 4, :, 3] = 0  # transparent rows for the keyers and lutAToWhiteEffect
+    img[height // 2 :, : width // 3, :3] = (30, 220, 40)  # a green patch to key (BGR)
     return img
 
 
 @pytest.fixture(scope="module")
 def files(tmp_path_factory):
     d = tmp_path_factory.mktemp("frames")
-    img, bg = noisy_frame(), noisy_frame(seed=9)
+    img, bg = keyable_noise(1234), keyable_noise(4321)
     tfx.write_image(d / "in.png", img)
     tfx.write_image(d / "bg.png", bg)
     tfx.bake_lut([("ColorAdjust", {"u_contrast": 40})], size=17).write(d / "look.cube")
