@@ -129,6 +129,11 @@ class Filter:
     """
 
     def __init__(self, name, *, device=None, kernels=None, **params):
+        if not isinstance(name, str):
+            # The likeliest cause is apply()'s arguments swapped; pybind11's own message would
+            # print the whole frame.
+            raise TypeError(f"a filter is named by a string, not {type(name).__name__} "
+                            "(apply takes the frame first: apply(frame, 'ColorAdjust', ...))")
         if isinstance(device, Device):
             device = device.index
         elif device is not None and (isinstance(device, bool) or not isinstance(device, int)):

@@ -254,6 +254,8 @@ def test_bad_calls_and_files(tmp_path):
         tfx.blur(frame)
     with pytest.raises(TypeError, match="bool"):
         tfx.Filter("ColorAdjust", u_exposure=True)
+    with pytest.raises(TypeError, match="frame first"):
+        tfx.apply("ColorAdjust", frame)
     with pytest.raises(ValueError, match="background"):
         tfx.Filter("ChromeKeyCombine")(frame, np.zeros((4, 8, 4), np.uint8))
     # A failure inside Running keeps the library's code.
