@@ -40,18 +40,12 @@ kernel void copy_words(global const int* src, global int* dst) {
 )";
 
 // Every test runs on the device a host gets by default, with the selection variable unset.
-class OpenCL : public testing::Test {
+class OpenCL : public tfx_test::OpenCLEffectTest {
  protected:
   void SetUp() override {
-    if (OpenCLDevices().empty()) GTEST_SKIP() << "no OpenCL platform or device on this machine";
-    ASSERT_EQ(NLECommon::CreateOpenCLDevice(-1, &device_), NLE_S_OK);
-    NLEComPtr<INLECGOpenCLOperate> operate;
-    ASSERT_EQ(device_.QueryInterface(IID_INLECGOpenCLOperate, &operate), NLE_S_OK);
-    void* programs = nullptr;
-    void* memory = nullptr;
-    ASSERT_EQ(operate->GetOpenCLHandles(&programs, &memory), NLE_S_OK);
-    programs_ = static_cast<OPENCL::openclProgramManager*>(programs);
-    memory_ = static_cast<OPENCL::openclMemManager*>(memory);
+    OpenCLEffectTest::SetUp();
+    if (IsSkipped() || HasFatalFailure()) return;
+    Handles(&programs_, &memory_);
     ASSERT_TRUE(programs_ && memory_);
   }
 
@@ -61,8 +55,6 @@ class OpenCL : public testing::Test {
     return program;
   }
 
-  ScopedVariable choice_{"TESSAROFX_OPENCL_DEVICE", nullptr};
-  NLEComPtr<INLECGDevice> device_;
   OPENCL::openclProgramManager* programs_ = nullptr;
   OPENCL::openclMemManager* memory_ = nullptr;
 };
@@ -91,13 +83,10 @@ TEST_F(OpenCL, ProgramsAreSharedByNameAndBuiltOnce) {
   // Programs belong to one device's manager.
   NLEComPtr<INLECGDevice> other;
   ASSERT_EQ(NLECommon::CreateOpenCLDevice(-1, &other), NLE_S_OK);
-  NLEComPtr<INLECGOpenCLOperate> operate;
-  ASSERT_EQ(other.QueryInterface(IID_INLECGOpenCLOperate, &operate), NLE_S_OK);
-  void* otherPrograms = nullptr;
-  void* otherMemory = nullptr;
-  ASSERT_EQ(operate->GetOpenCLHandles(&otherPrograms, &otherMemory), NLE_S_OK);
-  EXPECT_NE(otherPrograms, programs_);
-  auto* fresh = static_cast<OPENCL::openclProgramManager*>(otherPrograms);
+  OPENCL::openclProgramManager* fresh = nullptr;
+  OPENCL::openclMemManager* otherMemory = nullptr;
+  ASSERT_NO_FATAL_FAILURE(tfx_test::OpenCLHandles(other, &fresh, &otherMemory));
+  EXPECT_NE(fresh, programs_);
   EXPECT_EQ(fresh->getOpenCLProgram("tfx_copy"), nullptr);
   // ... where the file is now missing.
   tfx_test::LogCapture log;

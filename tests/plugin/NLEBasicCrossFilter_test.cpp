@@ -61,11 +61,7 @@ class CountingDevice final : public scombase::CUnknown,
                              public OPENCL::openclMemManager {
  public:
   explicit CountingDevice(INLECGDevice* real) : CUnknown(L"CountingDevice", nullptr), real_(real) {
-    NLEComPtr<INLECGOpenCLOperate> operate;
-    EXPECT_EQ(real_.QueryInterface(IID_INLECGOpenCLOperate, &operate), NLE_S_OK);
-    void* memory = nullptr;
-    EXPECT_EQ(operate->GetOpenCLHandles(&programs_, &memory), NLE_S_OK);
-    memory_ = static_cast<OPENCL::openclMemManager*>(memory);
+    tfx_test::OpenCLHandles(real, &programs_, &memory_);
   }
   ~CountingDevice() override { EXPECT_TRUE(live_.empty()) << live_.size() << " not freed"; }
 
@@ -119,7 +115,7 @@ class CountingDevice final : public scombase::CUnknown,
   }
 
   NLEComPtr<INLECGDevice> real_;
-  void* programs_ = nullptr;
+  OPENCL::openclProgramManager* programs_ = nullptr;
   OPENCL::openclMemManager* memory_ = nullptr;
   std::map<CountingMemory*, bool> live_;
 };

@@ -31,10 +31,13 @@ NLEComPtr<INLEOpenCLFrame> OpenCLEffectTest::DeviceFrame(int width, int height, 
   return frame;
 }
 
-void OpenCLEffectTest::Handles(OPENCL::openclProgramManager** programs,
-                               OPENCL::openclMemManager** memory) {
+void OpenCLHandles(INLECGDevice* device, OPENCL::openclProgramManager** programs,
+                   OPENCL::openclMemManager** memory) {
+  *programs = nullptr;
+  *memory = nullptr;
   NLEComPtr<INLECGOpenCLOperate> operate;
-  ASSERT_EQ(device_.QueryInterface(IID_INLECGOpenCLOperate, &operate), NLE_S_OK);
+  ASSERT_EQ(device->QueryInterface(IID_INLECGOpenCLOperate, reinterpret_cast<void**>(&operate)),
+            NLE_S_OK);
   void* p = nullptr;
   void* m = nullptr;
   ASSERT_EQ(operate->GetOpenCLHandles(&p, &m), NLE_S_OK);

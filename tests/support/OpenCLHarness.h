@@ -27,6 +27,10 @@ inline std::vector<NLEOpenCLDeviceInfo> OpenCLDevices() {
   return devices;
 }
 
+// The device's program manager and memory manager, as filters get them.
+void OpenCLHandles(INLECGDevice* device, OPENCL::openclProgramManager** programs,
+                   OPENCL::openclMemManager** memory);
+
 class OpenCLEffectTest : public testing::Test {
  protected:
   void SetUp() override;
@@ -36,8 +40,9 @@ class OpenCLEffectTest : public testing::Test {
   // A width x height frame in device memory holding `bgra` (packed), or zeros.
   NLEComPtr<INLEOpenCLFrame> DeviceFrame(int width, int height, const Bytes& bgra = {});
   static Bytes Download(INLEOpenCLFrame* frame);
-  // The device's program manager and memory manager, as filters get them.
-  void Handles(OPENCL::openclProgramManager** programs, OPENCL::openclMemManager** memory);
+  void Handles(OPENCL::openclProgramManager** programs, OPENCL::openclMemManager** memory) {
+    OpenCLHandles(device_.get(), programs, memory);
+  }
 
   // One frame through a filter as a host runs it: `src` (width x height, packed BGRA) becomes the
   // foreground, the destination starts as `dstFill` bytes. The status lands in *status.
