@@ -9,6 +9,10 @@ export FREI0R_PATH=$2
 work=$(mktemp -d)
 [ -n "${KEEP:-}" ] || trap 'rm -rf "$work"' EXIT
 cd "$work"
+# A registry of our own, built once before any pipeline: GStreamer rescans plug-ins whose files
+# changed, and two processes rescanning the shared one at once can miss an element.
+export GST_REGISTRY=$work/gst-registry.bin
+gst-inspect-1.0 frei0r-filter-tessarofx-coloradjust >/dev/null 2>&1
 failures=0
 fail() { echo "FAIL: $*"; failures=$((failures + 1)); }
 
