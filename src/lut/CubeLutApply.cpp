@@ -42,23 +42,24 @@ bool Coherent(const TetraTable& t, const uint8_t* in, ptrdiff_t inPitch, int wid
   return 2 * near >= kPairs;
 }
 
-// Packed points of `floats` floats. Random pixels read corners all over the lattice, and with
-// 4 KiB pages a 33-point lattice spans 141 pages and a slab of a 64-point one 272, more than the
-// first-level TLB holds; so large lattices get whole 2 MiB blocks, which Linux may back with large
-// pages on request.
-float* AllocatePoints(size_t floats) {
+// Random pixels read corners all over the lattice, and with 4 KiB pages a 33-point lattice spans
+// 141 pages and a slab of a 64-point one 272, more than the first-level TLB holds; and a band
+// sorted into slabs on 4 KiB pages took 5% longer on a 64-point lattice. So large blocks are whole
+// 2 MiB blocks, which Linux may back with large pages on request. Null when memory runs out.
+void* AllocateBlocks(size_t bytes) {
   constexpr size_t kLarge = size_t{2} << 20;
-  const size_t bytes = floats * sizeof(float);
-  if (bytes < kLarge / 8) {
-    return static_cast<float*>(std::aligned_alloc(64, (bytes + 63) / 64 * 64));
-  }
+  if (bytes < kLarge / 8) return std::aligned_alloc(64, (bytes + 63) / 64 * 64);
   const size_t blocks = (bytes + kLarge - 1) / kLarge * kLarge;
   void* p = std::aligned_alloc(kLarge, blocks);
 #if defined(__linux__) && defined(MADV_HUGEPAGE)
   if (p) madvise(p, blocks, MADV_HUGEPAGE);  // only advice: refused, the pages stay small
 #endif
-  return static_cast<float*>(p);
+  return p;
 }
+
+struct FreeBlocks {
+  void operator()(uint32_t* p) const { std::free(p); }
+};
 
 }  // namespace
 
@@ -142,8 +143,13 @@ void TetraPlan::Prepare(const TetraTable& table) {
   }
   const size_t floats = static_cast<size_t>(n) * n * n * per;
   if (floats > capacity_) {
-    points_.reset(AllocatePoints(floats));
-    capacity_ = floats;
+    points_.reset(static_cast<float*>(AllocateBlocks(floats * sizeof(float))));
+    capacity_ = points_ ? floats : 0;
+    // Out of memory, the rows take the per-pixel formula, which needs no packed points.
+    if (!points_) {
+      packed_ = false;
+      return;
+    }
   }
   float* out = points_.get();
   finite_ = true;
@@ -198,17 +204,17 @@ void TetraImage(const TetraPlan& plan, const uint8_t* in, int inPitch, uint8_t* 
     // The storage is left uninitialised, so that only the part the pixels fill is ever touched.
     const int bandRows = std::min(height, std::max(1, (1 << 20) / width));
     const size_t needed = TetraBandScratch(width, bandRows);
-    thread_local std::unique_ptr<uint32_t[]> scratch;
+    thread_local std::unique_ptr<uint32_t[], FreeBlocks> scratch;
     thread_local size_t scratchSize = 0;
     if (scratchSize < needed) {
-      scratchSize = needed;
-      scratch.reset(new uint32_t[scratchSize]);
+      scratch.reset(static_cast<uint32_t*>(AllocateBlocks(needed * sizeof(uint32_t))));
+      scratchSize = scratch ? needed : 0;
     }
     for (int y = 0; y < height; y += bandRows) {
       const int rows = std::min(bandRows, height - y);
       const uint8_t* const from = in + static_cast<ptrdiff_t>(y) * inPitch;
       uint8_t* const to = pixels + static_cast<ptrdiff_t>(y) * pitch;
-      if (Coherent(plan.Table(), from, inPitch, width, rows)) {
+      if (!scratch || Coherent(plan.Table(), from, inPitch, width, rows)) {
         for (int r = 0; r < rows; ++r) TetraRow(plan, from + r * inPitch, to + r * pitch, width, 4);
       } else {
         TetraBandVector(plan, from, inPitch, to, pitch, width, rows, scratch.get());
