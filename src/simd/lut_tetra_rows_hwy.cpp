@@ -302,7 +302,11 @@ HWY_INLINE VU Finish(const Kernel& kernel, VU p, const Prepared& prepared, size_
     return hn::Or(alpha, hn::Or(hn::Or(v8, hn::ShiftLeft<8>(v8)), hn::ShiftLeft<16>(v8)));
   } else {
     Corner c[4];
-    for (int k = 0; k < 4; ++k) c[k] = LoadCorner(kernel.points, prepared.corner[k] + at);
+    // Written out: as a loop the compiler kept the corners on the stack, a store and a load each.
+    c[0] = LoadCorner(kernel.points, prepared.corner[0] + at);
+    c[1] = LoadCorner(kernel.points, prepared.corner[1] + at);
+    c[2] = LoadCorner(kernel.points, prepared.corner[2] + at);
+    c[3] = LoadCorner(kernel.points, prepared.corner[3] + at);
     const VF r = Blend(w, c[0].red, c[1].red, c[2].red, c[3].red);
     const VF g = Blend(w, c[0].green, c[1].green, c[2].green, c[3].green);
     const VF b = Blend(w, c[0].blue, c[1].blue, c[2].blue, c[3].blue);
