@@ -127,8 +127,12 @@ struct Kernel {
   float strideF[3];
   float lastIndexF;
 
+  // Tables as doLUT builds them: each byte's position a quotient, and every point finite.
+  bool DoLutTables() const { return position && divisor != 0.0f && finite; }
+
   // The weights and corners of the pixels `p` (32-bit lanes, blue in the low byte) into lane
-  // `at` onwards of `prepared`.
+  // `at` onwards of `prepared`; kDoLut where DoLutTables() holds, which is then not tested again.
+  template <bool kDoLut>
   HWY_INLINE void Prepare(VU p, Prepared& prepared, size_t at) const {
     const DI di;
     const DF df;
@@ -140,7 +144,7 @@ struct Kernel {
 
     Axis red, green, blue;
     VI p000;
-    if (position) {
+    if (kDoLut || position) {
       // Gathers cost the most here: one a byte gives the lower index (its floor) and the
       // fraction (the rest). Index times stride and their sum stay far below 2^24, so float
       // arithmetic is exact.
@@ -149,7 +153,7 @@ struct Kernel {
       const VI channel[3] = {r, g, b};
       Axis* const axes[3] = {&red, &green, &blue};
       for (int axis = 0; axis < 3; ++axis) {
-        const VF where = divisor != 0.0f
+        const VF where = kDoLut || divisor != 0.0f
                              ? hn::Div(hn::ConvertTo(df, channel[axis]), hn::Set(df, divisor))
                              : hn::GatherIndex(df, position, channel[axis]);
         const VF index = hn::Floor(where);
@@ -175,7 +179,7 @@ struct Kernel {
 
     const VF one = hn::Set(df, 1.0f);
     const VI p111 = hn::Add(hn::Add(hn::Add(p000, red.step), green.step), blue.step);
-    if (finite) {
+    if (kDoLut || finite) {
       // Whichever of tied fractions the reference takes first, the fractions come out in
       // decreasing order, and a corner it would pass instead of the one here has weight 0, which
       // times a finite point adds nothing. So the sorted fractions, the axis of the largest and
@@ -332,11 +336,21 @@ HWY_INLINE void Block(const Kernel& kernel, const uint32_t* in, uint32_t* out, s
   const DU du;
   const size_t lanes = hn::Lanes(du);
   Prepared prepared;
-  for (size_t x = 0; x < count; x += lanes) {
-    // The hardware's own prefetch fell behind: the first load of a block waited on memory for a
-    // sixth of the time.
-    for (size_t line = 0; line < lanes; line += kLineLanes) PrefetchAhead(in + x + line);
-    kernel.Prepare(hn::LoadU(du, in + x), prepared, x);
+  // The hardware's own prefetch fell behind: the first load of a block waited on memory for a
+  // sixth of the time.
+  if (kernel.DoLutTables()) {
+    // A copy of its own keeps the kernel's values in registers: read through the reference,
+    // they were loaded again after every store to `prepared`, which might have changed them.
+    const Kernel local = kernel;
+    for (size_t x = 0; x < count; x += lanes) {
+      for (size_t line = 0; line < lanes; line += kLineLanes) PrefetchAhead(in + x + line);
+      local.Prepare<true>(hn::LoadU(du, in + x), prepared, x);
+    }
+  } else {
+    for (size_t x = 0; x < count; x += lanes) {
+      for (size_t line = 0; line < lanes; line += kLineLanes) PrefetchAhead(in + x + line);
+      kernel.Prepare<false>(hn::LoadU(du, in + x), prepared, x);
+    }
   }
   for (size_t x = 0; x < count; x += lanes) {
     hn::StoreU(Finish<kGrey>(kernel, hn::LoadU(du, in + x), prepared, x), du, out + x);
@@ -344,8 +358,9 @@ HWY_INLINE void Block(const Kernel& kernel, const uint32_t* in, uint32_t* out, s
 }
 
 // 4-byte pixels in whole blocks and vectors; the last partial vector goes through a zero-padded
-// copy, so the tail gets the same arithmetic as every other pixel.
-template <bool kGrey>
+// copy, so the tail gets the same arithmetic as every other pixel. kDirect: in place without
+// staging, for pixels whose corners are scattered (the slabs).
+template <bool kGrey, bool kDirect = false>
 void Rows4(const Kernel& kernel, const uint8_t* in, uint8_t* out, size_t width) {
   const DU du;
   const size_t lanes = hn::Lanes(du);
@@ -353,7 +368,7 @@ void Rows4(const Kernel& kernel, const uint8_t* in, uint8_t* out, size_t width) 
   for (size_t start = 0; start < whole; start += kBlock) {
     const size_t count = whole - start < kBlock ? whole - start : kBlock;
     // Rows only reaches here with both rows 4-byte aligned; odd ones go through RowsN.
-    if (in == out) {
+    if (in == out && !kDirect) {
       // In place, a block's results go through the stack first: stored straight over the row, on
       // frames whose neighbouring pixels share corners (so that the corner loads finish early),
       // they held up the next block's pixel loads, and a photo-like frame took 40% longer than
@@ -571,7 +586,7 @@ void TetraBandOfTarget(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPit
               [&](const uint32_t* from, uint32_t*) { slabs.Sort(hn::LoadU(du, from)); });
   for (int k = 0; k < kSlabs; ++k) {
     uint8_t* const pixels = reinterpret_cast<uint8_t*>(slabs.pixels[k]);
-    Rows4<false>(kernel, pixels, pixels, slabs.count[k]);
+    Rows4<false, true>(kernel, pixels, pixels, slabs.count[k]);
     slabs.count[k] = 0;
   }
   slabs.bits = bits;
