@@ -19,18 +19,19 @@ def tool(*args):
     return run.stdout
 
 
-# Noise with regions the filters handle differently: transparent rows and a green patch to key.
-def keyable_noise(seed, height=48, width=64):
-    img = np.random.default_rng(seed).integers(0, 256, (height, width, 4), dtype=np.uint8)
-    img[: height // 4, :, 3] = 0  # transparent rows for the keyers and lutAToWhiteEffect
-    img[height // 2 :, : width // 3, :3] = (30, 220, 40)  # a green patch to key (BGR)
-    return img
+# Random pixels with a transparent top quarter and a green patch, so that the keyers and the
+# alpha filter find work of their own.
+def random_frame(seed, rows=48, cols=64):
+    frame = np.random.default_rng(seed).integers(0, 256, (rows, cols, 4), dtype=np.uint8)
+    frame[: rows // 4, :, 3] = 0
+    frame[rows // 2 :, : cols // 3, :3] = (30, 220, 40)  # BGR
+    return frame
 
 
 @pytest.fixture(scope="module")
 def files(tmp_path_factory):
     d = tmp_path_factory.mktemp("frames")
-    img, bg = keyable_noise(1234), keyable_noise(4321)
+    img, bg = random_frame(1234), random_frame(4321)
     tfx.write_image(d / "in.png", img)
     tfx.write_image(d / "bg.png", bg)
     tfx.bake_lut([("ColorAdjust", {"u_contrast": 40})], size=17).write(d / "look.cube")
