@@ -329,6 +329,21 @@ HWY_INLINE VU Finish(const Kernel& kernel, VU p, const Prepared& prepared, size_
   }
 }
 
+// The first pass over `count` pixels. The kernel comes by value: read through a reference, its
+// values were loaded again after every store to `prepared`, which might have changed them.
+template <bool kDoLut>
+HWY_INLINE void PrepareBlock(const Kernel kernel, const uint32_t* in, Prepared& prepared,
+                             size_t count) {
+  const DU du;
+  const size_t lanes = hn::Lanes(du);
+  for (size_t x = 0; x < count; x += lanes) {
+    // The hardware's own prefetch fell behind: the first load of a block waited on memory for a
+    // sixth of the time.
+    for (size_t line = 0; line < lanes; line += kLineLanes) PrefetchAhead(in + x + line);
+    kernel.Prepare<kDoLut>(hn::LoadU(du, in + x), prepared, x);
+  }
+}
+
 // `count` 4-byte pixels (a whole number of vectors, at most kBlock) from `in` to `out`, which may
 // be the same.
 template <bool kGrey>
@@ -336,21 +351,10 @@ HWY_INLINE void Block(const Kernel& kernel, const uint32_t* in, uint32_t* out, s
   const DU du;
   const size_t lanes = hn::Lanes(du);
   Prepared prepared;
-  // The hardware's own prefetch fell behind: the first load of a block waited on memory for a
-  // sixth of the time.
   if (kernel.DoLutTables()) {
-    // A copy of its own keeps the kernel's values in registers: read through the reference,
-    // they were loaded again after every store to `prepared`, which might have changed them.
-    const Kernel local = kernel;
-    for (size_t x = 0; x < count; x += lanes) {
-      for (size_t line = 0; line < lanes; line += kLineLanes) PrefetchAhead(in + x + line);
-      local.Prepare<true>(hn::LoadU(du, in + x), prepared, x);
-    }
+    PrepareBlock<true>(kernel, in, prepared, count);
   } else {
-    for (size_t x = 0; x < count; x += lanes) {
-      for (size_t line = 0; line < lanes; line += kLineLanes) PrefetchAhead(in + x + line);
-      kernel.Prepare<false>(hn::LoadU(du, in + x), prepared, x);
-    }
+    PrepareBlock<false>(kernel, in, prepared, count);
   }
   for (size_t x = 0; x < count; x += lanes) {
     hn::StoreU(Finish<kGrey>(kernel, hn::LoadU(du, in + x), prepared, x), du, out + x);
