@@ -5,11 +5,13 @@
 #include <gtest/gtest.h>
 #include <stdlib.h>
 
+#include <algorithm>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <sstream>
 #include <string>
+#include <vector>
 
 namespace tfx_test {
 
@@ -33,6 +35,16 @@ struct TempDir {
   TempDir& operator=(const TempDir&) = delete;
 
   std::string Path(const std::string& name) const { return path + "/" + name; }
+
+  // What the directory holds, in name order: a failed step must leave no output or temporary.
+  std::vector<std::string> Names() const {
+    std::vector<std::string> names;
+    for (const auto& e : std::filesystem::directory_iterator(path)) {
+      names.push_back(e.path().filename().string());
+    }
+    std::sort(names.begin(), names.end());
+    return names;
+  }
 
   // Writes `bytes` as they are to `name` and returns its full path.
   std::string Write(const std::string& name, const std::string& bytes) const {

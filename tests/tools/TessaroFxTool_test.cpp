@@ -92,12 +92,7 @@ class ToolTest : public ::testing::Test {
 
   void WriteText(const std::string& name, const std::string& text) { dir_.Write(name, text); }
 
-  std::vector<std::string> Listing() const {
-    std::vector<std::string> names;
-    for (const auto& e : fs::directory_iterator(dir_.path)) names.push_back(e.path().filename());
-    std::sort(names.begin(), names.end());
-    return names;
-  }
+  std::vector<std::string> Listing() const { return dir_.Names(); }
 
   tfx_test::TempDir dir_;
 };
@@ -314,32 +309,13 @@ TEST_F(ToolTest, EveryFxCallingKindRunsWithTheOutputSizeItPromises) {
                                                          {"scale-alpha 0 0 255 255 3", {39, 27}},
                                                          {"clip 11 7", {11, 7}},
                                                          {"pad-blur 5", {43, 31}}};
-  for (const char* args : {"hue 90",
-                           "temperature 8000",
-                           "vignette -80 50 50 30 0 20",
-                           "hsl 0 50 60 0 0 0",
-                           "temperature-colors",
-                           "distort 40",
-                           "blur 3",
-                           "stack-pass 2 1",
-                           "box-blur 2",
-                           "window-mean 2",
-                           "window-variance 2",
-                           "percentile 2 0.5",
-                           "denoise 200",
-                           "denoise-hsl 200",
-                           "dct-denoise 30",
-                           "local-denoise 5 20",
-                           "dehaze 50",
-                           "dark-channel",
-                           "haze-veil 0.5",
-                           "sharpen 100",
-                           "clarity 40",
-                           "diffuse 300",
-                           "grain 50 100",
-                           "first-row"}) {
+  std::istringstream sameSize(
+      "hue 90;temperature 8000;vignette -80 50 50 30 0 20;hsl 0 50 60 0 0 0;temperature-colors;"
+      "distort 40;blur 3;stack-pass 2 1;box-blur 2;window-mean 2;window-variance 2;"
+      "percentile 2 0.5;denoise 200;denoise-hsl 200;dct-denoise 30;local-denoise 5 20;dehaze 50;"
+      "dark-channel;haze-veil 0.5;sharpen 100;clarity 40;diffuse 300;grain 50 100;first-row");
+  for (std::string args; std::getline(sameSize, args, ';');)
     cases.emplace_back(args, cv::Size(33, 21));
-  }
   for (const auto& [args, size] : cases) {
     SCOPED_TRACE(args);
     const Outcome r = Run("fx " + args + " in.png out.png");
@@ -468,7 +444,8 @@ TEST_F(ToolTest, LutInfoShowsSizeTitleAndDomainOrWhereTheReaderStopped) {
 
 TEST_F(ToolTest, LutConvertResamplesATableTooBigForThePlugin) {
   // A channel rotation: linear, so tetrahedral resampling must reproduce it exactly at any size,
-  // and any mix-up of axes or corners shows.
+  // and any mix-up of axes or corners shows. The file goes out through the plug-in's writer, whose
+  // tables read back as written (the LUT file tests).
   WriteText("big.cube", CubeText(65, "# rotation\n", 1, 0, true));
   for (const int n : {33, 20}) {
     SCOPED_TRACE(n);
@@ -485,21 +462,6 @@ TEST_F(ToolTest, LutConvertResamplesATableTooBigForThePlugin) {
                         std::abs(rows[at][2] - red)});
     }
     EXPECT_LT(worst, 1e-6);
-  }
-
-  // Through the LUT effect: each colour rotated, within the rounding of doLUT.
-  WriteInput("in.png", 17, 9);
-  const Outcome r =
-      Run("apply ColorLut3dAdjust -p lut3dPath=" + Path("small33.cube") + " in.png out.png");
-  ASSERT_EQ(r.exitCode, 0) << r.err;
-  const cv::Mat in = Read("in.png"), out = Read("out.png");
-  ASSERT_EQ(out.size(), in.size());
-  for (int y = 0; y < in.rows; ++y) {
-    for (int x = 0; x < in.cols; ++x) {
-      const cv::Vec4b a = in.at<cv::Vec4b>(y, x), b = out.at<cv::Vec4b>(y, x);
-      const cv::Vec4b rotated(a[2], a[0], a[1], a[3]);  // blue <- red, green <- blue, red <- green
-      for (int c = 0; c < 4; ++c) EXPECT_LE(std::abs(b[c] - rotated[c]), 1) << x << "," << y;
-    }
   }
 }
 

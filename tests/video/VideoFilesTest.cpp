@@ -90,13 +90,7 @@ class VideoFiles : public ::testing::Test {
     return s.ok() ? writer.Finish() : s;
   }
   // Nothing but the named files: no target after a failure, no hidden temporary left behind.
-  std::vector<std::string> Listing() const {
-    std::vector<std::string> names;
-    for (const auto& entry : fs::directory_iterator(dir_.path))
-      names.push_back(entry.path().filename().string());
-    std::sort(names.begin(), names.end());
-    return names;
-  }
+  std::vector<std::string> Listing() const { return dir_.Names(); }
 
   static double Seconds(const Clip& clip, size_t i) {
     return double(clip.frames[i].pts) * clip.info.timeBase.num / clip.info.timeBase.den;
