@@ -64,9 +64,11 @@ TEST(HueAdjust, MatchesTheSequentialFormulaOnEveryColourAndTarget) {
     float m[9];
     ReferenceMatrix(angle, m);
     EXPECT_EQ(std::memcmp(m, matrix, sizeof(m)), 0);
-    // The per-pixel form is the same step.
+    // The per-pixel form is the same step: on every grey, which stays whatever the angle (rows
+    // that sum to 1 in float would truncate most greys a level down), and a sample of the rest.
     const uint8_t* in = EveryColour().GetBits();
-    for (size_t i = 0; i < EveryColour().GetSize(); i += 4 * 4099) {
+    for (size_t i = 0; i < EveryColour().GetSize(); i += 4) {
+      if (i % (4 * 4099) != 0 && (in[i] != in[i + 1] || in[i + 1] != in[i + 2])) continue;
       tagRGBQUAD c;
       std::memcpy(&c, in + i, 4);
       const tagRGBQUAD out = transformHue1(c, angle);
@@ -99,22 +101,6 @@ TEST(HueAdjust, LeavesTheMatrixAloneWithoutWork) {
   for (const float angle : {0.0f, NAN, INFINITY}) hueAdjustment(image.get(), angle);
   hueAdjustment(nullptr, 30.0f);
   EXPECT_EQ(std::memcmp(before, matrix, sizeof(before)), 0);
-}
-
-TEST(HueAdjust, KeepsGreys) {
-  // Rows that sum to 1 in float would truncate most greys a level down; greys stay put.
-  CxImage ramp(256, 1, 32, IPF_BGRA);
-  for (int v = 0; v < 256; ++v) std::memset(ramp.GetBits() + 4 * v, v, 4);
-  for (int angle = -180; angle <= 360; angle += 15) {
-    const Image grey = Clone(ramp);
-    hueAdjustment(grey.get(), static_cast<float>(angle));
-    ASSERT_TRUE(SameBuffer(ramp, *grey)) << angle;
-    for (int v = 0; v < 256; v += 5) {
-      const tagRGBQUAD c = ramp.GetPixelColor(v, 0, true);
-      const tagRGBQUAD out = transformHue1(c, static_cast<float>(angle));
-      ASSERT_EQ(std::memcmp(&out, &c, 4), 0) << angle << ' ' << v;
-    }
-  }
 }
 
 TEST(HueAdjust, ConcurrentRotationsWithDifferentAnglesStayApart) {

@@ -2,14 +2,14 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <limits>
 #include <string>
 #include <vector>
 
-#include "adjust/ColorAdjustReference.h"
-#include "adjust/LightAdjustReference.h"
 #include "adjust/LightAdjustTables.h"
+#include "support/ImageBuilders.h"
 
 namespace {
 
@@ -18,6 +18,58 @@ using tfx_test::EveryColour;
 using tfx_test::Image;
 using tfx_test::NoiseImage;
 using tfx_test::SameBuffer;
+
+// Plain per-pixel versions of the light adjustments, written from the formulas alone and run
+// through GetPixelColor/SetPixelColor, for the table paths to be compared against. They share no
+// code with the library beyond CxImage.
+
+float Enhance(float ch, float k) { return 255.0f - (255.0f - ch) * (255.0f - k * ch) / 255.0f; }
+
+// fn(channel, M) gives the new channel.
+template <class Fn>
+void EveryPixel(CxImage* image, Fn fn) {
+  for (unsigned long y = 0; y < image->GetHeight(); ++y) {
+    for (unsigned long x = 0; x < image->GetWidth(); ++x) {
+      tagRGBQUAD c = image->GetPixelColor(x, y, true);
+      const float m = std::max({c.rgbRed, c.rgbGreen, c.rgbBlue}) / 255.0f;
+      c.rgbBlue = fn(c.rgbBlue, m);
+      c.rgbGreen = fn(c.rgbGreen, m);
+      c.rgbRed = fn(c.rgbRed, m);
+      image->SetPixelColor(x, y, c);
+    }
+  }
+}
+
+uint8_t Wrapped(float v) { return static_cast<uint8_t>(static_cast<int>(v)); }
+
+uint8_t Clamped(float v) { return static_cast<uint8_t>(std::clamp(static_cast<int>(v), 0, 255)); }
+
+void ReferenceHighlight(CxImage* image, float h) {
+  if (h == 0) return;
+  EveryPixel(image, [&](uint8_t ch, float m) { return Wrapped(Enhance(ch, m * (h / 100.0f))); });
+}
+
+void ReferenceShadow(CxImage* image, float s) {
+  if (s == 0) return;
+  const float f = static_cast<float>(s / 100.0f * (s > 0 ? 2.0 : 0.5));
+  EveryPixel(image, [&](uint8_t ch, float m) { return Wrapped(Enhance(ch, (1 - m) * f)); });
+}
+
+void ReferenceWhiteLevel(CxImage* image, float w) {
+  if (w == 0) return;
+  EveryPixel(image, [&](uint8_t ch, float m) {
+    const float k = m * (w / 100.0f);
+    float t = Enhance(ch, k);
+    if (k > 0) t = Enhance(t, k);
+    return Clamped(t);
+  });
+}
+
+void ReferenceBlackLevel(CxImage* image, float k0) {
+  if (k0 == 0) return;
+  const float f = static_cast<float>(k0 / 100.0f * (k0 > 0 ? 0.5 : 2.0));
+  EveryPixel(image, [&](uint8_t ch, float m) { return Clamped(Enhance(ch, (1 - m) * f)); });
+}
 
 struct Operation {
   const char* name;
@@ -30,14 +82,13 @@ struct Operation {
   std::vector<float> sweep;
 };
 
-const Operation kHighlight = {"Highlight", hdrHighlight, tfx_test::ReferenceHighlight, calHighlight,
+const Operation kHighlight = {"Highlight", hdrHighlight, ReferenceHighlight,  calHighlight,
                               1.0f,        1.0f,         {100, -100, 37, 300}};
-const Operation kShadow = {"Shadow", hdrShadow, tfx_test::ReferenceShadow, calShadow,
+const Operation kShadow = {"Shadow", hdrShadow, ReferenceShadow,         calShadow,
                            2.0f,     0.5f,      {100, -100, -41.5f, 250}};
-const Operation kWhiteLevel = {"WhiteLevel",        hdrWhiteLevel, tfx_test::ReferenceWhiteLevel,
-                               calWhiteLevelPixel,  1.0f,          1.0f,
-                               {100, -100, 63, 250}};
-const Operation kBlackLevel = {"BlackLevel",         hdrBlackLevel, tfx_test::ReferenceBlackLevel,
+const Operation kWhiteLevel = {"WhiteLevel", hdrWhiteLevel, ReferenceWhiteLevel, calWhiteLevelPixel,
+                               1.0f,         1.0f,          {100, -100, 63, 250}};
+const Operation kBlackLevel = {"BlackLevel",         hdrBlackLevel, ReferenceBlackLevel,
                                calBlackLevelPixel,   0.5f,          2.0f,
                                {100, -100, 29, -180}};
 const Operation* const kOperations[] = {&kHighlight, &kShadow, &kWhiteLevel, &kBlackLevel};
@@ -75,10 +126,10 @@ TEST(LightAdjust, OnePassEqualsTheFourOperationsInTurn) {
     SCOPED_TRACE(testing::Message() << c.h << ' ' << c.s << ' ' << c.w << ' ' << c.k0);
     EXPECT_EQ(tfx::FoldLightAdjust(c.h, c.s, c.w, c.k0, table.data()), c.folds);
     const Image expected = Clone(EveryColour());
-    tfx_test::ReferenceHighlight(expected.get(), c.h);
-    tfx_test::ReferenceShadow(expected.get(), c.s);
-    tfx_test::ReferenceWhiteLevel(expected.get(), c.w);
-    tfx_test::ReferenceBlackLevel(expected.get(), c.k0);
+    ReferenceHighlight(expected.get(), c.h);
+    ReferenceShadow(expected.get(), c.s);
+    ReferenceWhiteLevel(expected.get(), c.w);
+    ReferenceBlackLevel(expected.get(), c.k0);
     const Image actual = Clone(EveryColour());
     EXPECT_EQ(tfx::LightAdjust(actual.get(), c.h, c.s, c.w, c.k0), actual.get());
     EXPECT_TRUE(SameBuffer(*expected, *actual));
@@ -101,10 +152,10 @@ TEST(LightAdjust, MatchesReferenceOnPaddedRowsAndOtherLayouts) {
         EXPECT_TRUE(SameBuffer(*expected, *actual));
       }
       const Image actual = Clone(*original), expected = Clone(*original);
-      tfx_test::ReferenceHighlight(expected.get(), 70);
-      tfx_test::ReferenceShadow(expected.get(), -40);
-      tfx_test::ReferenceWhiteLevel(expected.get(), 30);
-      tfx_test::ReferenceBlackLevel(expected.get(), -55);
+      ReferenceHighlight(expected.get(), 70);
+      ReferenceShadow(expected.get(), -40);
+      ReferenceWhiteLevel(expected.get(), 30);
+      ReferenceBlackLevel(expected.get(), -55);
       tfx::LightAdjust(actual.get(), 70, -40, 30, -55);
       EXPECT_TRUE(SameBuffer(*expected, *actual));
     }
