@@ -3,14 +3,17 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <climits>
 #include <cstdint>
 #include <cstring>
+#include <functional>
 #include <iterator>
 #include <utility>
 #include <vector>
 
 #include "support/EveryTarget.h"
 #include "support/ImageBuilders.h"
+#include "tessarofx/Denoise.h"
 
 namespace {
 
@@ -252,7 +255,7 @@ TEST(WindowFilters, MeanVarianceAndPercentileFollowTheDefinedWalk) {
       fastWindowVarianceFilter(src.data(), variance.data(), c.width, c.height, c.radius);
       EXPECT_EQ(mean, LiteralWindowWalk(src, c.width, c.height, c.radius, Stat::kMean));
       EXPECT_EQ(variance, LiteralWindowWalk(src, c.width, c.height, c.radius, Stat::kVariance));
-      for (const float p : {0.0f, 0.5f, 0.93f, 1.0f}) {
+      for (const float p : {-2.0f, 0.0f, 0.5f, 0.93f, 1.0f, 7.0f}) {  // out of 0..1 is clamped
         if (big) break;
         const Bytes expected =
             LiteralWindowWalk(src, c.width, c.height, c.radius, Stat::kPercentile, p);
@@ -267,18 +270,8 @@ TEST(WindowFilters, MeanVarianceAndPercentileFollowTheDefinedWalk) {
 }
 
 // The skipped last column and the variance's low byte are in the walk above (widths radius + 2
-// to 2 radius, noise whose variance passes 255); percentiles out of 0..1 and bins that wrap are
-// not.
+// to 2 radius, noise whose variance passes 255); bins that wrap are not.
 TEST(WindowFilters, KeepTheirDefinedQuirksOnSmallWindows) {
-  // One 3x3 window at the centre: percentiles 0 (or below), 0.5 and 1 (or above).
-  const Bytes window = {9, 3, 7, 1, 5, 8, 2, 6, 4};
-  const std::pair<float, uint8_t> cases[] = {
-      {0.0f, 1}, {-2.0f, 1}, {0.5f, 5}, {1.0f, 9}, {7.0f, 9}};
-  for (const auto& [percentile, centre] : cases) {
-    Bytes out(9);
-    fastFilter(window.data(), out.data(), 3, 3, 1, percentile);
-    EXPECT_EQ(out[4], centre) << percentile;
-  }
   // A 17x17 window of one value holds 289 = 33 mod 256 in its bin: the median's target, 145, is
   // never reached and the low byte of 256 is stored; a target of 29 is.
   const Bytes flat(17 * 17, 200);
@@ -299,6 +292,37 @@ TEST(CalFilterValue, ScansForTheFirstNonEmptyBinReachingTheTarget) {
   EXPECT_EQ(calFilterValue(bins, 0, 0), 0);
   EXPECT_EQ(calFilterValue(bins, -3, 0), 0);
   EXPECT_EQ(calFilterValue(nullptr, 6, 0), 0);
+}
+
+// A radius past every edge gives the window of the whole plane, however far past it is. The
+// plane is wide enough that rows a radius of INT_MAX away lie outside the address space.
+TEST(WindowFilters, TreatRadiiFarBeyondThePlaneAsTheWholePlane) {
+  const int w = 1 << 17, h = 2;
+  const std::vector<uint8_t> src = NoiseBytes(size_t{w} * h, 3);
+  using Filter = std::function<void(std::vector<uint8_t>&, int radius)>;
+  const struct {
+    const char* name;
+    Filter run;
+  } filters[] = {
+      {"mean", [&](auto& out, int r) { fastWindowAverageFilter(src.data(), out.data(), w, h, r); }},
+      {"variance",
+       [&](auto& out, int r) { fastWindowVarianceFilter(src.data(), out.data(), w, h, r); }},
+      {"channelDenoise",
+       [&](auto& out, int r) {
+         out = src;
+         channelDenoise(out.data(), w, h, r < INT_MAX / 2 ? 2 * r + 1 : INT_MAX, 20.0f);
+       }},
+  };
+  for (const auto& filter : filters) {
+    SCOPED_TRACE(filter.name);
+    std::vector<uint8_t> whole(src.size()), far(src.size());
+    filter.run(whole, w);
+    for (const int radius : {1 << 30, INT_MAX}) {
+      SCOPED_TRACE(radius);
+      filter.run(far, radius);
+      EXPECT_EQ(far, whole);
+    }
+  }
 }
 
 // ---- Bad input --------------------------------------------------------------------------------

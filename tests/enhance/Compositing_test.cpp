@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <array>
 #include <climits>
 #include <cstdint>
 #include <cstring>
@@ -195,6 +196,14 @@ TEST(MergeImage, RefusesNullImagesAndIgnoresWhatItCannotReach) {
   EXPECT_TRUE(mergeImage(dst.data(), src.data(), 4, 4, 4, 4, 16, 0, 0, INT_MIN, 4, 0, 0, 100, 100));
   EXPECT_TRUE(mergeImage(dst.data(), src.data(), 4, 4, 4, 4, 16, INT_MIN, INT_MIN, INT_MAX, INT_MAX,
                          0, 0, 100, 100));
+  // Destinations and sources above INT_MAX bytes, the largest past 64-bit row offsets, are
+  // refused before a row is touched.
+  for (const auto& [dw, dh, sw, sh, stride] :
+       {std::array{INT_MAX, INT_MAX, 4, 4, 16}, std::array{1 << 16, 1 << 14, 4, 4, 16},
+        std::array{1 << 15, 1 << 14, 4, 4, 16}, std::array{4, 4, 4, 1 << 16, 1 << 16}}) {
+    EXPECT_TRUE(
+        mergeImage(dst.data(), src.data(), dw, dh, sw, sh, stride, 0, 0, -1, -1, 0, 0, 100, 100));
+  }
   EXPECT_EQ(dst, before);
 }
 
@@ -216,6 +225,7 @@ TEST(ClipOutBorder, CopiesTheCentredBlock) {
   EXPECT_FALSE(clipOutBorder(src.data(), dst.data(), 7, 6, 32, 4, 7, 20));
   EXPECT_FALSE(clipOutBorder(src.data(), dst.data(), 7, 6, 27, 4, 3, 20));
   EXPECT_FALSE(clipOutBorder(src.data(), dst.data(), 7, 6, 32, 4, 3, 15));
+  EXPECT_FALSE(clipOutBorder(src.data(), dst.data(), 7, 6, INT_MAX / 2, 4, 3, 20));
   EXPECT_TRUE(clipOutBorder(src.data(), dst.data(), 7, 6, 32, 4, 0, 20));
 }
 
@@ -267,6 +277,7 @@ TEST(FrameFunctions, RefuseBadInputWithoutTouchingTheOutput) {
       {"frame: stride below row", makeImageFrame(o, w, h, s, 4, 4, 15, 32, c, 1)},
       {"frame: huge border", makeImageFrame(o, w, h, s, 4, 4, 16, 32, c, INT_MAX / 2)},
       {"frame: huge image", makeImageFrame(o, w, h, s, 1 << 16, 1 << 16, 1 << 18, 32, c, 0)},
+      {"frame: huge stride", makeImageFrame(o, w, h, s, 2, 3, INT_MAX / 2, 32, c, 1)},
       {"scale: null output", scaleImage(nullptr, w, h, s, 4, 4, 32, c, 1)},
       {"scale: null height", scaleImage(o, w, nullptr, s, 4, 4, 32, c, 1)},
       {"scale: null source", scaleImage(o, w, h, nullptr, 4, 4, 32, c, 1)},

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <climits>
 #include <cmath>
 #include <cstdint>
 #include <cstring>
@@ -11,6 +12,7 @@
 #include "simd/hsl_rows.h"
 #include "support/EveryTarget.h"
 #include "support/ImageBuilders.h"
+#include "tessarofx/Blur.h"
 #include "tessarofx/Denoise.h"
 
 namespace {
@@ -229,10 +231,11 @@ TEST(DctDenoise, LeavesBadInputAlone) {
   const std::vector<uint8_t> filler = out;
   dct_Denosing(nullptr, out.data(), 16, 12, 16, 10.0f);
   dct_Denosing(p.bytes.data(), nullptr, 16, 12, 16, 10.0f);
-  // Sizes below 1, and strides below a row.
+  // Sizes below 1, strides below a row, and rows past INT_MAX bytes.
   for (const auto& [w, h, stride] :
        {std::array{0, 12, 16}, std::array{-3, 12, 16}, std::array{16, 0, 16},
-        std::array{16, -1, 16}, std::array{16, 12, 15}, std::array{16, 12, -16}}) {
+        std::array{16, -1, 16}, std::array{16, 12, 15}, std::array{16, 12, -16},
+        std::array{16, 3, INT_MAX / 2}}) {
     dct_Denosing(p.bytes.data(), out.data(), w, h, stride, 10.0f);
   }
   EXPECT_EQ(out, filler);
@@ -244,6 +247,73 @@ TEST(DctDenoise, LeavesBadInputAlone) {
     dct_Denosing(inPlace.data(), inPlace.data(), w, h, w, 50.0f);
     EXPECT_EQ(inPlace, small.bytes);
   }
+}
+
+// 24-bit rows of width * 3 bytes, not padded to 4: recombining the planes would re-create the
+// image with padded rows that the wrapped buffer cannot hold.
+TEST(DeNoise, LeavesAWrappedImageItsRowsCannotBePaddedIn) {
+  std::vector<uint8_t> pixels = NoiseBytes(15 * 12, 3);
+  const std::vector<uint8_t> before = pixels;
+  uint8_t* bits = pixels.data();
+  CxImage image(&bits, 5, 12, 24, 15, IPF_BGR);
+  for (auto* denoise : {deNoiseRGB, deNoiseLumiance}) {
+    EXPECT_EQ(denoise(&image, 80.0f), &image);
+    EXPECT_EQ(image.GetWidth(), 5u);
+    EXPECT_EQ(image.GetEffWidth(), 15u);
+    EXPECT_EQ(pixels, before);
+  }
+}
+
+// ---- The window denoiser ------------------------------------------------------------------
+
+TEST(ChannelDenoise, PullsEachPixelTowardsItsWindowMean) {
+  // Noise with flat patches: zero variance bytes come from flat windows and from noisy ones
+  // whose variance wrapped.
+  const int w = 61, h = 47;
+  std::vector<uint8_t> source = NoiseBytes(w * h, 7);
+  for (int i = 0; i < w * h; ++i) source[i] = (i % w / 8 + i / w / 8) % 3 ? source[i] : 90;
+  const auto byte = [](double x) { return static_cast<int>(std::clamp(x, 0.0, 255.0)); };
+  for (const int windowSize : {1, 3, 4, 7}) {
+    std::vector<uint8_t> mean(w * h), variance(w * h);
+    fastWindowAverageFilter(source.data(), mean.data(), w, h, (windowSize - 1) / 2);
+    fastWindowVarianceFilter(source.data(), variance.data(), w, h, (windowSize - 1) / 2);
+    EXPECT_NE(std::count(variance.begin(), variance.end(), 0), 0);
+    for (const float noise : {0.0f, 0.5f, 40.0f, 1e6f}) {
+      SCOPED_TRACE("window " + std::to_string(windowSize) + ", noise " + std::to_string(noise));
+      std::vector<uint8_t> plane = source;
+      channelDenoise(plane.data(), w, h, windowSize, noise);
+      for (int i = 0; i < w * h; ++i) {
+        const double v = variance[i], k = v / (v + noise);
+        const double value = source[i] * k + mean[i] * (1 - k);
+        if (v == 0) {
+          ASSERT_EQ(plane[i], mean[i]) << i;  // whatever the noise, 0 included
+        } else if (noise == 0.0f) {
+          ASSERT_EQ(plane[i], source[i]) << i;
+        } else {
+          // Float rounding may put a value within 1e-4 of an integer on either side of it.
+          ASSERT_TRUE(plane[i] == byte(value - 1e-4) || plane[i] == byte(value + 1e-4))
+              << i << ": " << int(plane[i]) << " for " << value;
+        }
+      }
+    }
+  }
+}
+
+TEST(ChannelDenoise, LeavesBadInputAlone) {
+  const std::vector<uint8_t> source = NoiseBytes(200, 9);
+  struct Case {
+    int width, height, windowSize;
+  };
+  // Sizes below 1, window sizes below 1, and an area past 2^31 - 1 bytes.
+  for (const Case c : {Case{0, 10, 5}, Case{-2, 10, 5}, Case{20, 0, 5}, Case{20, -7, 5},
+                       Case{20, 10, 0}, Case{20, 10, -5}, Case{1 << 16, 1 << 15, 5}}) {
+    SCOPED_TRACE(std::to_string(c.width) + "x" + std::to_string(c.height) + ", window " +
+                 std::to_string(c.windowSize));
+    std::vector<uint8_t> plane = source;
+    channelDenoise(plane.data(), c.width, c.height, c.windowSize, 10.0f);
+    EXPECT_EQ(plane, source);
+  }
+  channelDenoise(nullptr, 20, 10, 5, 10.0f);
 }
 
 // ---- Colour images -----------------------------------------------------------------------------

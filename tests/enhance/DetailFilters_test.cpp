@@ -276,6 +276,7 @@ TEST(Dehaze, PlanesHoldTheDarkChannelAndTheHazeLevel) {
   EXPECT_EQ(calL(d, nullptr, 3, 2, 1.0f), nullptr);
   EXPECT_EQ(calL(d, mean, 0, 2, 1.0f), nullptr);
   EXPECT_EQ(calL(d, mean, 3, -2, 1.0f), nullptr);
+  EXPECT_EQ(calL(d, mean, 65536, 65536, 1.0f), nullptr);  // above INT_MAX bytes: nothing read
 }
 
 }  // namespace

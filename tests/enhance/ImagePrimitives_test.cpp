@@ -5,9 +5,11 @@
 #include <algorithm>
 #include <climits>
 #include <cstdint>
+#include <cstring>
 #include <vector>
 
 #include "support/ImageBuilders.h"
+#include "tessarofx/AlignedMemory.h"
 
 namespace {
 
@@ -173,14 +175,16 @@ TEST(CopyBorder, ReportsBadArguments) {
   EXPECT_EQ(dst, untouched);
 }
 
-bool Aligned(const void* p) { return reinterpret_cast<uintptr_t>(p) % 64 == 0; }
+bool AlignedTo(const void* p, uintptr_t alignment) {
+  return reinterpret_cast<uintptr_t>(p) % alignment == 0;
+}
 
 TEST(PrimitiveAllocation, AlignsRowsAndVectorsAndRefusesBadSizes) {
   for (const int width : {1, 17, 1000}) {
     int step = 0;
     Ipp8u* image = ippiMalloc_8u_C4(width, 3, &step);
     ASSERT_NE(image, nullptr);
-    EXPECT_TRUE(Aligned(image) && step >= width * 4 && step % 64 == 0) << step;
+    EXPECT_TRUE(AlignedTo(image, 64) && step >= width * 4 && step % 64 == 0) << step;
     image[3 * step - 1] = 1;  // the last row is whole
     ippFree(image);
   }
@@ -189,10 +193,33 @@ TEST(PrimitiveAllocation, AlignsRowsAndVectorsAndRefusesBadSizes) {
   EXPECT_EQ(ippiMalloc_8u_C4(1 << 15, 1 << 14, &step), nullptr);  // 2^31 bytes
   void* const vectors[] = {ippsMalloc_8u(3), ippsMalloc_16u(3), ippsMalloc_32s(3),
                            ippsMalloc_32f(5), ippMalloc(1)};
-  for (void* p : vectors) EXPECT_TRUE(p && Aligned(p));
+  for (void* p : vectors) EXPECT_TRUE(p && AlignedTo(p, 64));
   for (void* p : vectors) ippsFree(p);
   EXPECT_EQ(ippsMalloc_8u(0), nullptr);
   EXPECT_EQ(ippsMalloc_32f(INT_MAX / 2), nullptr);  // more than INT_MAX bytes
+}
+
+TEST(AlignedMemory, AlignsAndZeroesAsAsked) {
+  for (const uint32_t size : {0u, 1u, 33u, 4103u}) {
+    // Dirty a block first, which the zeroed one is likely to reuse.
+    void* dirty = AllocMemory(size, false);
+    ASSERT_TRUE(dirty != nullptr && AlignedTo(dirty, 32)) << size;
+    std::memset(dirty, 0xa5, size);
+    FreeMemory(dirty);
+    auto* zeroed = static_cast<uint8_t*>(AllocMemory(size, true));
+    ASSERT_TRUE(zeroed != nullptr && AlignedTo(zeroed, 32)) << size;
+    for (uint32_t b = 0; b < size; ++b) ASSERT_EQ(zeroed[b], 0) << b;
+    FreeMemory(zeroed);
+  }
+  for (const size_t alignment : {1, 2, 8, 64, 4096}) {
+    void* p = aligned_malloc(100, alignment);
+    ASSERT_TRUE(p != nullptr && AlignedTo(p, alignment)) << alignment;
+    aligned_free(p);
+  }
+  for (const size_t alignment : {0, 3, 24, 100}) EXPECT_EQ(aligned_malloc(100, alignment), nullptr);
+  EXPECT_EQ(aligned_malloc(SIZE_MAX - 64, 32), nullptr);
+  FreeMemory(nullptr);
+  aligned_free(nullptr);
 }
 
 }  // namespace

@@ -2,8 +2,10 @@
 
 #include <gtest/gtest.h>
 
+#include <climits>
 #include <cstdint>
 #include <limits>
+#include <utility>
 #include <vector>
 
 namespace {
@@ -116,6 +118,19 @@ TEST(Rgb2Temperature, FindsTheBlackBodyOrEndsItsRange) {
   EXPECT_EQ(rgb2temperature(255, 206, 166), 4000);
   EXPECT_EQ(rgb2temperature(0, 128, 128), 6600);
   EXPECT_EQ(rgb2temperature(255, 0, 128), 6600);
+}
+
+// A size above INT_MAX bytes over a small buffer counts as no image: nothing is read.
+TEST(WhiteBalanceEstimate, TreatsImagesAboveIntMaxBytesAsEmpty) {
+  std::vector<uint8_t> src(16, 200), dst(16, 7);
+  for (const auto& [width, height] : {std::pair{32768, 16384}, std::pair{INT_MAX, 1}}) {
+    SCOPED_TRACE(width);
+    EXPECT_EQ(channelMean(src.data(), width, height, 0), 255);
+    EXPECT_EQ(doAutoWhiteBalance(src.data(), dst.data(), width, height), src.data());
+    EXPECT_EQ(getAutoWhiteBalanceCCTChangeRate(src.data(), dst.data(), width, height), 0.0);
+    EXPECT_EQ(getAutoWhiteBalanceTintChangeRate(src.data(), dst.data(), width, height), 0.0);
+    EXPECT_EQ(dst, std::vector<uint8_t>(16, 7));
+  }
 }
 
 }  // namespace
