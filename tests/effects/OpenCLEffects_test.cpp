@@ -66,17 +66,9 @@ void FillHostileLattice(CubeLut* lut, int n, unsigned salt) {
   lut->generateLUT3DData(n);
   std::mt19937 rng(salt);
   std::uniform_real_distribution<float> value(-300.0f, 600.0f);
-  const float specials[] = {std::numeric_limits<float>::quiet_NaN(),
-                            std::numeric_limits<float>::infinity(),
-                            -std::numeric_limits<float>::infinity(),
-                            -2147483648.0f,
-                            -2147483904.0f,
-                            3e9f,
-                            254.5f,
-                            -0.5f,
-                            -1.5f,
-                            0.49999997f,
-                            -300.5f};
+  const float inf = std::numeric_limits<float>::infinity();
+  const float specials[] = {std::nanf(""), inf,   -inf,  -2147483648.0f, -2147483904.0f, 3e9f,
+                            254.5f,        -0.5f, -1.5f, 0.49999997f,    -300.5f};
   for (int i = 0; i < n; ++i) {
     for (int j = 0; j < n; ++j) {
       for (int k = 0; k < n; ++k) {
