@@ -9,14 +9,10 @@
 #include <cstdint>
 #include <cstring>
 #include <functional>
-#include <iostream>
 #include <limits>
-#include <memory>
 #include <string>
 #include <tuple>
 #include <vector>
-
-#include <hwy/targets.h>
 
 #include "adjust/ColorAdjustRows.h"
 #include "support/EveryTarget.h"

@@ -8,7 +8,6 @@ extern "C" {
 #include <gtest/gtest.h>
 
 #include <cmath>
-#include <cstring>
 #include <string>
 #include <thread>
 #include <vector>

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cstdlib>
-#include <cstring>
 #include <opencv2/imgproc.hpp>
 #include <vector>
 

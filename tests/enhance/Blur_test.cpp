@@ -7,8 +7,6 @@
 #include <cstdint>
 #include <cstring>
 #include <functional>
-#include <iterator>
-#include <utility>
 #include <vector>
 
 #include "support/EveryTarget.h"

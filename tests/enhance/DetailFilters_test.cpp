@@ -7,9 +7,7 @@
 #include <cstdint>
 #include <cstring>
 #include <functional>
-#include <limits>
 #include <memory>
-#include <string>
 #include <vector>
 
 #include "support/EveryTarget.h"

@@ -5,9 +5,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <fstream>
-#include <optional>
 #include <string>
-#include <utility>
 #include <vector>
 
 #include "support/EffectHarness.h"

@@ -12,8 +12,6 @@
 #include <random>
 #include <vector>
 
-#include <hwy/targets.h>
-
 #include "simd/lut_tetra_rows.h"
 #include "support/EveryTarget.h"
 #include "support/ImageBuilders.h"
