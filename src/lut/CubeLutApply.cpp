@@ -151,23 +151,29 @@ void TetraPlan::Prepare(const TetraTable& table) {
       return;
     }
   }
+  // doLUT packs afresh on every call, so the copy and the finiteness check are one branchless
+  // pass: an all-ones exponent carries into the top bit when one more is added to it.
+  uint32_t carried = 0;
+  const auto note = [&carried](float f) {
+    uint32_t bits;
+    std::memcpy(&bits, &f, sizeof bits);
+    carried |= (bits & 0x7f800000u) + 0x00800000u;
+  };
+  for (int v = 0; v < 256; ++v) note(ft_[v]);
   float* out = points_.get();
-  finite_ = true;
-  for (int v = 0; v < 256; ++v) finite_ = finite_ && std::isfinite(ft_[v]);
   for (int i = 0; i < n; ++i) {
     for (int j = 0; j < n; ++j) {
-      for (int k = 0; k < n; ++k) {
-        const float* p = point(i, j, k);
-        if (grey_) {
-          *out++ = p[0];
-        } else {
-          out[0] = p[0], out[1] = p[1], out[2] = p[2], out[3] = 0.0f;
-          out += 4;
+      const float* p = point(i, j, 0);
+      if (grey_) {
+        for (int k = 0; k < n; ++k, p += 3, ++out) note(*out = p[0]);
+      } else {
+        for (int k = 0; k < n; ++k, p += 3, out += 4) {
+          note(out[0] = p[0]), note(out[1] = p[1]), note(out[2] = p[2]), out[3] = 0.0f;
         }
       }
     }
   }
-  for (const float* p = points_.get(); p < out && finite_; ++p) finite_ = std::isfinite(*p);
+  finite_ = (carried & 0x80000000u) == 0;
 }
 
 void TetraRow(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width,
