@@ -120,9 +120,12 @@ void TetraPlan::Prepare(const TetraTable& table) {
       }
     }
   }
+  // One more plane along each axis repeats the last: the upper neighbour of the last index is then
+  // the point itself, as the cap makes it, and every upper neighbour is one stride on.
   const int per = grey_ ? 1 : 4;
-  stride_[0] = n * n * per;
-  stride_[1] = n * per;
+  const int m = n + 1;
+  stride_[0] = m * m * per;
+  stride_[1] = m * per;
   stride_[2] = per;
   for (int axis = 0; axis < 3; ++axis) {
     for (int v = 0; v < 256; ++v) lower_[axis][v] = table.gt[v] * stride_[axis];
@@ -141,7 +144,7 @@ void TetraPlan::Prepare(const TetraTable& table) {
       slabStart_[slab] = v;
     }
   }
-  const size_t floats = static_cast<size_t>(n) * n * n * per;
+  const size_t floats = static_cast<size_t>(m) * m * m * per;
   if (floats > capacity_) {
     points_.reset(static_cast<float*>(AllocateBlocks(floats * sizeof(float))));
     capacity_ = points_ ? floats : 0;
@@ -161,15 +164,19 @@ void TetraPlan::Prepare(const TetraTable& table) {
   };
   for (int v = 0; v < 256; ++v) note(ft_[v]);
   float* out = points_.get();
-  for (int i = 0; i < n; ++i) {
-    for (int j = 0; j < n; ++j) {
-      const float* p = point(i, j, 0);
+  for (int i = 0; i < m; ++i) {
+    for (int j = 0; j < m; ++j) {
+      const float* p = point(std::min(i, n - 1), std::min(j, n - 1), 0);
       if (grey_) {
         for (int k = 0; k < n; ++k, p += 3, ++out) note(*out = p[0]);
+        out[0] = out[-1];
+        out += 1;
       } else {
         for (int k = 0; k < n; ++k, p += 3, out += 4) {
           note(out[0] = p[0]), note(out[1] = p[1]), note(out[2] = p[2]), out[3] = 0.0f;
         }
+        std::memcpy(out, out - 4, 4 * sizeof *out);
+        out += 4;
       }
     }
   }

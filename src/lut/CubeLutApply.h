@@ -62,8 +62,9 @@ inline void Tetrahedral(const float* c000, ptrdiff_t dr, ptrdiff_t dg, ptrdiff_t
 }
 
 // A TetraTable laid out for the vector rows. Copying the lattice costs a small part of one 4K frame
-// and is what lets the rows read each corner as one aligned block: the N^3 points packed one after
-// another (blue fastest), each as red, green, blue and a 0, or as one float when every point is
+// and is what lets the rows read each corner as one aligned block: the N^3 points, and a last plane
+// repeated along each axis, packed one after another (blue fastest), each as red, green, blue and a
+// 0, or as one float when every point is
 // grey (the three components the same bits, so one blend gives all three bytes, as a key mask
 // does), and per axis the offset in floats of each byte's lower point.
 class TetraPlan {
@@ -91,7 +92,6 @@ class TetraPlan {
   float Divisor() const { return divisor_; }
   const int32_t* Lower(int axis) const { return lower_[axis]; }  // red 0, green 1, blue 2
   int32_t Stride(int axis) const { return stride_[axis]; }       // floats between points
-  int32_t Last(int axis) const { return stride_[axis] * (table_.size - 1); }
 
   // A packed lattice too large for a core's second-level cache is applied a slab at a time:
   // pixels are sorted by the range of red cells they fall in, each slab's pixels go through

@@ -44,8 +44,8 @@ using MF = hn::Mask<DF>;
 // and offsets stay in the first-level cache.
 constexpr size_t kBlock = 128;
 
-// One axis of a lane: its fraction and the step, in floats, from its lower to its upper point (0
-// where the upper index is capped).
+// One axis of a lane: its fraction and the step, in floats, from its lower to its upper point (the
+// axis's stride: the packed lattice repeats its last plane, where the index is capped).
 struct Axis {
   VF fraction;
   VI step;
@@ -121,11 +121,8 @@ struct Kernel {
   bool finite;            // every point and fraction
   const int32_t* lower[3];
   int32_t stride[3];
-  int32_t last[3];
-  int32_t lastIndex;
   // The same as floats, so that no lane conversion is repeated per vector.
   float strideF[3];
-  float lastIndexF;
 
   // Tables as doLUT builds them: each byte's position a quotient, and every point finite.
   bool DoLutTables() const { return position && divisor != 0.0f && finite; }
@@ -148,7 +145,6 @@ struct Kernel {
       // Gathers cost the most here: one a byte gives the lower index (its floor) and the
       // fraction (the rest). Index times stride and their sum stay far below 2^24, so float
       // arithmetic is exact.
-      const VF last_index = hn::Set(df, lastIndexF);
       VF offset = hn::Zero(df);
       const VI channel[3] = {r, g, b};
       Axis* const axes[3] = {&red, &green, &blue};
@@ -158,27 +154,19 @@ struct Kernel {
                              : hn::GatherIndex(df, position, channel[axis]);
         const VF index = hn::Floor(where);
         offset = hn::Add(offset, hn::Mul(index, hn::Set(df, strideF[axis])));
-        const MF inside = hn::Lt(index, last_index);
-        *axes[axis] = {hn::Sub(where, index),
-                       hn::IfThenElseZero(hn::RebindMask(di, inside), hn::Set(di, stride[axis]))};
+        *axes[axis] = {hn::Sub(where, index), hn::Set(di, stride[axis])};
       }
-      p000 = SmallToInt(offset);  // below 2^22: at most 64^3 points of 4 floats
+      p000 = SmallToInt(offset);  // below 2^22: at most 65^3 points of 4 floats
     } else {
-      const VI ro = hn::GatherIndex(di, lower[0], r);
-      const VI go = hn::GatherIndex(di, lower[1], g);
-      const VI bo = hn::GatherIndex(di, lower[2], b);
-      const auto step = [&](VI lo, int axis) {
-        return hn::Sub(hn::Min(hn::Add(lo, hn::Set(di, stride[axis])), hn::Set(di, last[axis])),
-                       lo);
-      };
-      red = {hn::GatherIndex(df, ft, r), step(ro, 0)};
-      green = {hn::GatherIndex(df, ft, g), step(go, 1)};
-      blue = {hn::GatherIndex(df, ft, b), step(bo, 2)};
-      p000 = hn::Add(hn::Add(ro, go), bo);
+      red = {hn::GatherIndex(df, ft, r), hn::Set(di, stride[0])};
+      green = {hn::GatherIndex(df, ft, g), hn::Set(di, stride[1])};
+      blue = {hn::GatherIndex(df, ft, b), hn::Set(di, stride[2])};
+      p000 = hn::Add(hn::Add(hn::GatherIndex(di, lower[0], r), hn::GatherIndex(di, lower[1], g)),
+                     hn::GatherIndex(di, lower[2], b));
     }
 
     const VF one = hn::Set(df, 1.0f);
-    const VI p111 = hn::Add(hn::Add(hn::Add(p000, red.step), green.step), blue.step);
+    const VI p111 = hn::Add(p000, hn::Set(di, stride[0] + stride[1] + stride[2]));
     if (kDoLut || finite) {
       // Whichever of tied fractions the reference takes first, the fractions come out in
       // decreasing order, and a corner it would pass instead of the one here has weight 0, which
@@ -446,11 +434,8 @@ Kernel MakeKernel(const TetraPlan& plan) {
           plan.Finite(),
           {plan.Lower(0), plan.Lower(1), plan.Lower(2)},
           {plan.Stride(0), plan.Stride(1), plan.Stride(2)},
-          {plan.Last(0), plan.Last(1), plan.Last(2)},
-          plan.Table().size - 1,
           {static_cast<float>(plan.Stride(0)), static_cast<float>(plan.Stride(1)),
-           static_cast<float>(plan.Stride(2))},
-          static_cast<float>(plan.Table().size - 1)};
+           static_cast<float>(plan.Stride(2))}};
 }
 
 void TetraRowOfTarget(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width,
