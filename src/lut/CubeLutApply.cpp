@@ -132,7 +132,7 @@ void TetraPlan::Prepare(const TetraTable& table) {
     for (int v = 0; v < 256; ++v) lower_[axis][v] = table.gt[v] * stride_[axis];
   }
   // Above about 1.5 MiB (N > 45 in colour) the corners of random pixels mostly miss the cache;
-  // four slabs of 16 red cells are 17 planes of 64 KiB each.
+  // four slabs of 16 red cells are 17 planes of 66 KiB each.
   slabs_ = 1;
   bool rising = true;
   for (int v = 1; v < 256; ++v) rising = rising && table.gt[v] >= table.gt[v - 1];

@@ -64,9 +64,9 @@ inline void Tetrahedral(const float* c000, ptrdiff_t dr, ptrdiff_t dg, ptrdiff_t
 // A TetraTable laid out for the vector rows. Copying the lattice costs a small part of one 4K frame
 // and is what lets the rows read each corner as one aligned block: the N^3 points, and a last plane
 // repeated along each axis, packed one after another (blue fastest), each as red, green, blue and a
-// 0, or as one float when every point is
-// grey (the three components the same bits, so one blend gives all three bytes, as a key mask
-// does), and per axis the offset in floats of each byte's lower point.
+// 0, or as one float when every point is grey (the three components the same bits, so one blend
+// gives all three bytes, as a key mask does), and per axis the offset in floats of each byte's
+// lower point.
 class TetraPlan {
  public:
   // Reads the table as it is now; a later change to it is not seen until the next Prepare.

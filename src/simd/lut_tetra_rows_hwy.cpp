@@ -244,8 +244,8 @@ HWY_INLINE Corner LoadCorner(const float* points, const int32_t* offsets) {
 
 // The points of pixels offsets[kSecond], offsets[kSecond + 4], ..., one per 128-bit block of `d`.
 // Offsets are read in pairs, one 64-bit load for the pixels 4m and 4m + 1 (or 4m + 2 and
-// 4m + 3) that two of LoadCorner's vectors share: a load an offset kept the load ports so busy
-// that a 64-point lattice on random pixels took 4 to 7% longer.
+// 4m + 3) that two of LoadCorner's vectors share: with a load an offset, a 64-point lattice on
+// random pixels took 4 to 7% longer.
 template <int kSecond, class D>
 HWY_INLINE hn::Vec<D> LoadBlocks(D d, const float* points, const int32_t* offsets) {
   if constexpr (hn::MaxLanes(D()) <= 4) {
