@@ -21,17 +21,18 @@ def tool(*args):
 
 # Random pixels with a transparent top quarter and a green patch, so that the keyers and the
 # alpha filter find work of their own.
-def random_frame(seed, rows=48, cols=64):
-    frame = np.random.default_rng(seed).integers(0, 256, (rows, cols, 4), dtype=np.uint8)
-    frame[: rows // 4, :, 3] = 0
-    frame[rows // 2 :, : cols // 3, :3] = (30, 220, 40)  # BGR
+def make_frame(key, height=48, width=64):
+    rng = np.random.default_rng(key)
+    frame = rng.integers(0, 256, size=(height, width, 4), dtype=np.uint8)
+    frame[: height // 4, :, 3] = 0
+    frame[height // 2 :, : width // 3, :3] = (30, 220, 40)  # BGR
     return frame
 
 
 @pytest.fixture(scope="module")
 def files(tmp_path_factory):
     d = tmp_path_factory.mktemp("frames")
-    img, bg = random_frame(1234), random_frame(4321)
+    img, bg = make_frame(1234), make_frame(4321)
     tfx.write_image(d / "in.png", img)
     tfx.write_image(d / "bg.png", bg)
     tfx.bake_lut([("ColorAdjust", {"u_contrast": 40})], size=17).write(d / "look.cube")
