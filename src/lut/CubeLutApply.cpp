@@ -58,13 +58,9 @@ void* AllocateBlocks(size_t bytes) {
   return p;
 }
 
-struct FreeBlocks {
-  void operator()(uint32_t* p) const { std::free(p); }
-};
-
 }  // namespace
 
-void TetraPlan::Free::operator()(float* p) const { std::free(p); }
+void FreeBlocks::operator()(void* p) const { std::free(p); }
 
 void TetraRowReference(const TetraTable& t, uint8_t* row, int width, int bytesPerPixel) {
   const int last = t.size - 1;

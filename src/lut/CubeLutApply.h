@@ -61,6 +61,11 @@ inline void Tetrahedral(const float* c000, ptrdiff_t dr, ptrdiff_t dg, ptrdiff_t
   for (int c = 0; c < 3; ++c) out[c] = w0 * c000[c] + w1 * m1[c] + w2 * m2[c] + w3 * c111[c];
 }
 
+// Releases storage from the allocator of the lattice and slab blocks.
+struct FreeBlocks {
+  void operator()(void* p) const;
+};
+
 // A TetraTable laid out for the vector rows. Copying the lattice costs a small part of one 4K frame
 // and is what lets the rows read each corner as one aligned block: the N^3 points, and a last plane
 // repeated along each axis, packed one after another (blue fastest), each as red, green, blue and a
@@ -109,10 +114,7 @@ class TetraPlan {
   bool grey_ = false;
   bool finite_ = false;
   size_t capacity_ = 0;  // floats
-  struct Free {
-    void operator()(float* p) const;
-  };
-  std::unique_ptr<float[], Free> points_;
+  std::unique_ptr<float[], FreeBlocks> points_;
   float ft_[256] = {};
   float position_[256] = {};
   bool positional_ = false;
