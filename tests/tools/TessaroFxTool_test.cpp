@@ -12,6 +12,7 @@
 #include <cstring>
 #include <filesystem>
 #include <fstream>
+#include <functional>
 #include <iterator>
 #include <opencv2/core.hpp>
 #include <opencv2/imgcodecs.hpp>
@@ -152,6 +153,10 @@ TEST_F(ToolTest, ApplyFindsFiltersByGuidAndNameInAnyCase) {
     const Outcome r = Run("apply " + hidden + " in.png c.png");
     EXPECT_EQ(r.err.find("unknown filter"), npos) << hidden << ": " << r.err;
   }
+  // Option-like file names after a double dash.
+  WriteInput("-in.png");
+  ASSERT_EQ(Run("fx brightness -20 -- -in.png -out.png").exitCode, 0);
+  EXPECT_TRUE(fs::exists(Path("-out.png")));
 }
 
 TEST_F(ToolTest, ReadsAnyInputAsBgraAndWritesAlphaOnlyWhereTheFormatHoldsIt) {
@@ -258,14 +263,7 @@ TEST_F(ToolTest, FailuresNameTheirCauseAndLeaveNoOutput) {
   EXPECT_EQ(Read("out.png").size(), cv::Size(6, 4));
 }
 
-TEST_F(ToolTest, ReadsOptionLikeFileNamesAfterDoubleDash) {
-  WriteInput("-in.png");
-  const Outcome r = Run("fx brightness -20 -- -in.png -out.png");
-  ASSERT_EQ(r.exitCode, 0) << r.err;
-  EXPECT_TRUE(fs::exists(Path("-out.png")));
-}
-
-TEST_F(ToolTest, LogsFilterCreationOnlyWhenAsked) {
+TEST_F(ToolTest, LogsOnlyWhenAskedAndGivesUsageOnStdoutOrOnMistakesStderr) {
   WriteInput("in.png");
   const std::string line = "CREATE <PureC> Filter: ColorAdjust";
   const std::string apply = " apply ColorAdjust in.png o.png";
@@ -274,6 +272,14 @@ TEST_F(ToolTest, LogsFilterCreationOnlyWhenAsked) {
   EXPECT_NE(Run("--log-level 32" + apply).err.find(line), npos);
   EXPECT_NE(Run(apply, "TESSAROFX_LOG_LEVEL=0").err.find(line), npos);
   EXPECT_EQ(Run("-v --log-level=off" + apply).err, "");
+  const Outcome help = Run("--help"), none = Run(""), applyHelp = Run("apply --help");
+  EXPECT_EQ(help.exitCode, 0);
+  EXPECT_NE(help.out.find("usage: tessarofx"), npos);
+  EXPECT_EQ(applyHelp.exitCode, 0);
+  EXPECT_NE(applyHelp.out.find("usage: tessarofx apply"), npos);
+  EXPECT_NE(applyHelp.out.find("-f,--filter FILTER"), npos);
+  EXPECT_NE(none.exitCode, 0);
+  EXPECT_NE(none.err.find("usage: tessarofx"), npos);
 }
 
 // Each -f runs on the result of the one before, with its own settings; the chain's result is
@@ -442,36 +448,41 @@ TEST_F(ToolTest, LutInfoShowsSizeTitleAndDomainOrWhereTheReaderStopped) {
   }
 }
 
-TEST_F(ToolTest, LutConvertResamplesATableTooBigForThePlugin) {
-  // A channel rotation: linear, so tetrahedral resampling must reproduce it exactly at any size,
-  // and any mix-up of axes or corners shows. The file goes out through the plug-in's writer, whose
-  // tables read back as written (the LUT file tests).
+// The largest distance of a ".cube" file's rows (red fastest) from a channel rotation whose
+// index i has the value level(i).
+double WorstRotationError(const std::string& text, int n, const std::function<double(int)>& level) {
+  const std::vector<std::array<double, 3>> rows = CubeRows(text);
+  EXPECT_EQ(rows.size(), size_t(n) * n * n);
+  double worst = rows.empty() ? 1 : 0;
+  for (size_t at = 0; at < rows.size(); ++at) {
+    const int red = int(at % n), green = int(at / n % n), blue = int(at / n / n);
+    worst = std::max({worst, std::abs(rows[at][0] - level(green)),
+                      std::abs(rows[at][1] - level(blue)), std::abs(rows[at][2] - level(red))});
+  }
+  return worst;
+}
+
+// Channel rotations: linear, so tetrahedral resampling must reproduce them exactly at any size,
+// and any mix-up of axes or corners shows. The files go out through the plug-in's writer, whose
+// tables read back as written (the LUT file tests).
+TEST_F(ToolTest, LutConvertResamplesBigTablesAndTurns3dlIntoCubeKeepingTheDomainScaling) {
   WriteText("big.cube", CubeText(65, "# rotation\n", 1, 0, true));
   for (const int n : {33, 20}) {
     SCOPED_TRACE(n);
     const std::string out = "small" + std::to_string(n) + ".cube";
     const Outcome r = Run("lut convert big.cube " + out + " --size " + std::to_string(n));
     ASSERT_EQ(r.exitCode, 0) << r.err;
-    const std::vector<std::array<double, 3>> rows = CubeRows(tfx_test::ReadFile(Path(out)));
-    ASSERT_EQ(rows.size(), size_t(n) * n * n);
-    double worst = 0;
-    for (size_t at = 0; at < rows.size(); ++at) {
-      const double red = double(at % n) / (n - 1), green = double(at / n % n) / (n - 1),
-                   blue = double(at / n / n) / (n - 1);
-      worst = std::max({worst, std::abs(rows[at][0] - green), std::abs(rows[at][1] - blue),
-                        std::abs(rows[at][2] - red)});
-    }
-    EXPECT_LT(worst, 1e-6);
+    EXPECT_LT(WorstRotationError(tfx_test::ReadFile(Path(out)), n,
+                                 [n](int i) { return double(i) / (n - 1); }),
+              1e-6);
   }
-}
 
-TEST_F(ToolTest, LutConvertTurnsA3dlFileIntoACubeAndKeepsTheDomainScaling) {
   // 17 points with a 10-bit input range; every ".3DL" output is taken as 12-bit. Blue changes
-  // fastest, and the table is the channel rotation.
+  // fastest.
   std::ostringstream text;
   text << "3DMESH\nMesh 4 12\n";
   for (int i = 0; i < 17; ++i) text << (i == 16 ? 1023 : i * 64) << (i == 16 ? "\n" : " ");
-  const auto level = [](size_t i) { return std::lround(double(i) * 4095 / 16.0); };
+  const auto level = [](int i) { return std::lround(double(i) * 4095 / 16.0); };
   for (int r = 0; r < 17; ++r) {
     for (int g = 0; g < 17; ++g) {
       for (int b = 0; b < 17; ++b) text << level(g) << " " << level(b) << " " << level(r) << "\n";
@@ -480,20 +491,15 @@ TEST_F(ToolTest, LutConvertTurnsA3dlFileIntoACubeAndKeepsTheDomainScaling) {
   WriteText("look.3DL", text.str());
   const Outcome r = Run("lut convert look.3DL look.cube");
   ASSERT_EQ(r.exitCode, 0) << r.err;
-  std::vector<std::array<double, 3>> rows = CubeRows(tfx_test::ReadFile(Path("look.cube")));
-  ASSERT_EQ(rows.size(), 17u * 17 * 17);
-  for (size_t at = 0; at < rows.size(); at += 97) {  // red fastest now
-    SCOPED_TRACE(at);
-    EXPECT_NEAR(rows[at][0], level(at / 17 % 17) / 4095.0, 1e-7);
-    EXPECT_NEAR(rows[at][1], level(at / 289) / 4095.0, 1e-7);
-    EXPECT_NEAR(rows[at][2], level(at % 17) / 4095.0, 1e-7);
-  }
+  EXPECT_LT(WorstRotationError(tfx_test::ReadFile(Path("look.cube")), 17,
+                               [&](int i) { return level(i) / 4095.0; }),
+            1e-7);
 
   // The plug-in multiplies by the domain's width and does not subtract its minimum; the
   // converted table means the same, now over the plain domain.
   WriteText("half.cube", CubeText(3, "DOMAIN_MIN 0.5 0.5 0.5\n"));
   ASSERT_EQ(Run("lut convert half.cube plain.cube").exitCode, 0);
-  rows = CubeRows(tfx_test::ReadFile(Path("plain.cube")));
+  const std::vector<std::array<double, 3>> rows = CubeRows(tfx_test::ReadFile(Path("plain.cube")));
   ASSERT_EQ(rows.size(), 27u);
   EXPECT_EQ(rows[26], (std::array<double, 3>{0.5, 0.5, 0.5}));
   EXPECT_EQ(rows[1], (std::array<double, 3>{0.25, 0, 0}));
@@ -536,11 +542,6 @@ TEST_F(ToolTest, LutBakeAppliesLikeTheFiltersItBakes) {
 }
 
 using tfx_test::OpenCLDevices;
-
-#define SKIP_WITHOUT_OPENCL()                                                    \
-  if (OpenCLDevices().empty()) {                                                 \
-    GTEST_SKIP() << "no OpenCL device on this machine (the runtime lists none)"; \
-  }
 
 // The rows of `devices`: a '*' or blank mark, the index, then the type, platform and device.
 struct DeviceRow {
@@ -603,8 +604,8 @@ TEST_F(ToolTest, DevicesListsEveryDeviceAndMarksTheDefaultChoice) {
   for (const DeviceRow& d : DeviceRows(wrong.out)) EXPECT_FALSE(d.marked);
 }
 
-TEST_F(ToolTest, ApplyOpenCLAgreesWithTheCpuClass) {
-  SKIP_WITHOUT_OPENCL();
+TEST_F(ToolTest, ApplyOpenCLAgreesWithTheCpuClassAndNamesTheDeviceOrProgramThatFailed) {
+  if (OpenCLDevices().empty()) GTEST_SKIP() << "no OpenCL device on this machine";
   // The option's plumbing: the classes' agreement over many settings is the OpenCL effect tests'
   // business. Some pixels fully transparent, which lutAToWhiteEffect fills; 33 columns leave a
   // ragged edge for any vector width a runtime picks.
@@ -632,11 +633,6 @@ TEST_F(ToolTest, ApplyOpenCLAgreesWithTheCpuClass) {
     EXPECT_LE(cv::norm(a, b, cv::NORM_INF), c.tolerance);
     EXPECT_NE(cv::norm(b, in, cv::NORM_INF), 0) << "the case proves nothing";
   }
-}
-
-TEST_F(ToolTest, ApplyOpenCLNamesTheDeviceOrProgramThatFailed) {
-  SKIP_WITHOUT_OPENCL();
-  WriteInput("in.png");
   fs::create_directory(Path("broken"));
   WriteText("broken/WhiteBalanceAdjust.cl",
             "__kernel void auto_white_balance(__global uchar4* p) { p[0] = undeclared_name; }\n");
@@ -653,17 +649,6 @@ TEST_F(ToolTest, ApplyOpenCLNamesTheDeviceOrProgramThatFailed) {
     EXPECT_NE(broken.err.find(part), npos) << broken.err;
   }
   EXPECT_EQ(Listing(), before);
-}
-
-TEST_F(ToolTest, UsageGoesToStdoutOnRequestAndStderrOnMistakes) {
-  const Outcome help = Run("--help"), none = Run(""), apply = Run("apply --help");
-  EXPECT_EQ(help.exitCode, 0);
-  EXPECT_NE(help.out.find("usage: tessarofx"), npos);
-  EXPECT_EQ(apply.exitCode, 0);
-  EXPECT_NE(apply.out.find("usage: tessarofx apply"), npos);
-  EXPECT_NE(apply.out.find("-f,--filter FILTER"), npos);
-  EXPECT_NE(none.exitCode, 0);
-  EXPECT_NE(none.err.find("usage: tessarofx"), npos);
 }
 
 TEST_F(ToolTest, AFailingOpenCLRuntimeCostsNoCpuPicture) {
