@@ -220,8 +220,9 @@ TEST(CubeLutFile, DlStatuses) {
 }
 
 // Tables above the lattice's 64 points are read whole, in lattice order and with the domain's
-// scale; 257 points are too many even for them, and the message names that limit.
-TEST(CubeLutFile, LatticeReaderTakesEverySizeTheFormatAllows) {
+// scale; 257 points are too many even for them, and the message names that limit and quotes the
+// line safely.
+TEST(CubeLutFile, LatticeReaderTakesEverySizeTheFormatAllowsAndStopsQuoteTheLine) {
   constexpr int n = 65;
   std::string text = "DOMAIN_MAX 2 2 2\nLUT_3D_SIZE 65\n";
   for (int r = 0; r < n * n * n; ++r) {
@@ -253,10 +254,7 @@ TEST(CubeLutFile, LatticeReaderTakesEverySizeTheFormatAllows) {
   EXPECT_EQ(CubeLut::stopMessage("257.cube", stop),
             "257.cube, line 2 (\"LUT_3D_SIZE 257\"): status 23, the size is missing or outside "
             "2..256");
-}
-
-TEST(CubeLutFile, StopMessagesQuoteTheLineSafely) {
-  CubeLut::Stop stop;
+  // The line is quoted with its quotes, backslashes and controls escaped, cut at 48 characters.
   stop.status = 20;
   stop.line = 7;
   stop.text = "TITLE \"a\\b\"\t" + std::string(49, 'x');
@@ -271,7 +269,7 @@ TEST(CubeLutFile, StopMessagesQuoteTheLineSafely) {
   EXPECT_STREQ(CubeLut::statusText(99), "unknown status");
 }
 
-TEST(CubeLutFile, CubeValues) {
+TEST(CubeLutFile, ValuesScaleAndShortRowsKeepTheRowBefore) {
   TempDir dir;
   // The domain's width scales, its minimum is not subtracted.
   const auto lut =
@@ -301,11 +299,8 @@ TEST(CubeLutFile, CubeValues) {
       EXPECT_EQ(Point(*lut, at[r][0], at[r][1], at[r][2])[c], expected[r][c] * 255.0f) << r << c;
     }
   }
-}
 
-TEST(CubeLutFile, DlValues) {
-  TempDir dir;
-  // The trailing blank is one more lattice point, whatever the data holds.
+  // A ".3DL" file's trailing blank is one more lattice point, whatever the data holds.
   EXPECT_EQ(Load(dir, "a.3dl", Replace(kDl, "0 2047 4095", "0 2047 4095 "))->getLutSize(), 4);
 
   // Seventeen range values make N = 17, and 4095 is full scale whatever the range's top.
@@ -317,19 +312,19 @@ TEST(CubeLutFile, DlValues) {
   for (int c = 0; c < 3; ++c) EXPECT_EQ(Point(*full, 16, 16, 16)[c], 255.0f);
 
   // A lone number keeps the other two components of the row before, on the first row 0.
-  const auto lut = Load(dir, "white.3dl",
-                        "0 1 2\n2047\n4095 4095 4095\n1e30 -1e30 1e20\n2047\n" + Rows(3, true));
-  ASSERT_EQ(lut->getStatus(), 0);
-  const float expected[4][3] = {
+  const auto dl = Load(dir, "white.3dl",
+                       "0 1 2\n2047\n4095 4095 4095\n1e30 -1e30 1e20\n2047\n" + Rows(3, true));
+  ASSERT_EQ(dl->getStatus(), 0);
+  const float dlExpected[4][3] = {
       {2047, 0, 0}, {4095, 4095, 4095}, {1e30f, -1e30f, 1e20f}, {2047, -1e30f, 1e20f}};
   for (int r = 0; r < 4; ++r) {
     for (int c = 0; c < 3; ++c) {
-      EXPECT_EQ(Point(*lut, 0, r / 3, r % 3)[c], expected[r][c] / 4095.0f * 255.0f) << r << c;
+      EXPECT_EQ(Point(*dl, 0, r / 3, r % 3)[c], dlExpected[r][c] / 4095.0f * 255.0f) << r << c;
     }
   }
 }
 
-TEST(CubeLutFile, FailedReadsKeepWhatTheyRead) {
+TEST(CubeLutFile, FailedReadsKeepWhatTheyReadAndTheRowTableTakesTheFirstRowsUnscaled) {
   TempDir dir;
   const auto lut = Load(dir, "grade.cube", WithoutLastLine(kCube));
   EXPECT_EQ(lut->getStatus(), 10);
@@ -344,29 +339,25 @@ TEST(CubeLutFile, FailedReadsKeepWhatTheyRead) {
   EXPECT_EQ(lut->getLutSize(), 2);
   EXPECT_EQ(Point(*lut, 1, 0, 0)[1], 0.0f);
   ExpectBounded(*lut);
-}
 
-TEST(CubeLutFile, RowTableTakesTheFirstRowsUnscaled) {
-  TempDir dir;
-  const auto lutOwned = std::make_unique<CubeLut>();  // about 3 MiB: never on the stack
-  CubeLut& lut = *lutOwned;
-  lut.setRowTable(new float[CubeLut::kMaxSize][3]());
+  // A row table takes the first rows as the file gives them.
+  lut->setRowTable(new float[CubeLut::kMaxSize][3]());
   const std::string narrow = Replace(kCube, "DOMAIN_MIN 0.0 0.0 0.0", "DOMAIN_MIN 0.5 0.5 0.5");
-  ASSERT_TRUE(lut.loadFile(Wide(dir.Write("rows.cube", narrow)).c_str()));
+  ASSERT_TRUE(lut->loadFile(Wide(dir.Write("rows.cube", narrow)).c_str()));
   for (int r = 0; r < 2; ++r) {
-    for (int c = 0; c < 3; ++c) EXPECT_EQ(lut.getRowTable()[r][c], Sixteenth(r, c));
+    for (int c = 0; c < 3; ++c) EXPECT_EQ(lut->getRowTable()[r][c], Sixteenth(r, c));
   }
-  EXPECT_EQ(lut.getRowTable()[2][0], 0.0f);
-  EXPECT_EQ(Point(lut, 1, 0, 0)[0], 0.0f);
+  EXPECT_EQ(lut->getRowTable()[2][0], 0.0f);
+  EXPECT_EQ(Point(*lut, 1, 0, 0)[0], 0.0f);
 
   const std::string shortRow = Replace(kCube, "\n\n", "\n\n0.5 0.25\n");
-  EXPECT_FALSE(lut.loadFile(Wide(dir.Write("short.cube", shortRow)).c_str()));
-  EXPECT_EQ(lut.getStatus(), 24);
-  EXPECT_EQ(lut.getRowTable()[0][1], 0.25f);
-  EXPECT_EQ(lut.getRowTable()[0][2], 0.0f);
+  EXPECT_FALSE(lut->loadFile(Wide(dir.Write("short.cube", shortRow)).c_str()));
+  EXPECT_EQ(lut->getStatus(), 24);
+  EXPECT_EQ(lut->getRowTable()[0][1], 0.25f);
+  EXPECT_EQ(lut->getRowTable()[0][2], 0.0f);
 }
 
-TEST(CubeLutFile, ExtensionPicksTheReader) {
+TEST(CubeLutFile, ExtensionPicksTheReaderAndWidePathsBecomeUtf8) {
   const struct {
     const char* name;
     bool dl, loads;
@@ -385,23 +376,17 @@ TEST(CubeLutFile, ExtensionPicksTheReader) {
     // Neither reader runs on a refused name: the status is still the constructor's.
     EXPECT_EQ(lut->getStatus(), c.loads ? 0 : 1);
   }
-  const auto lutOwned = std::make_unique<CubeLut>();
-  CubeLut& lut = *lutOwned;
-  EXPECT_FALSE(lut.loadFile(nullptr));
-  EXPECT_FALSE(lut.loadFile(Wide(dir.path + "/missing.cube").c_str()));
+  const auto lut = std::make_unique<CubeLut>();
+  EXPECT_FALSE(lut->loadFile(nullptr));
+  EXPECT_FALSE(lut->loadFile(Wide(dir.path + "/missing.cube").c_str()));
   // The wrong reader fails on the other format.
-  EXPECT_FALSE(lut.loadFile(Wide(dir.Write("swapped.3dl", kCube)).c_str()));
-}
+  EXPECT_FALSE(lut->loadFile(Wide(dir.Write("swapped.3dl", kCube)).c_str()));
 
-TEST(CubeLutFile, WidePathsBecomeUtf8) {
-  TempDir dir;
-  const auto lutOwned = std::make_unique<CubeLut>();
-  CubeLut& lut = *lutOwned;
   dir.Write("F\xC3\xA4rg \xE3\x82\xB0\xF0\x9F\x98\x80.Cube", kCube);
-  EXPECT_TRUE(lut.loadFile((Wide(dir.path) + L"/F\u00e4rg \u30b0\U0001F600.Cube").c_str()));
+  EXPECT_TRUE(lut->loadFile((Wide(dir.path) + L"/F\u00e4rg \u30b0\U0001F600.Cube").c_str()));
   // A wide extension character is left alone by the upper-casing.
   dir.Write("grade.\xD1\x81ube", kCube);
-  EXPECT_FALSE(lut.loadFile((Wide(dir.path) + L"/grade.\u0441ube").c_str()));
+  EXPECT_FALSE(lut->loadFile((Wide(dir.path) + L"/grade.\u0441ube").c_str()));
 
   const auto convert = [](const std::wstring& wide) {
     std::vector<char> out(tfx::kLutPathBufferBytes, 0);
@@ -418,15 +403,15 @@ TEST(CubeLutFile, WidePathsBecomeUtf8) {
   EXPECT_EQ(convert(std::wstring(3000, L'a')).size(), 2047u);
 
   // Through loadFile: a 2047-byte path opens, one more byte cuts the name.
-  const std::string tail = "/grade.cube";
-  dir.Write("grade.cube", kCube);
+  const std::string tail = "/long.cube";
+  dir.Write("long.cube", kCube);
   const std::string fits = dir.path + std::string(2047 - dir.path.size() - tail.size(), '/') + tail;
   ASSERT_EQ(fits.size(), 2047u);
-  EXPECT_TRUE(lut.loadFile(Wide(fits).c_str()));
-  EXPECT_FALSE(lut.loadFile(Wide("/" + fits).c_str()));
+  EXPECT_TRUE(lut->loadFile(Wide(fits).c_str()));
+  EXPECT_FALSE(lut->loadFile(Wide("/" + fits).c_str()));
 }
 
-TEST(CubeLutFile, WriterHeaderAndRows) {
+TEST(CubeLutFile, WriterHeaderRowsAndRoundTrip) {
   EXPECT_EQ(convertFloat2String(-0.25f), "-0.25000000");
   EXPECT_EQ(convertFloat2String(1.0f / 3.0f), "0.33333334");  // the float, not the double third
   EXPECT_EQ(convertFloat2String(1e10f), "10000000000.00000000");
@@ -435,11 +420,10 @@ TEST(CubeLutFile, WriterHeaderAndRows) {
   const std::string header =
       "#LUT size\nLUT_3D_SIZE 2\n\n#data domain\nDOMAIN_MIN 0.0 0.0 0.0\nDOMAIN_MAX 1.0 1.0 1.0\n\n"
       "#LUT data points\n";
-  const auto lutOwned = std::make_unique<CubeLut>();
-  CubeLut& lut = *lutOwned;
-  lut.generateLUT3DData(2);
+  const auto lut = std::make_unique<CubeLut>();
+  lut->generateLUT3DData(2);
   const std::string path = dir.path + "/out.cube";
-  ASSERT_TRUE(lut.writeLUT3D2File(path.c_str()));
+  ASSERT_TRUE(lut->writeLUT3D2File(path.c_str()));
   // Red fastest, and the generated lattice divides by 31: row r is (r & 1, r & 2, r & 4) steps
   // of 255/31.
   const std::string z = "0.00000000", s = convertFloat2String(255.0f / 31.0f / 255.0f);
@@ -449,21 +433,18 @@ TEST(CubeLutFile, WriterHeaderAndRows) {
   }
   EXPECT_EQ(tfx_test::ReadFile(path), header + rows);
 
-  const auto emptyOwned = std::make_unique<CubeLut>();
-  CubeLut& empty = *emptyOwned;
-  ASSERT_TRUE(empty.writeLUT3D2File(path.c_str()));
+  const auto empty = std::make_unique<CubeLut>();
+  ASSERT_TRUE(empty->writeLUT3D2File(path.c_str()));
   EXPECT_EQ(tfx_test::ReadFile(path), Replace(header, "LUT_3D_SIZE 2", "LUT_3D_SIZE 0"));
 
   testing::internal::CaptureStdout();
-  EXPECT_FALSE(lut.writeLUT3D2File(nullptr));
-  EXPECT_FALSE(lut.writeLUT3D2File((dir.path + "/no/such/dir.cube").c_str()));
+  EXPECT_FALSE(lut->writeLUT3D2File(nullptr));
+  EXPECT_FALSE(lut->writeLUT3D2File((dir.path + "/no/such/dir.cube").c_str()));
   const std::string said = testing::internal::GetCapturedStdout();
   EXPECT_NE(said.find("Path cannot be NULL!"), std::string::npos);
   EXPECT_NE(said.find("Cannot open the path file!"), std::string::npos);
-}
 
-TEST(CubeLutFile, WriteThenLoadGivesTheLatticeBack) {
-  TempDir dir;
+  // Written and loaded again, a lattice comes back as its text says.
   std::mt19937 random(77u);
   std::uniform_real_distribution<float> value(0.0f, 255.0f);
   for (const int n : {17, 64}) {
@@ -473,13 +454,13 @@ TEST(CubeLutFile, WriteThenLoadGivesTheLatticeBack) {
     const auto inOwned = std::make_unique<CubeLut>();
     CubeLut& in = *inOwned;
     out.generateLUT3DData(n);
-    const auto at = [n](CubeLut& lut, int p) {
-      return &Point(lut, p / 3 / n / n, p / 3 / n % n, p / 3 % n)[p % 3];
+    const auto at = [n](CubeLut& l, int p) {
+      return &Point(l, p / 3 / n / n, p / 3 / n % n, p / 3 % n)[p % 3];
     };
     for (int p = 0; p < n * n * n * 3; ++p) *at(out, p) = value(random);
-    const std::string path = dir.path + "/round" + std::to_string(n) + ".cube";
-    ASSERT_TRUE(out.writeLUT3D2File(path.c_str()));
-    ASSERT_TRUE(in.loadFile(Wide(path).c_str()));
+    const std::string round = dir.path + "/round" + std::to_string(n) + ".cube";
+    ASSERT_TRUE(out.writeLUT3D2File(round.c_str()));
+    ASSERT_TRUE(in.loadFile(Wide(round).c_str()));
     ASSERT_EQ(in.getLutSize(), n);
     for (int p = 0; p < n * n * n * 3; ++p) {
       const float written = *at(out, p) / 255.0f;
