@@ -122,21 +122,12 @@ TEST(CubeLut, OnlyTheFirstThreeBytesOfEachPixelChange) {
     SCOPED_TRACE(bpp);
     const int width = 37, height = 5;
     const size_t pitch = static_cast<size_t>(width * bpp + 11);
-    const std::vector<uint8_t> before = tfx_test::NoiseBytes(pitch * height, bpp);
-    std::vector<uint8_t> after = before;
+    std::vector<uint8_t> expected = tfx_test::NoiseBytes(pitch * height, bpp), after = expected;
     EXPECT_EQ(0, lut->doLUT(after.data(), width, height, static_cast<int>(pitch), bpp));
-    for (int y = 0; y < height; ++y) {
-      for (int x = 0; x < width; ++x) {
-        const size_t at = pitch * y + static_cast<size_t>(bpp) * x;
-        uint8_t expected[3] = {before[at], before[at + 1], before[at + 2]};
-        tfx::TetraRowReference(table, expected, 1, 3);
-        ASSERT_EQ(0, std::memcmp(expected, &after[at], 3)) << x << "," << y;
-        for (int b = 3; b < bpp; ++b) ASSERT_EQ(before[at + b], after[at + b]);
-      }
-      for (size_t b = static_cast<size_t>(width) * bpp; b < pitch; ++b) {
-        ASSERT_EQ(before[pitch * y + b], after[pitch * y + b]);
-      }
-    }
+    // The reference writes the first three bytes of each pixel alone.
+    for (int y = 0; y < height; ++y)
+      tfx::TetraRowReference(table, &expected[pitch * y], width, bpp);
+    EXPECT_EQ(expected, after);
   }
 }
 
@@ -262,7 +253,7 @@ TEST(CubeLutInstance, NeverHandsOutOrDestroysAFiltersTable) {
 
 // The whole tile image, so every point has its texel even when N is not a multiple of 8 and the
 // last tile row is part empty.
-TEST(CubeLut, AtlasHoldsTheLatticeInTiles) {
+TEST(CubeLut, AtlasHoldsTheLatticeInTilesAndResetWritesTheIntegerPattern) {
   for (const int n : {2, 8, 17, 32, 33}) EXPECT_TRUE(tfx_test::AtlasMatches(*Generated(n))) << n;
   // The first argument is the blue index, the third the red; values keep their low 8 bits.
   auto lut = Generated(17);
@@ -274,12 +265,10 @@ TEST(CubeLut, AtlasHoldsTheLatticeInTiles) {
   // Nothing in the library clears the atlas state, so the atlas is not copied back.
   lut->updateLUT3DData();
   EXPECT_EQ(5.0f * 255.0f / 31.0f, At(*lut, 5, 2, 9)[0]);
-}
 
-// reset() truncates i * 255 / 31 where generateLUT3DData keeps the fraction (8, not 8.2258 for
-// index 1), and the atlas follows, 263 keeping its low 8 bits.
-TEST(CubeLut, ResetWritesTheIntegerPattern) {
-  auto lut = Generated(33);
+  // reset() truncates i * 255 / 31 where generateLUT3DData keeps the fraction (8, not 8.2258 for
+  // index 1), and the atlas follows, 263 keeping its low 8 bits.
+  lut = Generated(33);
   At(*lut, 1, 2, 3)[0] = 99.0f;
   lut->reset();
   for (int p = 0; p < 33 * 33 * 33; ++p) {

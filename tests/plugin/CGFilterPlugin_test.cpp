@@ -123,28 +123,6 @@ TEST(FilterRegistry, PublishesTenFiltersInGuidOrder) {
   EXPECT_EQ(StringOf(cpuKey, Key::kFilterFriendName), L"ChromeKeyLut3d");
 }
 
-TEST(FilterRegistry, WhiteBalanceRegistersItsFiveParameters) {
-  ASSERT_EQ(GetFilterCount(), 10u);
-  NLEComPtr<INLEProperties> wb = Descriptor(1);
-  ASSERT_EQ(IntOf(wb, Key::Property::kCount), 5);
-  NLEComPtr<IUnknown> unk;
-  ASSERT_EQ(wb->GetInterface(Key::Property::kParamsArray[2], &unk), NLE_S_OK);
-  NLEComPtr<INLEProperties> gain;
-  ASSERT_EQ(unk.QueryInterface(IID_INLEProperties, &gain), NLE_S_OK);
-  EXPECT_EQ(StringOf(gain, Key::Property::kVariantName), L"u_rgain");
-  EXPECT_EQ(StringOf(gain, Key::Property::kFriendName), L"u_rgain");
-  EXPECT_EQ(IntOf(gain, Key::Property::kType), 3);
-  EXPECT_EQ(IntOf(gain, Key::Property::kDisplayType), 0);
-  CNLEValue def, current, min;
-  gain->GetValue(Key::Property::kValue_Default, &def);
-  gain->GetValue(Key::Property::kValue_Current, &current);
-  gain->GetValue(Key::Property::kValue_Min, &min);
-  EXPECT_EQ(def.TypeName(), L"double");
-  EXPECT_EQ(def.Text(), L"1.000000");
-  EXPECT_EQ(current, def);
-  EXPECT_EQ(min.Text(), L"-100.000000");
-}
-
 TEST(CreateFilterFromGUID, ChoosesTheClassByTheDeviceAndLogsIt) {
   ASSERT_EQ(GetFilterCount(), 10u);
   void* filter = nullptr;
@@ -181,7 +159,7 @@ TEST(CreateFilterFromGUID, ChoosesTheClassByTheDeviceAndLogsIt) {
   }
 }
 
-TEST(CreateFilterFromGUID, HostSettingsOverrideRegisteredDefaults) {
+TEST(CreateFilterFromGUID, HostSettingsOverrideRegisteredDefaultsAndTheFilterCopiesItsParameters) {
   ASSERT_EQ(GetFilterCount(), 10u);
   NLEComPtr<INLEProperties> props;
   ASSERT_EQ(NLECommon::CreateProperties(&props), NLE_S_OK);
@@ -207,6 +185,25 @@ TEST(CreateFilterFromGUID, HostSettingsOverrideRegisteredDefaults) {
   registered.QueryInterface(IID_INLEProperties, &registeredTint);
   EXPECT_NE(mine.get(), registeredTint.get());
   EXPECT_EQ(StringOf(mine, Key::Property::kVariantName), L"u_tint");
+
+  // The registered gain, as the descriptor holds it.
+  EXPECT_EQ(IntOf(Descriptor(1), Key::Property::kCount), 5);
+  NLEComPtr<IUnknown> unk;
+  ASSERT_EQ(Descriptor(1)->GetInterface(Key::Property::kParamsArray[2], &unk), NLE_S_OK);
+  NLEComPtr<INLEProperties> gain;
+  ASSERT_EQ(unk.QueryInterface(IID_INLEProperties, &gain), NLE_S_OK);
+  EXPECT_EQ(StringOf(gain, Key::Property::kVariantName), L"u_rgain");
+  EXPECT_EQ(StringOf(gain, Key::Property::kFriendName), L"u_rgain");
+  EXPECT_EQ(IntOf(gain, Key::Property::kType), 3);
+  EXPECT_EQ(IntOf(gain, Key::Property::kDisplayType), 0);
+  CNLEValue def, current, min;
+  gain->GetValue(Key::Property::kValue_Default, &def);
+  gain->GetValue(Key::Property::kValue_Current, &current);
+  gain->GetValue(Key::Property::kValue_Min, &min);
+  EXPECT_EQ(def.TypeName(), L"double");
+  EXPECT_EQ(def.Text(), L"1.000000");
+  EXPECT_EQ(current, def);
+  EXPECT_EQ(min.Text(), L"-100.000000");
 }
 
 // Every CPU class reads the foreground, so without one it refuses and leaves the output alone.

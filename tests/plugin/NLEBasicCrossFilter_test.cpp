@@ -161,50 +161,44 @@ TEST_F(CrossFilter, RunningNeedsABoundFilterAndADeviceDestination) {
   EXPECT_EQ(Download(dst.get()), Bytes(32, 7));
 }
 
-TEST_F(CrossFilter, EveryOpenCLClassIsCreatedOnADeviceWithTheShippedKernels) {
+// Filters on one device share their program: a later one finds it built, so a directory without
+// the source is no obstacle, and each runs with its own kernel objects. A fresh device has none of
+// the programs yet, and no kernel directory to build them from.
+TEST_F(CrossFilter, EveryOpenCLClassIsCreatedWithTheShippedKernelsAndSharesItsProgram) {
+  OPENCL::openclProgramManager* manager = nullptr;
+  OPENCL::openclMemManager* memory = nullptr;
+  ASSERT_NO_FATAL_FAILURE(Handles(&manager, &memory));
+  EXPECT_EQ(manager->getOpenCLProgram("lutAToWhiteEffect"), nullptr);
+  NLEComPtr<INLECGFilter> first, second, key;
   for (const wchar_t* guid : {kAToWhite, kWhiteBalance, kLut, kChromeKey}) {
     NLEComPtr<INLECGFilter> filter;
     ASSERT_EQ(CreateFilterFromGUID(device_.get(), guid, nullptr, TFX_KERNEL_DIR,
                                    reinterpret_cast<void**>(&filter)),
               NLE_S_OK);
     ASSERT_NE(Object(filter.get()), nullptr);  // the OpenCL class, not the CPU one
+    if (guid == kAToWhite) first = filter;
   }
-  // A fresh device has none of the programs yet, and no kernel directory to build them from.
+  OPENCL::openclProgram* program = manager->getOpenCLProgram("lutAToWhiteEffect");
+  ASSERT_NE(program, nullptr);
+  EXPECT_TRUE(program->isLoaded());
+  ASSERT_EQ(CreateFilterFromGUID(device_.get(), kAToWhite, nullptr, "/nonexistent",
+                                 reinterpret_cast<void**>(&second)),
+            NLE_S_OK);
+  EXPECT_EQ(manager->getOpenCLProgram("lutAToWhiteEffect"), program);
+  // The LUT and chroma-key classes share "LUT" the same way.
+  EXPECT_EQ(CreateFilterFromGUID(device_.get(), kChromeKey, nullptr, "/nonexistent",
+                                 reinterpret_cast<void**>(&key)),
+            NLE_S_OK);
+  Bytes pixels = {1, 2, 3, 0, 4, 5, 6, 7};
+  EXPECT_EQ(RunOnDevice(first.get(), pixels, 2, 1), (Bytes{0, 0, 0, 255, 4, 5, 6, 7}));
+  EXPECT_EQ(RunOnDevice(second.get(), pixels, 2, 1), (Bytes{0, 0, 0, 255, 4, 5, 6, 7}));
+
   NLEComPtr<INLECGDevice> fresh;
   ASSERT_EQ(NLECommon::CreateOpenCLDevice(-1, &fresh), NLE_S_OK);
   void* filter = nullptr;
   EXPECT_EQ(CreateFilterFromGUID(fresh.get(), kWhiteBalance, nullptr, "/nonexistent", &filter),
             NLE_E_INVALIDARG);
   EXPECT_EQ(filter, nullptr);
-}
-
-TEST_F(CrossFilter, FiltersOnOneDeviceShareTheirProgram) {
-  OPENCL::openclProgramManager* manager = nullptr;
-  OPENCL::openclMemManager* memory = nullptr;
-  ASSERT_NO_FATAL_FAILURE(Handles(&manager, &memory));
-  EXPECT_EQ(manager->getOpenCLProgram("lutAToWhiteEffect"), nullptr);
-
-  NLEComPtr<INLECGFilter> first = CreateOnDevice(kAToWhite, nullptr);
-  OPENCL::openclProgram* program = manager->getOpenCLProgram("lutAToWhiteEffect");
-  ASSERT_NE(program, nullptr);
-  EXPECT_TRUE(program->isLoaded());
-  // The second filter finds the built program, so a directory without the source is no obstacle.
-  NLEComPtr<INLECGFilter> second;
-  ASSERT_EQ(CreateFilterFromGUID(device_.get(), kAToWhite, nullptr, "/nonexistent",
-                                 reinterpret_cast<void**>(&second)),
-            NLE_S_OK);
-  EXPECT_EQ(manager->getOpenCLProgram("lutAToWhiteEffect"), program);
-  // The LUT and chroma-key classes share "LUT" the same way.
-  NLEComPtr<INLECGFilter> lut = CreateOnDevice(kLut, nullptr);
-  NLEComPtr<INLECGFilter> key;
-  EXPECT_EQ(CreateFilterFromGUID(device_.get(), kChromeKey, nullptr, "/nonexistent",
-                                 reinterpret_cast<void**>(&key)),
-            NLE_S_OK);
-
-  // Both run with their own kernel objects.
-  Bytes pixels = {1, 2, 3, 0, 4, 5, 6, 7};
-  EXPECT_EQ(RunOnDevice(first.get(), pixels, 2, 1), (Bytes{0, 0, 0, 255, 4, 5, 6, 7}));
-  EXPECT_EQ(RunOnDevice(second.get(), pixels, 2, 1), (Bytes{0, 0, 0, 255, 4, 5, 6, 7}));
 }
 
 // Exposes the parameter block's device memory.
