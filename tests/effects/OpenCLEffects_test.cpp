@@ -148,7 +148,7 @@ class OpenCLLutFiles : public OpenCLEffects {
   tfx_test::TempDir dir_;
 };
 
-TEST_F(OpenCLLutFiles, LutMatchesTheCpuClassOnTheDemoGradeAndPassesUnreadableFilesThrough) {
+TEST_F(OpenCLLutFiles, LutMatchesTheCpuClassPassesUnreadableFilesThroughAndFollowsThePath) {
   const Bytes scene = DemoPixels();
   const Bytes noise = RandomPixels(640, 360, 3);
   for (int size : {17, 33, 64}) {
@@ -177,16 +177,15 @@ TEST_F(OpenCLLutFiles, LutMatchesTheCpuClassOnTheDemoGradeAndPassesUnreadableFil
   HRESULT status = 0;
   EXPECT_EQ(RunOnDevice(empty.get(), noise, 640, 360, &status, 0xEE), Bytes(noise.size(), 0xEE));
   EXPECT_EQ(status, NLE_E_RESOURCE);
-}
 
-TEST_F(OpenCLLutFiles, LutFollowsThePathFromFrameToFrame) {
+  // The path is followed from frame to frame.
   const std::wstring warm = Write("warm.cube", tfxtool::MakeDemoLut(9));
   const std::wstring flat = Write("flat.cube", tfx_test::CubeText(2, "", 0, 0.5));
-  NLEComPtr<INLEProperties> settings = tfx_test::TextSettings(L"lut3dPath", warm);
-  NLEComPtr<INLECGFilter> gpu = CreateOnDevice(kLut, settings.get());
-  NLEComPtr<INLECGFilter> cpu = tfx_test::CreateEffect(kLut, settings.get());
-  const Bytes noise = RandomPixels(64, 64, 4);
-  EXPECT_EQ(RunOnDevice(gpu.get(), noise, 64, 64), RunOnCpu(cpu.get(), noise, 64, 64));
+  NLEComPtr<INLECGFilter> gpu =
+      CreateOnDevice(kLut, tfx_test::TextSettings(L"lut3dPath", warm).get());
+  NLEComPtr<INLECGFilter> cpu =
+      tfx_test::CreateEffect(kLut, tfx_test::TextSettings(L"lut3dPath", warm).get());
+  EXPECT_EQ(RunOnDevice(gpu.get(), noise, 640, 360), RunOnCpu(cpu.get(), noise, 640, 360));
 
   NLEComPtr<INLEProperties> param;
   ASSERT_EQ(gpu->GetParamPropertyFromName(L"lut3dPath", &param), NLE_S_OK);
@@ -195,8 +194,8 @@ TEST_F(OpenCLLutFiles, LutFollowsThePathFromFrameToFrame) {
   // The new table applies from the next frame: mid-grey everywhere, alpha kept.
   NLEComPtr<INLECGFilter> cpuFlat =
       tfx_test::CreateEffect(kLut, tfx_test::TextSettings(L"lut3dPath", flat).get());
-  const Bytes grey = RunOnDevice(gpu.get(), noise, 64, 64);
-  EXPECT_EQ(grey, RunOnCpu(cpuFlat.get(), noise, 64, 64));
+  const Bytes grey = RunOnDevice(gpu.get(), noise, 640, 360);
+  EXPECT_EQ(grey, RunOnCpu(cpuFlat.get(), noise, 640, 360));
   for (size_t i = 0; i < grey.size(); ++i) {
     ASSERT_TRUE(i % 4 == 3 ? grey[i] == noise[i] : grey[i] == 127 || grey[i] == 128) << i;
   }

@@ -57,7 +57,7 @@ class OpenCL : public tfx_test::OpenCLEffectTest {
   OPENCL::openclMemManager* memory_ = nullptr;
 };
 
-TEST_F(OpenCL, ProgramsAreSharedByNameAndBuiltOnce) {
+TEST_F(OpenCL, ProgramsAreSharedByNameBuiltOnceAndLogTheirErrors) {
   const std::string dir = testing::TempDir();
   const std::string file = dir + "/tfx_copy.cl";
   std::ofstream(file) << kFillSource;
@@ -91,16 +91,15 @@ TEST_F(OpenCL, ProgramsAreSharedByNameAndBuiltOnce) {
   EXPECT_FALSE(fresh->createOpenCLProgram("tfx_copy")->loadProgram(dir.c_str(), 0, 0, 0));
   ASSERT_EQ(log.lines.size(), 1u);
   EXPECT_NE(log.lines[0].second.find(L"tfx_copy.cl"), std::wstring::npos);
-}
 
-TEST_F(OpenCL, BuildErrorIsLoggedWithTheCompilerLog) {
-  OPENCL::openclProgram* program = programs_->createOpenCLProgram("broken");
-  ASSERT_NE(program, nullptr);
-  tfx_test::LogCapture log;
-  EXPECT_FALSE(program->loadProgram(
-      nullptr, nullptr, "kernel void k(global int* p) { p[0] = undeclared_value; }", 0));
-  EXPECT_FALSE(program->isLoaded());
-  EXPECT_EQ(program->getopenclKernel("k"), nullptr);
+  // A build error is logged with the compiler's log.
+  OPENCL::openclProgram* bad = programs_->createOpenCLProgram("broken");
+  ASSERT_NE(bad, nullptr);
+  log.lines.clear();
+  EXPECT_FALSE(bad->loadProgram(nullptr, nullptr,
+                                "kernel void k(global int* p) { p[0] = undeclared_value; }", 0));
+  EXPECT_FALSE(bad->isLoaded());
+  EXPECT_EQ(bad->getopenclKernel("k"), nullptr);
   ASSERT_EQ(log.lines.size(), 1u);
   EXPECT_EQ(log.lines[0].first, kNLELogError);
   const std::wstring& message = log.lines[0].second;
@@ -108,28 +107,22 @@ TEST_F(OpenCL, BuildErrorIsLoggedWithTheCompilerLog) {
   EXPECT_NE(message.find(L"undeclared_value"), std::wstring::npos) << message.c_str();
 }
 
-TEST_F(OpenCL, KernelsAreCachedAndArgumentsChecked) {
+TEST_F(OpenCL, KernelsAreCachedCheckTheirArgumentsAndRunOverEveryPixelOfAFrame) {
   OPENCL::openclProgram* program = FillProgram();
   ASSERT_NE(program, nullptr);
-  OPENCL::openclKernel* kernel = program->getopenclKernel("copy_words");
-  ASSERT_NE(kernel, nullptr);
-  EXPECT_EQ(program->getopenclKernel("copy_words"), kernel);
-  EXPECT_NE(program->getopenclKernel("fill_image"), kernel);
+  OPENCL::openclKernel* copy = program->getopenclKernel("copy_words");
+  ASSERT_NE(copy, nullptr);
+  EXPECT_EQ(program->getopenclKernel("copy_words"), copy);
+  EXPECT_NE(program->getopenclKernel("fill_image"), copy);
   EXPECT_EQ(program->getopenclKernel("no_such_kernel"), nullptr);
 
   OPENCL::openclMemory* none = nullptr;
-  EXPECT_FALSE(kernel->setKernelParameters(0, OPENCL::kDataMemory, &none, 8));
-  EXPECT_FALSE(kernel->setKernelParameters(0, OPENCL::kDataMemory, nullptr, 8));
-  EXPECT_FALSE(kernel->setKernelParameters(7, OPENCL::kDataScalar, &none, 8));  // no argument 7
-  EXPECT_FALSE(kernel->setKernelParameters(0, static_cast<OPENCL::DataType>(3), &none, 8));
-  EXPECT_FALSE(kernel->runKernel(0, 1, 1, true));
-}
+  EXPECT_FALSE(copy->setKernelParameters(0, OPENCL::kDataMemory, &none, 8));
+  EXPECT_FALSE(copy->setKernelParameters(0, OPENCL::kDataMemory, nullptr, 8));
+  EXPECT_FALSE(copy->setKernelParameters(7, OPENCL::kDataScalar, &none, 8));  // no argument 7
+  EXPECT_FALSE(copy->setKernelParameters(0, static_cast<OPENCL::DataType>(3), &none, 8));
+  EXPECT_FALSE(copy->runKernel(0, 1, 1, true));
 
-// One work item per pixel writes a pattern into a frame's device memory; the download shows
-// where each pixel landed and in which byte order, and leaves the caller's row padding alone.
-TEST_F(OpenCL, KernelRunsOverEveryPixelOfAFrame) {
-  OPENCL::openclProgram* program = FillProgram();
-  ASSERT_NE(program, nullptr);
   constexpr int kWidth = 37, kHeight = 5, kStride = kWidth * 4 + 8;
   for (OPENCL::MemoryKind kind : {OPENCL::kMemoryFrameBuffer, OPENCL::kMemoryImage2D}) {
     SCOPED_TRACE(kind == OPENCL::kMemoryImage2D ? "image" : "buffer");
