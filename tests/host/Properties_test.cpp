@@ -99,7 +99,7 @@ TEST(Properties, CutsLongStringsToCapacityAndReportsFullLength) {
   EXPECT_EQ(bag->GetString(L"s", nullptr, 4, &length), NLE_E_POINTER);
 }
 
-TEST(Properties, HoldsOneReferencePerInterfaceEntry) {
+TEST(Properties, HoldsOneReferencePerInterfaceEntryAndCopiesShareThem) {
   CountedObject obj;
   {
     auto bag = NewBag();
@@ -125,10 +125,8 @@ TEST(Properties, HoldsOneReferencePerInterfaceEntry) {
     EXPECT_EQ(obj.refs, 2u);
   }
   EXPECT_EQ(obj.refs, 0u) << "a destroyed bag releases what it holds";
-}
 
-TEST(Properties, CopyToOverwritesSameKeysAndSharesInterfaces) {
-  CountedObject obj;
+  // A copy overwrites the same keys and shares the interfaces.
   {
     auto src = NewBag();
     auto dst = NewBag();

@@ -115,9 +115,7 @@ TEST(ChromeKeyLut3dGenerator, AlphaFollowsTheScreenShareShapedByContrastAndOffse
     EXPECT_NEAR(t.Alpha(half), c.half, c.near);
     EXPECT_NEAR(t.Alpha(most), c.most, c.near);
   }
-}
-
-TEST(ChromeKeyLut3dGenerator, FullContrastGivesAHardMatte) {
+  // Full contrast gives a hard matte.
   NLEChromeKeyLut3dGenerator generator;
   generator.setLutParam(Param(kGreenScreen, 100.0));
   std::vector<float> lattice(64 * 64 * 64 * 3);
@@ -127,7 +125,7 @@ TEST(ChromeKeyLut3dGenerator, FullContrastGivesAHardMatte) {
   EXPECT_EQ(lattice[(63 * 64 + 0) * 64 * 3], 255.0f);  // pure red
 }
 
-TEST(ChromeKeyLut3dGenerator, WindowsAndHueRangeProtectColours) {
+TEST(ChromeKeyLut3dGenerator, WindowsHueRangeAndAGreyScreenProtectColours) {
   lutParam p = Param(kGreenScreen);
   p.saturationHigh = 150;  // the screen's saturation is 204
   EXPECT_EQ(Tables(p).Alpha(kGreenScreen), 255);
@@ -147,13 +145,12 @@ TEST(ChromeKeyLut3dGenerator, WindowsAndHueRangeProtectColours) {
   EXPECT_EQ(t.Alpha({0, 195, 255}), 255);  // hue 194
   EXPECT_EQ(t.Alpha({106, 255, 0}), 0);    // hue 95
   EXPECT_EQ(t.Alpha({0, 255, 149}), 0);    // hue 155
-}
 
-TEST(ChromeKeyLut3dGenerator, GreyScreenKeysNothing) {
-  Tables t(Param({90, 90, 90}));
+  // A grey screen keys nothing.
+  Tables grey(Param({90, 90, 90}));
   for (Rgb c : {Rgb{90, 90, 90}, kGreenScreen, kBlueScreen, Rgb{0, 0, 0}}) {
-    EXPECT_EQ(t.Alpha(c), 255);
-    EXPECT_LE(MaxDiff(t.Beauty(c), c), 1);
+    EXPECT_EQ(grey.Alpha(c), 255);
+    EXPECT_LE(MaxDiff(grey.Beauty(c), c), 1);
   }
 }
 

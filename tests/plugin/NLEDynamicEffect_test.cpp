@@ -34,7 +34,7 @@ class RecordingEffect final : public NLEDynamicEffect {
   int result = 0;
 };
 
-TEST(NLEDynamicEffect, RefusesToRunWithoutFrames) {
+TEST(NLEDynamicEffect, RefusesToRunWithoutFramesAndPassesForegroundOnlyWithEmptyBackground) {
   NLEComPtr<RecordingEffect> fx(new RecordingEffect);
   TestFrame* dst = new TestFrame(2, 2);
   NLEComPtr<INLEFrame> hold(dst);
@@ -45,12 +45,10 @@ TEST(NLEDynamicEffect, RefusesToRunWithoutFrames) {
   NLEComPtr<NLEDynamicEffect> base(new NLEDynamicEffect);
   base->SetForeground(dst);
   EXPECT_EQ(base->Running(dst), NLE_E_NOTIMPL);
-}
 
-TEST(NLEDynamicEffect, PassesForegroundOnlyWithEmptyBackground) {
-  NLEComPtr<RecordingEffect> fx(new RecordingEffect);
+  // With an empty background the foreground alone goes to the effect.
   TestFrame* fg = new TestFrame(3, 2);
-  TestFrame* dst = new TestFrame(3, 2);
+  dst = new TestFrame(3, 2);
   NLEComPtr<INLEFrame> h1(fg), h2(dst);
   fx->SetForeground(fg);
   fx->result = -7;
@@ -72,7 +70,7 @@ TEST(NLEDynamicEffect, PassesForegroundOnlyWithEmptyBackground) {
   EXPECT_EQ(dst->prepareCalls, 1);  // background is the destination itself
 }
 
-TEST(NLEDynamicEffect, PaddedDestinationIsPackedAndWrittenBackRowByRow) {
+TEST(NLEDynamicEffect, PaddedDestinationIsPackedAndWrittenBackAndSurfacesHandedBack) {
   NLEComPtr<RecordingEffect> fx(new RecordingEffect);
   TestFrame* fg = new TestFrame(2, 3, 12, false, 5);
   TestFrame* dst = new TestFrame(2, 3, 12, false, 0xEE);
@@ -86,13 +84,11 @@ TEST(NLEDynamicEffect, PaddedDestinationIsPackedAndWrittenBackRowByRow) {
     for (int x = 0; x < 8; ++x) EXPECT_EQ(dst->Row(y)[x], y * 16 + x) << y << "," << x;
     for (int x = 8; x < 12; ++x) EXPECT_EQ(dst->Row(y)[x], 0xEE);  // padding untouched
   }
-}
 
-TEST(NLEDynamicEffect, SurfaceFramesAreMappedAndHandedBack) {
-  NLEComPtr<RecordingEffect> fx(new RecordingEffect);
-  TestFrame* fg = new TestFrame(2, 2, 0, true);
-  TestFrame* dst = new TestFrame(2, 2, 16, true);
-  NLEComPtr<INLEFrame> h1(fg), h2(dst);
+  // Surface frames are mapped and handed back.
+  fg = new TestFrame(2, 2, 0, true);
+  dst = new TestFrame(2, 2, 16, true);
+  NLEComPtr<INLEFrame> h3(fg), h4(dst);
   fx->SetForeground(fg);
   ASSERT_EQ(fx->Running(dst), 0);
   EXPECT_EQ(fx->s2.data, fg->pixels.data());
