@@ -166,20 +166,17 @@ TEST(Lut3dAdjust, AgreesWithTheImageFormOnEveryPointOfAWholeLevelLattice) {
 }
 
 TEST(Lut3dAdjust, NeutralStrengthNullAndEmptyLutsChangeNothing) {
-  const std::vector<std::pair<const char*, std::function<CubeLut*(CubeLut*)>>> neutral = {
-      {"exposure", [](CubeLut* l) { return lut3d_exposureAdjustment(l, 0); }},
-      {"brightness", [](CubeLut* l) { return lut3d_brightnessAdjustment(l, 0); }},
-      {"contrast", [](CubeLut* l) { return lut3d_contrastAdjustment(l, 0); }},
-      {"vibrance", [](CubeLut* l) { return lut3d_vibranceAdjustment(l, 0); }},
-      {"saturation", [](CubeLut* l) { return lut3d_saturationAdjustment(l, 0); }},
-      {"highlight", [](CubeLut* l) { return lut3d_hdrHighlight(l, 0); }},
-      {"shadow", [](CubeLut* l) { return lut3d_hdrShadow(l, 0); }},
-      {"white level", [](CubeLut* l) { return lut3d_hdrWhiteLevel(l, 0); }},
-      {"black level", [](CubeLut* l) { return lut3d_hdrBlackLevel(l, 0); }},
-      {"balance", [](CubeLut* l) { return lut3d_adjustWhiteBalance(l, 0, 0); }},
-      {"temperature", [](CubeLut* l) { return lut3d_temperatureAdjustment(l, 11500); }},
-      {"tint", [](CubeLut* l) { return lut3d_tintAdjustment(l, 0); }},
-  };
+  // Every twin at its neutral strength; the balance twin holds the tint at 0.25, so both go to 0.
+  std::vector<std::pair<std::string, std::function<CubeLut*(CubeLut*)>>> neutral = {
+      {"balance", [](CubeLut* l) { return lut3d_adjustWhiteBalance(l, 0, 0); }}};
+  for (const Twin& twin : Twins()) {
+    const std::string name = twin.name;
+    const float strength = name.rfind("temperature", 0) == 0 ? 11500 : 0;
+    if (name != "balance (a)") {
+      neutral.emplace_back(name,
+                           [twin, strength](CubeLut* l) { return twin.lattice(l, strength); });
+    }
+  }
   // Points outside 0..255, which a clamping formula would move even at strength 0.
   auto lut = std::make_unique<CubeLut>();
   lut->generateLUT3DData(17);

@@ -12,6 +12,7 @@ cd "$work"
 failures=0
 fail() { echo "FAIL: $*"; failures=$((failures + 1)); }
 ok() { echo "ok: $*"; }
+same() { [ "$2" = "$3" ] && ok "$1" || fail "$1 (got '${2:0:60}', expected '${3:0:60}')"; }
 ff() { ffmpeg -nostdin -v error -y "$@"; }
 video_md5() { ffmpeg -nostdin -v error -i "$1" -map 0:v -f framemd5 - | grep -v '^#'; }
 audio_md5() { ffmpeg -nostdin -v error -i "$1" -map 0:a -c copy -f md5 -; }
@@ -38,15 +39,11 @@ for f in frame_*.png; do
     "got_${n%.png}.raw"
   cmp -s "ref_${n%.png}.raw" "got_${n%.png}.raw" && same_frames=$((same_frames + 1))
 done
-[ "$same_frames" = "$frames" ] && ok "every frame is the picture path's result" ||
-  fail "only $same_frames of $frames frames equal the picture path's"
-[ "$(audio_md5 clip.mkv)" = "$(audio_md5 out.mkv)" ] && ok "audio packets copied bit for bit" ||
-  fail "the audio changed"
-[ "$(times clip.mkv)" = "$(times out.mkv)" ] && ok "frame count and timestamps kept" ||
-  fail "frame count or timestamps changed"
+same "frames equal to the picture path's result" "$same_frames" "$frames"
+same "audio packets copied bit for bit" "$(audio_md5 out.mkv)" "$(audio_md5 clip.mkv)"
+same "frame count and timestamps kept" "$(times out.mkv)" "$(times clip.mkv)"
 "$tool" apply -q "${chain[@]}" --codec ffv1 vfr.mkv vfr-out.mkv || fail "apply on a VFR clip"
-[ "$(times vfr.mkv)" = "$(times vfr-out.mkv)" ] && ok "variable frame rate kept" ||
-  fail "VFR timestamps changed"
+same "variable frame rate kept" "$(times vfr-out.mkv)" "$(times vfr.mkv)"
 
 # Rotation and colour tags survive (stream copy adds the rotation: the encoder option ignores it).
 ff -f lavfi -i "testsrc2=s=96x64:r=25:d=0.4" -c:v libx264 -preset ultrafast -pix_fmt yuv420p \
@@ -60,15 +57,13 @@ tags() { ffprobe -v error -show_streams -select_streams v "$1" | grep -E '^(rota
 # Threads change nothing; H.264 stays within 40 dB of the lossless result.
 "$tool" apply -q "${chain[@]}" --codec ffv1 --threads 4 clip.mkv t4.mkv
 "$tool" apply -q "${chain[@]}" --codec ffv1 --threads 1 clip.mkv t1.mkv
-[ "$(video_md5 t4.mkv)" = "$(video_md5 t1.mkv)" ] && ok "--threads 4 equals --threads 1" ||
-  fail "--threads 4 differs from --threads 1"
+same "--threads 4 equals --threads 1" "$(video_md5 t4.mkv)" "$(video_md5 t1.mkv)"
 # --opencl puts the steps with an OpenCL class on a device (PoCL here), the rest stay on the CPU.
 if "$tool" devices >/dev/null 2>&1; then
   device_chain=(-f ColorAdjust -p u_exposure=30 -f WhiteBalanceAdjust -p u_temperature=40)
   "$tool" apply -q "${device_chain[@]}" --codec ffv1 clip.mkv cpu.mkv
   "$tool" apply -q --opencl "${device_chain[@]}" --codec ffv1 --threads 2 clip.mkv device.mkv
-  [ "$(video_md5 device.mkv)" = "$(video_md5 cpu.mkv)" ] && ok "--opencl chain equals the CPU" ||
-    fail "--opencl chain differs from the CPU"
+  same "--opencl chain equals the CPU" "$(video_md5 device.mkv)" "$(video_md5 cpu.mkv)"
 fi
 # Against the lossless result in the same 4:2:0 layout, so that only the encoder's loss counts;
 # a frame larger than the others, as tiny frames of test patterns are all edges.
