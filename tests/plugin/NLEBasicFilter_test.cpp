@@ -21,16 +21,16 @@ NLEComPtr<INLEProperties> NewBag() {
 }
 
 // A descriptor with the given double parameters (name, default, current).
-struct ParamSpec {
+struct ParamDesc {
   const wchar_t* name;
   double def;
   double current;
 };
-NLEComPtr<INLEProperties> DescriptorWith(std::initializer_list<ParamSpec> params) {
+NLEComPtr<INLEProperties> DescriptorWith(std::initializer_list<ParamDesc> params) {
   NLEComPtr<INLEProperties> desc = NewBag();
   NLEFilterInfoComPtr info(desc);
   int i = 0;
-  for (const ParamSpec& p : params) {
+  for (const ParamDesc& p : params) {
     info.AddParam<double>(p.name, NLEFilterPropertyType_Double, p.def, -10, 10, 1, p.name, 0);
     info.GetParam(i++)->SetValue(Key::Property::kValue_Current, CNLEValue(p.current));
   }
