@@ -30,72 +30,11 @@ using tfx_test::Image;
 using tfx_test::NoiseImage;
 using tfx_test::SameBuffer;
 
-TEST(CxImageCreate, RefusesSizesWhoseBytesDoNotFit32Bits) {
-  // Each of these wrapped to a small buffer in 32-bit arithmetic; 16384 x 65536 x 32 bits is
-  // exactly 2^32 bytes, which wraps to 0.
-  const struct {
-    unsigned width, height, bpp;
-  } cases[] = {{65536, 65536, 32}, {16384, 65536, 32}, {1u << 27, 16, 32}, {UINT_MAX, 16, 8}};
-  for (const auto& c : cases) {
-    SCOPED_TRACE(testing::Message() << c.width << "x" << c.height << ", " << c.bpp << " bpp");
-    CxImage image(2, 2, 32, IPF_BGRA);
-    EXPECT_EQ(image.Create(c.width, c.height, c.bpp, IPF_BGRA), nullptr);
-    EXPECT_EQ(image.GetBits(), nullptr);
-    EXPECT_EQ(image.GetWidth(), 0u);
-    EXPECT_EQ(image.GetSize(), 0u);
-    EXPECT_EQ(image.getFormat(), IPF_None);
-  }
-  const std::unique_ptr<CxImage> gradient(createTemperateColor(65536, 65536));
-  ASSERT_NE(gradient, nullptr);
-  EXPECT_EQ(gradient->GetBits(), nullptr);
-}
-
 // A buffer filled with a pattern that no pixel operation here would produce by chance.
 std::vector<uint8_t> Patterned(size_t bytes) {
   std::vector<uint8_t> buffer(bytes);
   for (size_t i = 0; i < bytes; ++i) buffer[i] = static_cast<uint8_t>(i * 31 + 7);
   return buffer;
-}
-
-TEST(CxImageAccess, StaysWithinGetSize) {
-  // 16 x (2^26 + 2) pixels of 64-byte rows claim 2^32 + 128 bytes, which the 32-bit size wraps
-  // to 128; 8 x 2 pixels of 16-byte rows hold 32-byte rows in 32 bytes. Rows up to GetSize() read
-  // as ever; past it nothing is read or written.
-  const struct {
-    unsigned width, height, effWidth;
-    unsigned long x, y;  // the first pixel past GetSize()
-  } headers[] = {{16, (1u << 26) + 2, 64, 0, 2}, {8, 2, 16, 7, 1}};
-  for (const auto& h : headers) {
-    SCOPED_TRACE(testing::Message() << h.width << "x" << h.height << ", stride " << h.effWidth);
-    std::vector<uint8_t> buffer = Patterned(256);
-    const std::vector<uint8_t> original = buffer;
-    uint8_t* bits = buffer.data();
-    CxImage image(&bits, h.width, h.height, 32, h.effWidth, IPF_BGRA);
-    const tagRGBQUAD first = image.GetPixelColor(1, 1, true);
-    EXPECT_EQ(first.rgbBlue, buffer[h.effWidth + 4]);
-    const tagRGBQUAD past = image.GetPixelColor(h.x, h.y, true);
-    EXPECT_EQ(past.rgbBlue | past.rgbGreen | past.rgbRed | past.rgbReserved, 0);
-    image.SetPixelColor(h.x, h.y, tagRGBQUAD{1, 2, 3, 4});
-    EXPECT_EQ(buffer, original);
-  }
-}
-
-TEST(CxImageCopy, ReplacesASameSizedBufferThatIsTooSmall) {
-  // Same dimensions, twice the stride: the 64-byte buffer cannot take the source's 128 bytes.
-  std::vector<uint8_t> frame = Patterned(128);
-  uint8_t* bits = frame.data();
-  const CxImage wide(&bits, 4, 4, 32, 32, IPF_BGRA);
-  for (int byReference = 0; byReference < 2; ++byReference) {
-    SCOPED_TRACE(byReference ? "Copy(const CxImage&)" : "Copy(const CxImage*)");
-    CxImage target(4, 4, 32, IPF_BGRA);
-    if (byReference) {
-      target.Copy(wide);
-    } else {
-      target.Copy(&wide);
-    }
-    ASSERT_EQ(target.GetSize(), 128u);
-    EXPECT_EQ(std::vector<uint8_t>(target.GetBits(), target.GetBits() + 128), frame);
-  }
 }
 
 TEST(CxImageWrapping, NeverGrowsPastTheCallersBuffer) {

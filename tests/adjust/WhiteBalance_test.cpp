@@ -245,7 +245,9 @@ TEST(WhiteBalance, BlackBodyColoursFollowTheFormulaAndFillTheGradient) {
       ASSERT_EQ(std::memcmp(row + 3 * x, &c, 3), 0) << x;
     }
   }
-  for (const auto& size : {std::pair{0, 5}, std::pair{5, 0}, std::pair{-3, 2}}) {
+  // Sizes of nothing, and 2^32 pixels, whose bytes do not fit 32 bits.
+  for (const auto& size :
+       {std::pair{0, 5}, std::pair{5, 0}, std::pair{-3, 2}, std::pair{65536, 65536}}) {
     const std::unique_ptr<CxImage> empty(createTemperateColor(size.first, size.second));
     ASSERT_NE(empty, nullptr);
     EXPECT_EQ(empty->GetBits(), nullptr);

@@ -1,6 +1,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <climits>
 #include <cstdint>
 #include <cstring>
 #include <tuple>
@@ -27,15 +28,20 @@ struct ImageProbe : CxImage {
 tagRGBQUAD Rgba(uint8_t r, uint8_t g, uint8_t b, uint8_t a) { return tagRGBQUAD{b, g, r, a}; }
 
 TEST(CxImage, CreatePadsRowsToFourBytesAndMakesEightBitsGrey) {
-  // An effWidth of 0 marks a zero argument, which leaves the image empty.
+  // An effWidth of 0 marks a refusal, which leaves the image empty: a zero argument, or a size
+  // that wrapped to a small buffer in 32-bit arithmetic (16384 x 65536 x 32 bits is exactly 2^32
+  // bytes, which wraps to 0).
   const struct {
     unsigned width, height, bpp, effWidth;
-  } cases[] = {{100, 3, 24, 300}, {101, 3, 24, 304}, {5, 3, 8, 8},  {3, 3, 16, 8},
-               {7, 3, 32, 28},    {0, 4, 32, 0},     {4, 0, 32, 0}, {4, 4, 0, 0}};
+  } cases[] = {{100, 3, 24, 300},     {101, 3, 24, 304},     {5, 3, 8, 8},
+               {3, 3, 16, 8},         {7, 3, 32, 28},        {0, 4, 32, 0},
+               {4, 0, 32, 0},         {4, 4, 0, 0},          {65536, 65536, 32, 0},
+               {16384, 65536, 32, 0}, {1u << 27, 16, 32, 0}, {UINT_MAX, 16, 8, 0}};
   for (const auto& c : cases) {
     SCOPED_TRACE(testing::Message() << c.width << "x" << c.height << ", " << c.bpp << " bpp");
     CxImage image(8, 8, 32, IPF_BGRA);
     EXPECT_EQ(image.Create(c.width, c.height, c.bpp, IPF_BGRA), c.effWidth ? &image : nullptr);
+    EXPECT_EQ(image.GetWidth(), c.effWidth ? c.width : 0u);
     EXPECT_EQ(image.GetEffWidth(), c.effWidth);
     EXPECT_EQ(image.GetSize(), c.effWidth * c.height);
     EXPECT_EQ(image.getFormat(), !c.effWidth ? IPF_None : c.bpp == 8 ? IPF_Gray8 : IPF_BGRA);
@@ -96,19 +102,29 @@ TEST(CxImage, SixteenBitWordsLeakBetweenFields) {
 }
 
 TEST(CxImage, OutOfRangeAndMismatchedPixelsReadZeroAndIgnoreWrites) {
-  uint8_t buffer[32];
-  std::memset(buffer, 0x77, sizeof buffer);
-  uint8_t* bits = buffer;
+  // 16 x (2^26 + 2) pixels of 64-byte rows claim 2^32 + 128 bytes, which the 32-bit size wraps
+  // to 128; 8 x 2 pixels of 16-byte rows hold 32-byte rows in 32 bytes. Rows up to GetSize() read
+  // as ever; past it nothing is read or written.
+  std::vector<uint8_t> buffer(128, 0x77);
+  buffer[68] = 5;  // pixel (1, 1) of 64-byte rows
+  buffer[20] = 6;  // and of 16-byte rows
+  const std::vector<uint8_t> original = buffer;
+  uint8_t* bits = buffer.data();
   CxImage image(&bits, 3, 2, 32, 16, IPF_BGRA);
   CxImage threeByteFormat(&bits, 4, 2, 32, 16, IPF_RGB);
   CxImage beyondTheTable(&bits, 4, 2, 32, 16, static_cast<_ImagePixelFormat>(9));
+  CxImage wrapped(&bits, 16, (1u << 26) + 2, 32, 64, IPF_BGRA);
+  CxImage shortRows(&bits, 8, 2, 32, 16, IPF_BGRA);
+  EXPECT_EQ(wrapped.GetPixelColor(1, 1, true).rgbBlue, 5);
+  EXPECT_EQ(shortRows.GetPixelColor(1, 1, true).rgbBlue, 6);
   for (auto [at, x, y] : {std::tuple(&image, 3, 0), std::tuple(&image, 0, 2),
-                          std::tuple(&threeByteFormat, 0, 0), std::tuple(&beyondTheTable, 0, 0)}) {
+                          std::tuple(&threeByteFormat, 0, 0), std::tuple(&beyondTheTable, 0, 0),
+                          std::tuple(&wrapped, 0, 2), std::tuple(&shortRows, 7, 1)}) {
     EXPECT_EQ(at->GetPixelColor(x, y, true), Rgba(0, 0, 0, 0))
         << at->getFormat() << " at " << x << "," << y;
     at->SetPixelColor(x, y, Rgba(1, 2, 3, 4));
   }
-  EXPECT_EQ(std::vector<uint8_t>(buffer, buffer + 32), std::vector<uint8_t>(32, 0x77));
+  EXPECT_EQ(buffer, original);
   EXPECT_EQ(CxImage().GetPixelColor(0, 0, true), Rgba(0, 0, 0, 0));
 }
 
@@ -138,14 +154,18 @@ TEST(CxImage, CopyReusesASameSizedBufferAndReplacesAnyOther) {
   wrapper.Copy(CxImage());
   EXPECT_EQ(wrapper.GetWidth(), 5u);
 
-  // A wrapper of another size frees even the caller's buffer and clears the caller's pointer.
-  uint8_t* small = new uint8_t[16];  // from array new, as the wrapper will delete it
-  ImageProbe other(&small, 2, 2, 32, 8, IPF_BGRA);
-  other.Copy(&src);
-  EXPECT_EQ(small, nullptr);
-  ASSERT_NE(other.GetBits(), nullptr);
-  EXPECT_EQ(other.OwnsBits(), 1u);
-  EXPECT_EQ(other.GetBits()[47], src.GetBits()[47]);
+  // A wrapper of another size frees even the caller's buffer and clears the caller's pointer;
+  // the same dimensions with unpadded rows are 45 bytes, too few for the source's 48.
+  for (int byReference = 0; byReference < 2; ++byReference) {
+    uint8_t* small = new uint8_t[45];  // from array new, as the wrapper will delete it
+    ImageProbe other(&small, 5, 3, 24, 15, IPF_BGR);
+    byReference ? other.Copy(src) : other.Copy(&src);
+    EXPECT_EQ(small, nullptr);
+    ASSERT_NE(other.GetBits(), nullptr);
+    EXPECT_EQ(other.OwnsBits(), 1u);
+    EXPECT_EQ(other.GetSize(), 48u);
+    EXPECT_EQ(std::memcmp(other.GetBits(), src.GetBits(), 48), 0);
+  }
 }
 
 TEST(CxImage, RgbToHslUsesIntegerScale) {
