@@ -26,6 +26,7 @@ using tfx_test::Image;
 using tfx_test::NoiseBytes;
 using tfx_test::NoiseImage;
 using tfx_test::SameBuffer;
+using tfx_test::SameResult;
 
 // Plain per-pixel versions of the colour adjustments, written from the formulas alone and run
 // through GetPixelColor/SetPixelColor, for the fast paths to be compared against. They share no
@@ -33,14 +34,11 @@ using tfx_test::SameBuffer;
 
 template <class Fn>
 void EveryPixel(CxImage* image, Fn fn) {
-  for (unsigned long y = 0; y < image->GetHeight(); ++y) {
-    for (unsigned long x = 0; x < image->GetWidth(); ++x) {
-      tagRGBQUAD c = image->GetPixelColor(x, y, true);
-      uint8_t* channels[3] = {&c.rgbBlue, &c.rgbGreen, &c.rgbRed};
-      fn(channels);
-      image->SetPixelColor(x, y, c);
-    }
-  }
+  tfx_test::MapPixels(image, [&](tagRGBQUAD c) {
+    uint8_t* channels[3] = {&c.rgbBlue, &c.rgbGreen, &c.rgbRed};
+    fn(channels);
+    return c;
+  });
 }
 
 uint8_t FloorAndCap(float v) {
@@ -363,11 +361,10 @@ TEST(ColorAdjust, MatchesReferenceForEveryLayoutWidthAndPaddedStride) {
       for (unsigned width = 1; width <= 40; ++width) {
         for (unsigned pad : {0u, 12u}) {
           SCOPED_TRACE(testing::Message() << op->name << " width " << width << " padding " << pad);
-          const Image actual = NoiseImage(width, 3, 32, IPF_BGRA, width * 4 + pad, width);
-          const Image expected = Clone(*actual);
-          op->reference(expected.get(), op->typical);
-          op->fast(actual.get(), op->typical, *rows);
-          ASSERT_TRUE(SameBuffer(*expected, *actual));
+          ASSERT_TRUE(SameResult(
+              *NoiseImage(width, 3, 32, IPF_BGRA, width * 4 + pad, width),
+              [&](CxImage* i) { op->fast(i, op->typical, *rows); },
+              [&](CxImage* i) { op->reference(i, op->typical); }));
         }
       }
     });
@@ -375,11 +372,10 @@ TEST(ColorAdjust, MatchesReferenceForEveryLayoutWidthAndPaddedStride) {
       // Narrow pixels give brightness overlapping windows; see the walk test below.
       if (op == &kBrightness && layout.bpp < 24) continue;
       SCOPED_TRACE(testing::Message() << op->name << ' ' << layout.bpp << " bpp " << layout.format);
-      const Image actual = NoiseImage(layout, 13, 5, 12, 9);
-      const Image expected = Clone(*actual);
-      op->reference(expected.get(), op->typical);
-      EXPECT_EQ(op->exported(actual.get(), op->typical), actual.get());
-      EXPECT_TRUE(SameBuffer(*expected, *actual));
+      EXPECT_TRUE(SameResult(
+          *NoiseImage(layout, 13, 5, 12, 9),
+          [&](CxImage* i) { EXPECT_EQ(op->exported(i, op->typical), i); },
+          [&](CxImage* i) { op->reference(i, op->typical); }));
     }
   }
 }
@@ -390,13 +386,14 @@ TEST(ColorAdjust, ToneAdjustEqualsTheThreeCurvesInTurn) {
   for (const auto& s : settings) {
     for (unsigned pad : {0u, 8u}) {
       SCOPED_TRACE(testing::Message() << s[0] << ' ' << s[1] << ' ' << s[2] << " pad " << pad);
-      const Image actual = NoiseImage(37, 5, 32, IPF_BGRA, 37 * 4 + pad, 11);
-      const Image expected = Clone(*actual);
-      ReferenceExposure(expected.get(), s[0]);
-      ReferenceBrightness(expected.get(), s[1]);
-      ReferenceContrast(expected.get(), s[2]);
-      tfx::ToneAdjust(actual.get(), s[0], s[1], s[2], tfx::BestColorAdjustRows());
-      ASSERT_TRUE(SameBuffer(*expected, *actual));
+      ASSERT_TRUE(SameResult(
+          *NoiseImage(37, 5, 32, IPF_BGRA, 37 * 4 + pad, 11),
+          [&](CxImage* i) { tfx::ToneAdjust(i, s[0], s[1], s[2], tfx::BestColorAdjustRows()); },
+          [&](CxImage* i) {
+            ReferenceExposure(i, s[0]);
+            ReferenceBrightness(i, s[1]);
+            ReferenceContrast(i, s[2]);
+          }));
     }
   }
 }

@@ -132,11 +132,7 @@ tagRGBQUAD RefPixel(tagRGBQUAD c, const std::vector<RefBand>& bands) {
 
 void ReferenceHsl(CxImage* image, const HSLBands& bands) {
   const std::vector<RefBand> ref = RefBands(bands);
-  for (unsigned long y = 0; y < image->GetHeight(); ++y) {
-    for (unsigned long x = 0; x < image->GetWidth(); ++x) {
-      image->SetPixelColor(x, y, RefPixel(image->GetPixelColor(x, y, true), ref));
-    }
-  }
+  tfx_test::MapPixels(image, [&](tagRGBQUAD c) { return RefPixel(c, ref); });
 }
 
 // ---- Settings
@@ -200,11 +196,10 @@ TEST(HSLAdjust, MatchesTheFormulasInEveryLayoutWidthAndPadding) {
         for (const unsigned pad : {0u, 12u}) {
           SCOPED_TRACE(testing::Message() << l.bpp << " bpp, format " << l.format << ", width "
                                           << width << ", padding " << pad);
-          const Image actual = NoiseImage(l, width, 6, pad, width + pad);
-          const Image expected = Clone(*actual);
-          ReferenceHsl(expected.get(), kEveryBand);
-          hslAdjustment(actual.get(), kEveryBand);
-          ASSERT_TRUE(SameBuffer(*expected, *actual));
+          ASSERT_TRUE(tfx_test::SameResult(
+              *NoiseImage(l, width, 6, pad, width + pad),
+              [](CxImage* i) { hslAdjustment(i, kEveryBand); },
+              [](CxImage* i) { ReferenceHsl(i, kEveryBand); }));
         }
       }
     }

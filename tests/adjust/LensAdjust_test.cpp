@@ -20,6 +20,7 @@ using tfx_test::Clone;
 using tfx_test::Image;
 using tfx_test::NoiseImage;
 using tfx_test::SameBuffer;
+using tfx_test::SameResult;
 using Map = std::vector<tfx::LensPoint>;
 
 // The maps straight from their definitions, pixel by pixel.
@@ -109,16 +110,12 @@ TEST(Lens, ResamplesLikeTheDefinitionsOnEveryLayout) {
     for (const float s : {-2000.0f, -100.0f, -37.5f, 15.0f, 45.0f, 100.0f, 180.0f, 400.0f}) {
       SCOPED_TRACE(testing::Message() << w << 'x' << h << '/' << l.bpp << " strength " << s);
       const Image original = NoiseImage(l.width, l.height, l.bpp, l.format, l.effWidth, l.width);
-      Image actual = Clone(*original), expected = Clone(*original);
-      EXPECT_EQ(distortFilter(actual.get(), s), actual.get());
-      ReferenceDistort(expected.get(), ReferenceDistortMap(s, w, h));
-      ASSERT_TRUE(SameBuffer(*expected, *actual));
-
-      actual = Clone(*original);
-      expected = Clone(*original);
-      EXPECT_EQ(fringingFilter(actual.get(), s), actual.get());
-      ReferenceFringing(expected.get(), ReferenceFringingMaps(s, w, h));
-      ASSERT_TRUE(SameBuffer(*expected, *actual));
+      ASSERT_TRUE(SameResult(
+          *original, [&](CxImage* i) { EXPECT_EQ(distortFilter(i, s), i); },
+          [&](CxImage* i) { ReferenceDistort(i, ReferenceDistortMap(s, w, h)); }));
+      ASSERT_TRUE(SameResult(
+          *original, [&](CxImage* i) { EXPECT_EQ(fringingFilter(i, s), i); },
+          [&](CxImage* i) { ReferenceFringing(i, ReferenceFringingMaps(s, w, h)); }));
     }
   }
 }

@@ -16,8 +16,10 @@ namespace {
 using tfx_test::Clone;
 using tfx_test::EveryColour;
 using tfx_test::Image;
+using tfx_test::MapPixels;
 using tfx_test::NoiseImage;
 using tfx_test::SameBuffer;
+using tfx_test::SameResult;
 
 // Plain per-pixel versions of the light adjustments, written from the formulas alone and run
 // through GetPixelColor/SetPixelColor, for the table paths to be compared against. They share no
@@ -28,16 +30,13 @@ float Enhance(float ch, float k) { return 255.0f - (255.0f - ch) * (255.0f - k *
 // fn(channel, M) gives the new channel.
 template <class Fn>
 void EveryPixel(CxImage* image, Fn fn) {
-  for (unsigned long y = 0; y < image->GetHeight(); ++y) {
-    for (unsigned long x = 0; x < image->GetWidth(); ++x) {
-      tagRGBQUAD c = image->GetPixelColor(x, y, true);
-      const float m = std::max({c.rgbRed, c.rgbGreen, c.rgbBlue}) / 255.0f;
-      c.rgbBlue = fn(c.rgbBlue, m);
-      c.rgbGreen = fn(c.rgbGreen, m);
-      c.rgbRed = fn(c.rgbRed, m);
-      image->SetPixelColor(x, y, c);
-    }
-  }
+  tfx_test::MapPixels(image, [&](tagRGBQUAD c) {
+    const float m = std::max({c.rgbRed, c.rgbGreen, c.rgbBlue}) / 255.0f;
+    c.rgbBlue = fn(c.rgbBlue, m);
+    c.rgbGreen = fn(c.rgbGreen, m);
+    c.rgbRed = fn(c.rgbRed, m);
+    return c;
+  });
 }
 
 uint8_t Wrapped(float v) { return static_cast<uint8_t>(static_cast<int>(v)); }
@@ -145,19 +144,19 @@ TEST(LightAdjust, MatchesReferenceOnPaddedRowsAndOtherLayouts) {
                    << layout.bpp << " bpp " << layout.format << " width " << width);
       const Image original = NoiseImage(layout, width, 5, 12, width);
       for (const Operation* op : kOperations) {
-        SCOPED_TRACE(op->name);
-        const Image actual = Clone(*original), expected = Clone(*original);
-        op->reference(expected.get(), 70);
-        EXPECT_EQ(op->exported(actual.get(), 70), actual.get());
-        EXPECT_TRUE(SameBuffer(*expected, *actual));
+        EXPECT_TRUE(SameResult(
+            *original, [&](CxImage* i) { EXPECT_EQ(op->exported(i, 70), i); },
+            [&](CxImage* i) { op->reference(i, 70); }))
+            << op->name;
       }
-      const Image actual = Clone(*original), expected = Clone(*original);
-      ReferenceHighlight(expected.get(), 70);
-      ReferenceShadow(expected.get(), -40);
-      ReferenceWhiteLevel(expected.get(), 30);
-      ReferenceBlackLevel(expected.get(), -55);
-      tfx::LightAdjust(actual.get(), 70, -40, 30, -55);
-      EXPECT_TRUE(SameBuffer(*expected, *actual));
+      EXPECT_TRUE(SameResult(
+          *original, [](CxImage* i) { tfx::LightAdjust(i, 70, -40, 30, -55); },
+          [](CxImage* i) {
+            ReferenceHighlight(i, 70);
+            ReferenceShadow(i, -40);
+            ReferenceWhiteLevel(i, 30);
+            ReferenceBlackLevel(i, -55);
+          }));
     }
   }
 }
@@ -171,16 +170,10 @@ TEST(LightAdjust, ImageFunctionsScaleStrengthAsThePerPixelFormsExpect) {
   for (const Operation* op : kOperations) {
     for (const float strength : strengths) {
       SCOPED_TRACE(testing::Message() << op->name << ' ' << strength);
-      const Image actual = Clone(*noise);
-      op->exported(actual.get(), strength);
       const float arg = strength / 100.0f * (strength > 0 ? op->up : op->down);
-      const Image expected = Clone(*noise);
-      for (unsigned long y = 0; y < 17; ++y) {
-        for (unsigned long x = 0; x < 61; ++x) {
-          expected->SetPixelColor(x, y, op->perPixel(expected->GetPixelColor(x, y), arg));
-        }
-      }
-      EXPECT_TRUE(SameBuffer(*expected, *actual));
+      EXPECT_TRUE(SameResult(
+          *noise, [&](CxImage* i) { op->exported(i, strength); },
+          [&](CxImage* i) { MapPixels(i, [&](tagRGBQUAD c) { return op->perPixel(c, arg); }); }));
     }
   }
 }

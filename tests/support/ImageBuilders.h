@@ -48,6 +48,25 @@ const CxImage& EveryColour();
 // Equal buffers, or the first differing byte with its pixel coordinates.
 ::testing::AssertionResult SameBuffer(const CxImage& expected, const CxImage& actual);
 
+// `run` and `reference` each on a copy of `source`, compared as SameBuffer compares them.
+template <class Run, class Reference>
+::testing::AssertionResult SameResult(const CxImage& source, Run run, Reference reference) {
+  const Image actual = Clone(source), expected = Clone(source);
+  run(actual.get());
+  reference(expected.get());
+  return SameBuffer(*expected, *actual);
+}
+
+// Every pixel through the accessors, row by row, replaced by fn(pixel).
+template <class Fn>
+void MapPixels(CxImage* image, Fn fn) {
+  for (unsigned long y = 0; y < image->GetHeight(); ++y) {
+    for (unsigned long x = 0; x < image->GetWidth(); ++x) {
+      image->SetPixelColor(x, y, fn(image->GetPixelColor(x, y, true)));
+    }
+  }
+}
+
 // The three components of lattice point (i, j, k), red index first, in the 64-point storage.
 inline float* LatticePoint(CubeLut& lut, int i, int j, int k) {
   return lut.getLut3DData(nullptr, nullptr, nullptr, nullptr) +
