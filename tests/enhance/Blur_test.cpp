@@ -328,7 +328,8 @@ TEST(WindowFilters, TreatRadiiFarBeyondThePlaneAsTheWholePlane) {
 TEST(BlurFamily, BadInputLeavesEveryBufferAlone) {
   // 4x4 BGRA buffers of their exact size, so that any access past them shows under the
   // sanitizers.
-  // Sizes below 1, no channels, and an area past what the buffers can address.
+  // Sizes below 1, no channels (for channelDenoise, no window), and an area past what the
+  // buffers can address.
   const int cases[][3] = {{0, 4, 4}, {4, 0, 4},  {-4, 4, 4},           {4, -1, 4},
                           {4, 4, 0}, {4, 4, -3}, {1 << 30, 1 << 30, 4}};
   const Bytes noise = NoiseBytes(4 * 4 * 4, 51);
@@ -336,6 +337,7 @@ TEST(BlurFamily, BadInputLeavesEveryBufferAlone) {
   for (const auto& [w, h, channels] : cases) {
     gaussianBlur(image.data(), w, h, channels, 2);
     fastAverageBlur(image.data(), w, h, channels, 2);
+    channelDenoise(image.data(), w, h, channels, 10.0f);
     if (channels > 0) {  // the window filters take one channel
       fastWindowAverageFilter(image.data(), out.data(), w, h, 2);
       fastWindowVarianceFilter(image.data(), out.data(), w, h, 2);
@@ -357,6 +359,8 @@ TEST(BlurFamily, BadInputLeavesEveryBufferAlone) {
   fastWindowAverageFilter(nullptr, out.data(), 4, 4, 2);
   fastWindowVarianceFilter(image.data(), nullptr, 4, 4, 2);
   fastFilter(nullptr, out.data(), 4, 4, 2, 0.5f);
+  channelDenoise(nullptr, 4, 4, 3, 10.0f);
+  channelDenoise(image.data(), 1 << 16, 1 << 15, 5, 10.0f);  // 2^31 bytes
   EXPECT_EQ(image, noise);
   EXPECT_EQ(out, noise);
   // Radius below 1 copies the plane.
