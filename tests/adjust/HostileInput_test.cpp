@@ -176,6 +176,15 @@ TEST(ImageFunctions, LeaveMissingPixelsAndInconsistentHeadersUntouched) {
       }
     }
   }
+  // Nor does dehaze find a dark channel in them.
+  for (const auto& h : headers) {
+    std::vector<uint8_t> buffer = Patterned(512);
+    uint8_t* bits = buffer.data();
+    CxImage image(&bits, h.width, h.height, h.bpp, h.effWidth, h.format);
+    uint32_t maxRGB = 7, maxDark = 7;
+    EXPECT_EQ(getMinDarkChannel(&image, &maxRGB, &maxDark), nullptr) << h.name;
+    EXPECT_EQ(maxRGB + maxDark, 0u) << h.name;
+  }
 }
 
 TEST(CalContrastColor, GivesTheExactLimitedResultForAnyLimits) {

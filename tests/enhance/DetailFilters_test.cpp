@@ -206,26 +206,6 @@ TEST(DetailFilters, MatchTheirDefinitionsOnEveryTarget) {
   });
 }
 
-// Images the walk cannot take have no dark channel (the filters leave them alone).
-TEST(Dehaze, NoDarkChannelForImagesItCannotWalk) {
-  std::vector<uint8_t> buffer(64, 0x5a);
-  uint8_t* bits = buffer.data();
-  std::unique_ptr<CxImage> cases[] = {
-      std::make_unique<CxImage>(&bits, 8u, 8u, 8u, 8u, IPF_Gray8),
-      std::make_unique<CxImage>(&bits, 4u, 8u, 16u, 8u, IPF_BGR),
-      std::make_unique<CxImage>(&bits, 4u, 4u, 32u, 12u, IPF_BGRA),  // stride below a row
-      // 65536 rows of 65536 bytes: the 32-bit size wraps to 0.
-      std::make_unique<CxImage>(&bits, 16384u, 65536u, 32u, 65536u, IPF_BGRA),
-      std::make_unique<CxImage>(&bits, 0u, 4u, 32u, 16u, IPF_BGRA),
-  };
-  for (const auto& image : cases) {
-    uint32_t maxRGB = 7, maxDark = 7;
-    EXPECT_EQ(getMinDarkChannel(image.get(), &maxRGB, &maxDark), nullptr) << image->GetBpp();
-    EXPECT_EQ(maxRGB + maxDark, 0u);
-  }
-  EXPECT_TRUE(std::all_of(buffer.begin(), buffer.end(), [](uint8_t v) { return v == 0x5a; }));
-}
-
 // ---- single filters ----------------------------------------------------------------------------
 
 TEST(Dehaze, AddingHazeNeverDarkens) {
