@@ -5,7 +5,6 @@
 #include <cmath>
 #include <cstdint>
 #include <cstring>
-#include <thread>
 #include <vector>
 
 #include "support/EveryTarget.h"
@@ -99,36 +98,6 @@ TEST(HueAdjust, LeavesTheMatrixAloneWithoutWork) {
   for (const float angle : {0.0f, NAN, INFINITY}) hueAdjustment(image.get(), angle);
   hueAdjustment(nullptr, 30.0f);
   EXPECT_EQ(std::memcmp(before, matrix, sizeof(before)), 0);
-}
-
-TEST(HueAdjust, ConcurrentRotationsWithDifferentAnglesStayApart) {
-  const Image source = NoiseImage(256, 64, 32, IPF_BGRA, 1024, 8);
-  const float angles[2] = {40.0f, -110.0f};
-  Image expected[2];
-  float matrices[2][9];
-  for (int t = 0; t < 2; ++t) {
-    expected[t] = Clone(*source);
-    hueAdjustment(expected[t].get(), angles[t]);
-    ReferenceMatrix(angles[t], matrices[t]);
-  }
-  bool same[2] = {true, true};
-  std::thread threads[2];
-  for (int t = 0; t < 2; ++t) {
-    threads[t] = std::thread([&, t] {
-      for (int round = 0; round < 40; ++round) {
-        const Image image = Clone(*source);
-        hueAdjustment(image.get(), angles[t]);
-        same[t] =
-            same[t] && std::memcmp(image->GetBits(), expected[t]->GetBits(), image->GetSize()) == 0;
-      }
-    });
-  }
-  for (std::thread& t : threads) t.join();
-  EXPECT_TRUE(same[0]);
-  EXPECT_TRUE(same[1]);
-  // The published matrix is one whole matrix, never a mix of the two.
-  EXPECT_TRUE(std::memcmp(matrix, matrices[0], sizeof(matrix)) == 0 ||
-              std::memcmp(matrix, matrices[1], sizeof(matrix)) == 0);
 }
 
 TEST(HueAdjust, ExactRotationTurnsTheSameWayAsTheMatrix) {

@@ -5,6 +5,7 @@
 // tables) are shared by all of them; ThreadSanitizer runs this test in CI.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <functional>
 #include <string>
 #include <thread>
@@ -119,6 +120,7 @@ std::vector<Job> Jobs(const std::wstring& cube) {
   const auto image = [&](const char* name, int w, int h, std::function<void(CxImage*)> fn) {
     jobs.push_back({name, [=] { return RunOnImage(w, h, static_cast<uint32_t>(w * h), fn); }});
   };
+  // Two angles at once: each call keeps its own matrix, and the published one stays whole.
   image("hueAdjustment a", 41, 9, [](CxImage* i) { hueAdjustment(i, 40.0f); });
   image("hueAdjustment b", 23, 17, [](CxImage* i) { hueAdjustment(i, -70.0f); });
   image("temperatureAdjustment", 25, 19, [](CxImage* i) { temperatureAdjustment(i, 3500); });
@@ -193,6 +195,15 @@ TEST(ParallelFrames, EveryJobOnFourThreadsGivesItsSerialBytes) {
     });
   }
   for (std::thread& thread : threads) thread.join();
+  // The hue matrix published to hosts is the whole matrix of one of the angles, never a mix.
+  float published[9], whole[2][9];
+  std::copy(matrix, matrix + 9, published);
+  for (int i = 0; i < 2; ++i) {
+    calculateHueMartrix(i ? -70.0f : 40.0f);
+    std::copy(matrix, matrix + 9, whole[i]);
+  }
+  EXPECT_TRUE(std::equal(published, published + 9, whole[0]) ||
+              std::equal(published, published + 9, whole[1]));
   for (int t = 0; t < kThreads; ++t) {
     EXPECT_EQ(mismatches[t], 0) << "thread " << t;
     for (size_t i = 0; i < jobs.size(); ++i) {
