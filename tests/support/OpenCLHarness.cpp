@@ -2,7 +2,7 @@
 
 #include <cstdlib>
 
-#include "support/TestFrame.h"
+#include "support/EffectHarness.h"
 
 namespace tfx_test {
 
@@ -70,13 +70,10 @@ Bytes OpenCLEffectTest::RunOnDevice(INLECGFilter* filter, const Bytes& src, int 
 }
 
 Bytes OpenCLEffectTest::RunOnCpu(INLECGFilter* filter, const Bytes& src, int width, int height) {
-  NLEComPtr<TestFrame> in(new TestFrame(width, height));
-  NLEComPtr<TestFrame> out(new TestFrame(width, height));
-  in->pixels = src;
-  filter->SetForeground(in.get());
-  EXPECT_EQ(filter->Running(out.get()), NLE_S_OK);
+  const Bytes out =
+      RunFrame(filter, new TestFrame(width, height, src), new TestFrame(width, height));
   filter->SetForeground(nullptr);
-  return out->pixels;
+  return out;
 }
 
 ByteDiff CompareBytes(const Bytes& a, const Bytes& b) {
