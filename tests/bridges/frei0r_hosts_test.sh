@@ -97,13 +97,8 @@ melt_run() {  # melt_run OUT.raw FRAMES [melt args]... ; writes every frame
 # Every frame of a multi-frame result against one reference.
 same_frames() {  # same_frames NAME GOT WANT FRAMES
   local f
-  for ((f = 0; f < $4; f++)); do
-    if ! cmp -s -i $((f * 128 * 96 * 4)):0 -n $((128 * 96 * 4)) "$2" "$3"; then
-      fail "$1: frame $f differs"
-      return
-    fi
-  done
-  echo "ok: $1"
+  for ((f = 0; f < $4; f++)); do cat "$3"; done >frames.raw
+  same "$1" "$2" frames.raw
 }
 clip=(pixbuf:in.png out=5)
 # The key chain: mask and colours on two tracks, joined by the two-input module as a transition.
