@@ -89,8 +89,6 @@ class VideoFiles : public ::testing::Test {
     }
     return s.ok() ? writer.Finish() : s;
   }
-  // Nothing but the named files: no target after a failure, no hidden temporary left behind.
-  std::vector<std::string> Listing() const { return dir_.Names(); }
 
   static double Seconds(const Clip& clip, size_t i) {
     return double(clip.frames[i].pts) * clip.info.timeBase.num / clip.info.timeBase.den;
@@ -195,7 +193,7 @@ TEST_F(VideoFiles, ImageSequenceAndStillReadAsVideos) {
   Status s = Transcode(source, Path("shot_%04d.png"), options);
   ASSERT_TRUE(s.ok()) << s.message();
   EXPECT_TRUE(fs::exists(Path("shot_0005.png")));
-  EXPECT_EQ(Listing().size(), 6u);  // the source and five pictures
+  EXPECT_EQ(dir_.Names().size(), 6u);  // the source and five pictures
 
   const Clip in = ReadAll(source), shots = ReadAll(Path("shot_%04d.png"));
   ASSERT_EQ(shots.frames.size(), in.frames.size());
@@ -218,7 +216,7 @@ TEST_F(VideoFiles, FailuresNameTheirCauseAndLeaveNoFile) {
   EXPECT_NE(opening(Path("missing.mkv")).find("No such file"), std::string::npos);
   EXPECT_NE(opening(sound).find("has no video stream"), std::string::npos);
 
-  const std::vector<std::string> before = Listing();
+  const std::vector<std::string> before = dir_.Names();
   struct Case {
     std::string target, codec, cause;
   };
@@ -237,7 +235,7 @@ TEST_F(VideoFiles, FailuresNameTheirCauseAndLeaveNoFile) {
     EXPECT_NE(message.find(c.cause), std::string::npos) << message;
     EXPECT_FALSE(fs::exists(c.target)) << c.target;
   }
-  EXPECT_EQ(Listing(), before);
+  EXPECT_EQ(dir_.Names(), before);
 
   // Abandoned half way, by Abort() and by the interrupt path.
   for (bool interrupt : {false, true}) {
@@ -249,12 +247,12 @@ TEST_F(VideoFiles, FailuresNameTheirCauseAndLeaveNoFile) {
     bool got = false;
     for (int i = 0; i < 10; ++i)
       ASSERT_TRUE(reader.Read(frame, &got).ok() && writer.Write(frame).ok());
-    EXPECT_EQ(Listing().size(), before.size() + 1);
+    EXPECT_EQ(dir_.Names().size(), before.size() + 1);
     if (interrupt)
       VideoWriter::RemoveTemporaryFiles();
     else
       writer.Abort();
-    EXPECT_EQ(Listing(), before);
+    EXPECT_EQ(dir_.Names(), before);
   }
 
   // Cut in half: what is there decodes, the rest is reported.
