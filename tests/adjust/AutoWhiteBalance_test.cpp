@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <climits>
 #include <cmath>
 #include <cstdint>
 #include <opencv2/core.hpp>
@@ -171,6 +172,45 @@ TEST(AutoWhiteBalance, PickedWhitePointAndBadInput) {
   EXPECT_FALSE(awb.FindWhitePoint(scene.pixels.data(), 40));
   EXPECT_FALSE(awb.Process(none, none, 10, 10, 40, 40));
   EXPECT_EQ(awb.Gain().g, 1.0f);
+
+  // Extreme positions and blocks on a 4 x 4 image of its exact size: nothing past it is read.
+  std::vector<uint8_t> image(4 * 4 * 4);
+  for (size_t i = 0; i < image.size(); i += 4) {
+    image[i] = 10;
+    image[i + 1] = 20;
+    image[i + 2] = 30;
+  }
+  for (const int at : {0, 3}) {
+    SCOPED_TRACE(at);
+    ASSERT_TRUE(awb.SetWhitePointPos(image.data(), 4, 4, 16, at, at, INT_MAX));
+    EXPECT_EQ(awb.WhitePoint().b, 10);
+    EXPECT_EQ(awb.WhitePoint().g, 20);
+    EXPECT_EQ(awb.WhitePoint().r, 30);
+  }
+  EXPECT_FALSE(awb.SetWhitePointPos(image.data(), 4, 4, 12, 0, 0, 1));
+  // A buffer described as larger than INT_MAX bytes is not walked, nor are samples made for it.
+  EXPECT_FALSE(awb.BGR2YCbCr(image.data(), 65536, 65536, 262144));
+  EXPECT_FALSE(awb.SetWhitePointPos(image.data(), 65536, 65536, 262144, 0, 0, 1));
+  // Blocks reaching outside the converted image are left as they are.
+  ASSERT_TRUE(awb.BGR2YCbCr(image.data(), 4, 4, 16));
+  const struct {
+    int x, y, width, height;
+  } outside[] = {{-4, 0, 4, 4}, {2, 0, 4, 4}, {0, 1, 4, INT_MAX}, {0, 0, 0, 0}};
+  for (const auto& o : outside) {
+    SCOPED_TRACE(testing::Message() << o.x << "," << o.y << " " << o.width << "x" << o.height);
+    WhitePointinfo block{};
+    block.x = o.x;
+    block.y = o.y;
+    block.width = o.width;
+    block.height = o.height;
+    block.meanY = block.avdCb = -1.0f;
+    awb.CalcMean(&block);
+    awb.CalcAVD(&block);
+    EXPECT_EQ(block.meanY, -1.0f);
+    EXPECT_EQ(block.avdCb, -1.0f);
+  }
+  awb.CalcMean(nullptr);
+  EXPECT_EQ(awb.FindWhitePointBlock(image.data(), 12, 0, 0).width, 0);
 }
 
 }  // namespace

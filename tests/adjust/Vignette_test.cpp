@@ -98,6 +98,10 @@ TEST(VignetteGradient, MatchesTheDefinitionOnEveryPixel) {
     }
   }
   generateGradient(200, 100, 0.5f, 0.0f, 1.0f, nullptr);  // a null mask is ignored
+  // So is a mask above INT_MAX bytes.
+  std::vector<float> mask(16, -1.0f);
+  generateGradient(65536, 8192, 0.5f, 1.0f, 0.0f, mask.data());
+  EXPECT_EQ(mask, std::vector<float>(16, -1.0f));
 }
 
 TEST(VignetteRow, MatchesThePixelFormOnEveryColour) {

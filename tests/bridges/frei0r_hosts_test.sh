@@ -64,7 +64,6 @@ ffmpeg_case light '0.7|0.6|0.4|0.3' LightAdjust -p u_highLight=40 -p u_shadow=20
   -p u_whiteLevel=-20 -p u_blackLevel=-40
 key=(-p red=48 -p green=192 -p blue=64 -p contrast=60)
 ffmpeg_case chromakey '0x30C040|0.6|0.5|n' ChromeKeyLut3d "${key[@]}" -p mode=0
-cp ref-chromakey.raw ref-mask.raw
 ffmpeg_case chromakey '0x30C040|0.6|0.5|y' ChromeKeyLut3d "${key[@]}" -p mode=1
 
 # --- melt: a profile of the picture's own size, so that nothing is scaled.
