@@ -291,6 +291,21 @@ HWY_INLINE Corner LoadCorner(const float* points, const int32_t* offsets) {
 
 #endif  // HWY_TARGET == HWY_SCALAR
 
+// Whether every lane of r, g and b is at least 0.5 (NaN is not), each comparison masked by the
+// one before rather than the masks joined after.
+HWY_INLINE bool AllAtLeastHalf(VF r, VF g, VF b) {
+  const DF df;
+  const VF half = hn::Set(df, 0.5f);
+#if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
+  __mmask16 k = _mm512_cmp_ps_mask(r.raw, half.raw, _CMP_GE_OQ);
+  k = _mm512_mask_cmp_ps_mask(k, g.raw, half.raw, _CMP_GE_OQ);
+  k = _mm512_mask_cmp_ps_mask(k, b.raw, half.raw, _CMP_GE_OQ);
+  return k == 0xFFFF;
+#else
+  return hn::AllTrue(df, hn::And(hn::Ge(r, half), hn::And(hn::Ge(g, half), hn::Ge(b, half))));
+#endif
+}
+
 // The second pass for one vector of pixels `p` whose first pass is at lane `at` of `prepared`.
 template <bool kGrey>
 HWY_INLINE VU Finish(const Kernel& kernel, VU p, const Prepared& prepared, size_t at) {
@@ -299,8 +314,8 @@ HWY_INLINE VU Finish(const Kernel& kernel, VU p, const Prepared& prepared, size_
   const DF df;
   const VF w[4] = {hn::Load(df, prepared.weight[0] + at), hn::Load(df, prepared.weight[1] + at),
                    hn::Load(df, prepared.weight[2] + at), hn::Load(df, prepared.weight[3] + at)};
-  const VU alpha = hn::And(p, hn::Set(du, 0xff000000u));
   if constexpr (kGrey) {
+    const VU alpha = hn::And(p, hn::Set(du, 0xff000000u));
     // One float a point; the byte goes to blue, green and red alike.
     VF c[4];
     for (int k = 0; k < 4; ++k) {
@@ -322,15 +337,15 @@ HWY_INLINE VU Finish(const Kernel& kernel, VU p, const Prepared& prepared, size_
     VU r8, g8, b8;
     // Lattices stay within 0..255 in practice; the general conversion is for the others. Values
     // from 0.5 up (NaN fails the comparison) pass Plain at half the comparisons.
-    const VF half = hn::Set(df, 0.5f);
-    if (hn::AllTrue(df, hn::And(hn::Ge(r, half), hn::And(hn::Ge(g, half), hn::Ge(b, half)))) ||
+    if (AllAtLeastHalf(r, g, b) ||
         hn::AllTrue(df, hn::And(Plain(r), hn::And(Plain(g), Plain(b))))) {
       r8 = PlainBytes(r), g8 = PlainBytes(g), b8 = PlainBytes(b);
     } else {
       r8 = ComponentBytes(r), g8 = ComponentBytes(g), b8 = ComponentBytes(b);
     }
-    // Red to byte 2, green to byte 1, blue to byte 0.
-    return hn::Or(hn::Or(alpha, b8), hn::Or(hn::ShiftLeft<8>(g8), hn::ShiftLeft<16>(r8)));
+    // Red to byte 2, green to byte 1, blue to byte 0, alpha kept.
+    const VU rgb = hn::Or3(b8, hn::ShiftLeft<8>(g8), hn::ShiftLeft<16>(r8));
+    return hn::Or(rgb, hn::And(p, hn::Set(du, 0xff000000u)));
   }
 }
 
