@@ -8,7 +8,7 @@ tool=$1
 export FREI0R_PATH=$2
 work=$(mktemp -d)
 [ -n "${KEEP:-}" ] || trap 'rm -rf "$work"' EXIT
-cd "$work"
+cd "$work" || exit 1
 # A registry of our own, built once before any pipeline: GStreamer rescans plug-ins whose files
 # changed, and two processes rescanning the shared one at once can miss an element.
 export GST_REGISTRY=$work/gst-registry.bin
@@ -81,12 +81,12 @@ frame_rate_den=1
 colorspace=709
 PROFILE
 melt_run() {  # melt_run OUT.raw FRAMES [melt args]... ; writes every frame
-  local out=$1 frames=$2 try
+  local out=$1 frames=$2
   shift 2
   local want=$((128 * 96 * 4 * frames))
   # With parallel rendering (real_time), melt's consumer can stop before its queue drains on a busy
   # machine and write fewer frames; a short file is run again, a wrong frame never is.
-  for try in 1 2 3; do
+  for _ in 1 2 3; do
     melt -quiet -profile profile "$@" -consumer "avformat:$out" f=rawvideo pix_fmt=bgra \
       >/dev/null 2>melt.log || { fail "melt $*"; cat melt.log; return; }
     [ "$(stat -c %s "$out" 2>/dev/null || echo 0)" = "$want" ] && return

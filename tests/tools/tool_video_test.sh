@@ -8,7 +8,7 @@ set -uo pipefail
 tool=$1
 work=$(mktemp -d)
 [ -n "${KEEP:-}" ] || trap 'rm -rf "$work"' EXIT
-cd "$work"
+cd "$work" || exit 1
 failures=0
 fail() { echo "FAIL: $*"; failures=$((failures + 1)); }
 ok() { echo "ok: $*"; }
@@ -92,7 +92,8 @@ expect_failure() {  # expect_failure NAME PATTERN TARGET COMMAND...
   if [ $rc = 0 ]; then fail "$name: exit status 0"; return; fi
   grep -qi -- "$pattern" fail.log || { fail "$name: no message like '$pattern'"; cat fail.log; }
   [ ! -e "$target" ] || fail "$name: $target exists"
-  ls -a "$(dirname "$target")" 2>/dev/null | grep -q '\.tmp-' && fail "$name: a temporary file is left"
+  find "$(dirname "$target")" -maxdepth 1 -name "*.tmp-*" 2>/dev/null | grep -q . &&
+    fail "$name: a temporary file is left"
   echo "ok: $name"
 }
 ff -f lavfi -i "sine=d=0.3" sound.wav
@@ -126,7 +127,8 @@ sleep 1
 kill -INT $pid
 wait $pid
 rc=$?
-[ $rc != 0 ] && [ ! -e cut.mp4 ] && ! ls -a | grep -q '\.tmp-' && ok "Ctrl-C leaves nothing" ||
+left=$(find . -maxdepth 1 -name "*.tmp-*")
+[ $rc != 0 ] && [ ! -e cut.mp4 ] && [ -z "$left" ] && ok "Ctrl-C leaves nothing" ||
   fail "Ctrl-C: exit $rc, target or temporary file left"
 # A damaged input: processed as far as it decodes, reported, exit status 3.
 head -c $(($(stat -c %s clip.mkv) / 2)) clip.mkv >half.mkv
