@@ -364,23 +364,6 @@ HWY_INLINE void PrepareBlock(const Kernel kernel, const uint32_t* in, Prepared& 
   }
 }
 
-// `count` 4-byte pixels (a whole number of vectors, at most kBlock) from `in` to `out`, which may
-// be the same.
-template <bool kGrey>
-HWY_INLINE void Block(const Kernel& kernel, const uint32_t* in, uint32_t* out, size_t count) {
-  const DU du;
-  const size_t lanes = hn::Lanes(du);
-  Prepared prepared;
-  if (kernel.DoLutTables()) {
-    PrepareBlock<true>(kernel, in, prepared, count);
-  } else {
-    PrepareBlock<false>(kernel, in, prepared, count);
-  }
-  for (size_t x = 0; x < count; x += lanes) {
-    hn::StoreU(Finish<kGrey>(kernel, hn::LoadU(du, in + x), prepared, x), du, out + x);
-  }
-}
-
 // `whole` 4-byte pixels (a whole number of vectors) in blocks, each vector of the next block
 // prepared beside one of this block being finished.
 template <bool kGrey, bool kDirect, bool kDoLut>
@@ -413,26 +396,32 @@ HWY_INLINE void Blocks(const Kernel kernel, const uint32_t* in, uint32_t* out, s
   }
 }
 
+// Blocks, with the kernel's tables tested once. kDirect: in place without staging, for pixels
+// whose corners are scattered (the slabs) and for buffers of the kernel's own.
+template <bool kGrey, bool kDirect>
+HWY_INLINE void Vectors(const Kernel& kernel, const uint32_t* in, uint32_t* out, size_t whole) {
+  if (whole == 0) return;
+  if (kernel.DoLutTables()) {
+    Blocks<kGrey, kDirect, true>(kernel, in, out, whole);
+  } else {
+    Blocks<kGrey, kDirect, false>(kernel, in, out, whole);
+  }
+}
+
 // 4-byte pixels in whole blocks and vectors; the last partial vector goes through a zero-padded
-// copy, so the tail gets the same arithmetic as every other pixel. kDirect: in place without
-// staging, for pixels whose corners are scattered (the slabs).
+// copy, so the tail gets the same arithmetic as every other pixel.
 template <bool kGrey, bool kDirect = false>
 void Rows4(const Kernel& kernel, const uint8_t* in, uint8_t* out, size_t width) {
   const DU du;
   const size_t lanes = hn::Lanes(du);
   const size_t whole = width / lanes * lanes;
   // Rows only reaches here with both rows 4-byte aligned; odd ones go through RowsN.
-  const uint32_t* const from = reinterpret_cast<const uint32_t*>(in);
-  uint32_t* const to = reinterpret_cast<uint32_t*>(out);
-  if (whole > 0 && kernel.DoLutTables()) {
-    Blocks<kGrey, kDirect, true>(kernel, from, to, whole);
-  } else if (whole > 0) {
-    Blocks<kGrey, kDirect, false>(kernel, from, to, whole);
-  }
+  Vectors<kGrey, kDirect>(kernel, reinterpret_cast<const uint32_t*>(in),
+                          reinterpret_cast<uint32_t*>(out), whole);
   if (whole < width) {
     HWY_ALIGN uint32_t tail[HWY_MAX_BYTES / sizeof(uint32_t)] = {};
     std::memcpy(tail, in + 4 * whole, (width - whole) * 4);
-    Block<kGrey>(kernel, tail, tail, lanes);
+    Vectors<kGrey, true>(kernel, tail, tail, lanes);
     std::memcpy(out + 4 * whole, tail, (width - whole) * 4);
   }
 }
@@ -455,7 +444,7 @@ void RowsN(const Kernel& kernel, const uint8_t* in, uint8_t* out, size_t width,
     }
     const size_t padded = (count + lanes - 1) / lanes * lanes;
     for (size_t i = count; i < padded; ++i) block[i] = 0;
-    Block<kGrey>(kernel, block, block, padded);
+    Vectors<kGrey, true>(kernel, block, block, padded);
     uint8_t* q = first;
     for (size_t i = 0; i < count; ++i, q += bytesPerPixel) {
       q[0] = static_cast<uint8_t>(block[i]);
