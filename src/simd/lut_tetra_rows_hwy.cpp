@@ -99,6 +99,17 @@ HWY_INLINE VU PlainBytes(VF v) {
   return hn::BitCast(DU(), SmallToInt(hn::Add(c, hn::Set(df, 0.5f))));
 }
 
+// What a position lies above its lower lattice point (positions are never negative), exactly;
+// the position less it is that point. AVX-512 has it in one instruction, where rounding down
+// takes two on the same port: truncating, as x - x then gives +0 and not -0.
+HWY_INLINE VF FractionOf(VF where) {
+#if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
+  return VF{_mm512_reduce_ps(where.raw, _MM_FROUND_TO_ZERO | _MM_FROUND_NO_EXC)};
+#else
+  return hn::Sub(where, hn::Floor(where));
+#endif
+}
+
 // Pixels of a 64-byte line, and how far ahead of the first pass the pixels are prefetched.
 constexpr size_t kLineLanes = 16;
 constexpr size_t kAhead = 1024;
@@ -147,16 +158,17 @@ struct Kernel {
       // Gathers cost the most here: one a byte gives the lower index (its floor) and the
       // fraction (the rest). Index times stride and their sum stay far below 2^24, so float
       // arithmetic is exact.
-      VF offset = hn::Zero(df);
+      VF offset;
       const VI channel[3] = {r, g, b};
       Axis* const axes[3] = {&red, &green, &blue};
       for (int axis = 0; axis < 3; ++axis) {
         const VF where = kDoLut || divisor != 0.0f
                              ? hn::Div(hn::ConvertTo(df, channel[axis]), hn::Set(df, divisor))
                              : hn::GatherIndex(df, position, channel[axis]);
-        const VF index = hn::Floor(where);
-        offset = hn::Add(offset, hn::Mul(index, hn::Set(df, strideF[axis])));
-        *axes[axis] = {hn::Sub(where, index), hn::Set(di, stride[axis])};
+        const VF fraction = FractionOf(where);
+        const VF part = hn::Mul(hn::Sub(where, fraction), hn::Set(df, strideF[axis]));
+        offset = axis == 0 ? part : hn::Add(offset, part);
+        *axes[axis] = {fraction, hn::Set(di, stride[axis])};
       }
       p000 = SmallToInt(offset);  // below 2^22: at most 65^3 points of 4 floats
     } else {
