@@ -326,8 +326,8 @@ HWY_INLINE VU Finish(const Kernel& kernel, VU p, const Prepared& prepared, size_
   const DF df;
   const VF w[4] = {hn::Load(df, prepared.weight[0] + at), hn::Load(df, prepared.weight[1] + at),
                    hn::Load(df, prepared.weight[2] + at), hn::Load(df, prepared.weight[3] + at)};
+  const VU alpha = hn::And(p, hn::Set(du, 0xff000000u));
   if constexpr (kGrey) {
-    const VU alpha = hn::And(p, hn::Set(du, 0xff000000u));
     // One float a point; the byte goes to blue, green and red alike.
     VF c[4];
     for (int k = 0; k < 4; ++k) {
@@ -356,8 +356,7 @@ HWY_INLINE VU Finish(const Kernel& kernel, VU p, const Prepared& prepared, size_
       r8 = ComponentBytes(r), g8 = ComponentBytes(g), b8 = ComponentBytes(b);
     }
     // Red to byte 2, green to byte 1, blue to byte 0, alpha kept.
-    const VU rgb = hn::Or3(b8, hn::ShiftLeft<8>(g8), hn::ShiftLeft<16>(r8));
-    return hn::Or(rgb, hn::And(p, hn::Set(du, 0xff000000u)));
+    return hn::Or(hn::Or3(b8, hn::ShiftLeft<8>(g8), hn::ShiftLeft<16>(r8)), alpha);
   }
 }
 
@@ -383,18 +382,18 @@ HWY_INLINE void Blocks(const Kernel kernel, const uint32_t* in, uint32_t* out, s
   const DU du;
   const size_t lanes = hn::Lanes(du);
   Prepared prepared[2];
+  // In place, a block's results go through the stack first: stored straight over the row, on
+  // frames whose neighbouring pixels share corners (so that the corner loads finish early), they
+  // held up the next block's pixel loads, and a photo-like frame took 40% longer than random
+  // pixels.
+  const bool stage = in == out && !kDirect;
   PrepareBlock<kDoLut>(kernel, in, prepared[0], whole < kBlock ? whole : kBlock);
   size_t now = 0;
   for (size_t start = 0; start < whole; start += kBlock, now ^= 1) {
     const size_t count = whole - start < kBlock ? whole - start : kBlock;
     const size_t next = start + count;
     const size_t nextCount = whole - next < kBlock ? whole - next : kBlock;
-    // In place, a block's results go through the stack first: stored straight over the row, on
-    // frames whose neighbouring pixels share corners (so that the corner loads finish early),
-    // they held up the next block's pixel loads, and a photo-like frame took 40% longer than
-    // random pixels.
     HWY_ALIGN uint32_t staged[kBlock];
-    const bool stage = in == out && !kDirect;
     uint32_t* const to = stage ? staged : out + start;
     for (size_t x = 0; x < count; x += lanes) {
       if (x < nextCount) {
