@@ -96,10 +96,27 @@ void TetraPlan::Prepare(const TetraTable& table) {
     positional_ =
         positional_ && floor == lower && std::memcmp(&rest, &table.ft[v], sizeof rest) == 0;
   }
-  divisor_ = positional_ ? 255.0f / static_cast<float>(n - 1) : 0.0f;
-  for (int v = 0; v < 256 && divisor_ != 0.0f; ++v) {
-    const float quotient = static_cast<float>(v) / divisor_;
-    if (std::memcmp(&quotient, &position_[v], sizeof quotient) != 0) divisor_ = 0.0f;
+  // doLUT makes each position a quotient, v / (255 / (N - 1)). A division ties up the divider
+  // for many cycles, so the same quotients are sought as v * high + v * low: high keeps 16 bits
+  // of the reciprocal, so that v * high (8 + 16 bits) is exact, and low is the rest. Every byte
+  // is checked, so no position can differ from the table's.
+  scale_[0] = scale_[1] = 0.0f;
+  if (positional_ && n > 1) {
+    const float divisor = 255.0f / static_cast<float>(n - 1);
+    const double exact = 1.0 / static_cast<double>(divisor);
+    uint32_t bits;
+    float high = static_cast<float>(exact);
+    std::memcpy(&bits, &high, sizeof bits);
+    bits &= ~uint32_t{0xff};
+    std::memcpy(&high, &bits, sizeof high);
+    const float low = static_cast<float>(exact - static_cast<double>(high));
+    bool same = true;
+    for (int v = 0; v < 256 && same; ++v) {
+      const float f = static_cast<float>(v);
+      const float product = f * high, rest = f * low, where = product + rest;
+      same = std::memcmp(&where, &position_[v], sizeof where) == 0;
+    }
+    if (same) scale_[0] = high, scale_[1] = low;
   }
 
   const auto point = [&](int i, int j, int k) {

@@ -92,9 +92,9 @@ class TetraPlan {
   // that sum gives both back exactly (floor and remainder), as for the tables doLUT builds; then
   // one look-up a byte does for two. Null otherwise.
   const float* Positions() const { return positional_ ? position_ : nullptr; }
-  // The float that every byte divided by gives its position, as doLUT's own tables are made; 0
-  // where the positions are not such quotients. A division costs less than a gather.
-  float Divisor() const { return divisor_; }
+  // Two floats, high and low, with v * high + v * low (each product rounded, then the sum) the
+  // position of every byte v, as for doLUT's own tables; 0 where no such pair was found.
+  float Scale(int part) const { return scale_[part]; }
   const int32_t* Lower(int axis) const { return lower_[axis]; }  // red 0, green 1, blue 2
   int32_t Stride(int axis) const { return stride_[axis]; }       // floats between points
 
@@ -118,7 +118,7 @@ class TetraPlan {
   float ft_[256] = {};
   float position_[256] = {};
   bool positional_ = false;
-  float divisor_ = 0.0f;
+  float scale_[2] = {};
   int32_t lower_[3][256] = {};
   int32_t stride_[3] = {};
   int slabs_ = 1;

@@ -177,6 +177,17 @@ TEST(CubeLutApply, ImagesThroughSlabsMatchTheReference) {
   EXPECT_EQ(plan.Slabs(), 1);
 }
 
+// The positions doLUT builds must come from the two multiplies at every size: a size left
+// without them falls back to gathers, whose bytes are the same but which cost the most.
+TEST(CubeLutApply, EverySizeFindsItsPositionsByMultiplying) {
+  for (int n = 2; n <= 64; ++n) {
+    Lattice lattice(n);
+    tfx::TetraPlan plan;
+    plan.Prepare(lattice.Table());
+    EXPECT_NE(plan.Scale(0), 0.0f) << n;
+  }
+}
+
 // With N = 52 every multiple of 5 falls on a lattice point and gives C000 weight 1 and the other
 // corners weight 0. Those corners have an odd index, so keeping odd points at 0 lets every even
 // point's value reach the byte conversion unmixed, NaN and infinities included.
