@@ -237,14 +237,26 @@ void TetraImage(const TetraPlan& plan, const uint8_t* in, int inPitch, uint8_t* 
       scratch.reset(static_cast<uint32_t*>(AllocateBlocks(needed * sizeof(uint32_t))));
       scratchSize = scratch ? needed : 0;
     }
-    for (int y = 0; y < height; y += bandRows) {
-      const int rows = std::min(bandRows, height - y);
-      const uint8_t* const from = in + static_cast<ptrdiff_t>(y) * inPitch;
-      uint8_t* const to = pixels + static_cast<ptrdiff_t>(y) * pitch;
-      if (!scratch || Coherent(plan.Table(), from, inPitch, width, rows)) {
-        for (int r = 0; r < rows; ++r) TetraRow(plan, from + r * inPitch, to + r * pitch, width, 4);
-      } else {
-        TetraBandVector(plan, from, inPitch, to, pitch, width, rows, scratch.get());
+    const auto rowsOf = [&](int y) { return std::min(bandRows, height - y); };
+    const auto from = [&](int y) { return in + static_cast<ptrdiff_t>(y) * inPitch; };
+    const auto to = [&](int y) { return pixels + static_cast<ptrdiff_t>(y) * pitch; };
+    // A band whose neighbouring pixels mostly share their cells goes row by row; runs of the
+    // others go through the slabs together.
+    for (int y = 0; y < height;) {
+      int end = y;
+      while (end < height && scratch &&
+             !Coherent(plan.Table(), from(end), inPitch, width, rowsOf(end))) {
+        end += rowsOf(end);
+      }
+      if (end > y) {
+        TetraBandsVector(plan, from(y), inPitch, to(y), pitch, width, end - y, bandRows,
+                         scratch.get());
+      }
+      y = end;
+      if (y < height) {
+        for (const int stop = y + rowsOf(y); y < stop; ++y) {
+          TetraRow(plan, from(y), to(y), width, 4);
+        }
       }
     }
     return;

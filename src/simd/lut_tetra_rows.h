@@ -21,15 +21,15 @@ inline constexpr size_t kSortBytes = 64;
 
 // The uint32_t elements one slab of a band of `rows` rows of `width` pixels may need.
 size_t TetraBandCapacity(int width, int rows);
-// The uint32_t elements of scratch TetraBandVector needs for such a band: every slab, and where
-// each vector's pixels went.
+// The uint32_t elements of scratch TetraBandsVector needs for bands of `rows` rows of `width`
+// pixels: every slab, and where each vector's pixels went, for two bands.
 size_t TetraBandScratch(int width, int rows);
 
-// `rows` rows of 4-byte pixels (4-byte aligned, pitches in bytes) through a plan with Slabs() > 1,
-// a slab at a time with AVX-512 and row by row on the other instruction sets; `scratch` holds
-// TetraBandScratch(width, rows) elements.
-void TetraBandVector(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
-                     ptrdiff_t pitch, int width, int rows, uint32_t* scratch);
+// `rows` rows of 4-byte pixels (4-byte aligned, pitches in bytes) through a plan with Slabs() > 1
+// in bands of `bandRows` rows (the last may have fewer), a slab at a time with AVX-512 and row by
+// row on the other instruction sets; `scratch` holds TetraBandScratch(width, bandRows) elements.
+void TetraBandsVector(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
+                      ptrdiff_t pitch, int width, int rows, int bandRows, uint32_t* scratch);
 
 // The name of the instruction set TetraRowVector would run now.
 const char* TetraRowVectorTarget();

@@ -579,34 +579,58 @@ struct Slabs {
   }
 };
 
-// Every row of the band, in whole vectors; a row's last partial vector goes through a
-// zero-padded copy, in both passes alike, so both meet the same pixels in the same order.
-template <class Visit>
-HWY_INLINE void EveryVector(const uint8_t* in, ptrdiff_t inPitch, uint8_t* out, ptrdiff_t pitch,
-                            size_t width, int rows, Visit visit) {
+// Rows of one band of the image.
+struct Band {
+  const uint8_t* in;
+  ptrdiff_t inPitch;
+  uint8_t* out;
+  ptrdiff_t pitch;
+  int rows;
+};
+
+// One walk that sorts the pixels of `sort` into `sorting` and puts those of `put` back from
+// `putting`; either band may be null. Both passes mostly wait on memory, and one beside the
+// other they wait together (a 64-point frame of random pixels took 2-4% less than with a walk
+// each). `put` is the band before `sort`, so neither touches the other's rows. Every row goes in
+// whole vectors, and its last partial vector through a zero-padded copy, in both passes alike,
+// so both meet the same pixels in the same order.
+HWY_INLINE void SortAndPutBack(const Band* sort, Slabs& sorting, const Band* put, Slabs& putting,
+                               size_t width) {
   const DU du;
   const size_t lanes = hn::Lanes(du);
   const size_t whole = width / lanes * lanes;
-  for (int y = 0; y < rows; ++y) {
-    const uint32_t* from = reinterpret_cast<const uint32_t*>(in + y * inPitch);
-    uint32_t* to = out ? reinterpret_cast<uint32_t*>(out + y * pitch) : nullptr;
+  const int sortRows = sort ? sort->rows : 0, putRows = put ? put->rows : 0;
+  for (int y = 0; y < sortRows || y < putRows; ++y) {
+    const uint32_t* from =
+        y < sortRows ? reinterpret_cast<const uint32_t*>(sort->in + y * sort->inPitch) : nullptr;
+    uint32_t* to = y < putRows ? reinterpret_cast<uint32_t*>(put->out + y * put->pitch) : nullptr;
     for (size_t x = 0; x < whole; x += lanes) {
-      PrefetchAhead(to ? to + x : from + x);
-      visit(from + x, to ? to + x : nullptr);
+      if (from) {
+        PrefetchAhead(from + x);
+        sorting.Sort(hn::LoadU(du, from + x));
+      }
+      if (to) {
+        PrefetchAhead(to + x);
+        hn::StoreU(putting.Gather(), du, to + x);
+      }
     }
     if (whole < width) {
       HWY_ALIGN uint32_t tail[HWY_MAX_BYTES / sizeof(uint32_t)] = {};
-      std::memcpy(tail, from + whole, (width - whole) * 4);
-      visit(tail, to ? tail : nullptr);
-      if (to) std::memcpy(to + whole, tail, (width - whole) * 4);
+      if (from) {
+        std::memcpy(tail, from + whole, (width - whole) * 4);
+        sorting.Sort(hn::Load(du, tail));
+      }
+      if (to) {
+        hn::Store(putting.Gather(), du, tail);
+        std::memcpy(to + whole, tail, (width - whole) * 4);
+      }
     }
   }
 }
 
-void TetraBandOfTarget(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
-                       ptrdiff_t pitch, int width, int rows, uint32_t* scratch) {
-  if (width <= 0 || rows <= 0) return;
-  const DU du;
+void TetraBandsOfTarget(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
+                        ptrdiff_t pitch, int width, int rows, int bandRows, uint32_t* scratch) {
+  if (width <= 0 || rows <= 0 || bandRows <= 0) return;
   const Kernel kernel = MakeKernel(plan);
 #if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
   constexpr bool kSort = true;
@@ -623,26 +647,44 @@ void TetraBandOfTarget(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPit
     }
     return;
   }
-  const size_t capacity = TetraBandCapacity(width, rows);
-  Slabs slabs;
-  for (int k = 0; k < kSlabs; ++k) {
-    slabs.start[k] = plan.SlabStart(k);
-    slabs.pixels[k] = scratch + k * capacity;
-    slabs.count[k] = 0;
-  }
-  uint8_t* const bits = reinterpret_cast<uint8_t*>(scratch + kSlabs * capacity);
-  slabs.bits = bits;
   const size_t w = static_cast<size_t>(width);
-  EveryVector(in, inPitch, nullptr, 0, w, rows,
-              [&](const uint32_t* from, uint32_t*) { slabs.Sort(hn::LoadU(du, from)); });
-  for (int k = 0; k < kSlabs; ++k) {
-    uint8_t* const pixels = reinterpret_cast<uint8_t*>(slabs.pixels[k]);
-    Rows4<false, true>(kernel, pixels, pixels, slabs.count[k]);
-    slabs.count[k] = 0;
+  const size_t capacity = TetraBandCapacity(width, bandRows);
+  // Two bands' slabs, each half of the scratch: one band's results are put back while the next
+  // band is sorted.
+  Slabs slabs[2];
+  uint8_t* firstBits[2];
+  for (int b = 0; b < 2; ++b) {
+    uint32_t* const base = scratch + b * (TetraBandScratch(width, bandRows) / 2);
+    for (int k = 0; k < kSlabs; ++k) {
+      slabs[b].start[k] = plan.SlabStart(k);
+      slabs[b].pixels[k] = base + k * capacity;
+      slabs[b].count[k] = 0;
+    }
+    slabs[b].bits = firstBits[b] = reinterpret_cast<uint8_t*>(base + kSlabs * capacity);
   }
-  slabs.bits = bits;
-  EveryVector(in, inPitch, out, pitch, w, rows,
-              [&](const uint32_t*, uint32_t* to) { hn::StoreU(slabs.Gather(), du, to); });
+  const auto band = [&](int y) {
+    return Band{in + y * inPitch, inPitch, out + y * pitch, pitch,
+                rows - y < bandRows ? rows - y : bandRows};
+  };
+  Band now = band(0);
+  SortAndPutBack(&now, slabs[0], nullptr, slabs[1], w);
+  slabs[0].bits = firstBits[0];
+  for (int y = 0, b = 0; y < rows; y += bandRows, b ^= 1) {
+    Slabs& mine = slabs[b];
+    for (int k = 0; k < kSlabs; ++k) {
+      uint8_t* const pixels = reinterpret_cast<uint8_t*>(mine.pixels[k]);
+      Rows4<false, true>(kernel, pixels, pixels, mine.count[k]);
+      mine.count[k] = 0;
+    }
+    const bool more = y + bandRows < rows;
+    const Band next = more ? band(y + bandRows) : Band{};
+    SortAndPutBack(more ? &next : nullptr, slabs[b ^ 1], &now, mine, w);
+    // The sorted band keeps its counts for its interpolation; this one starts afresh.
+    slabs[b ^ 1].bits = firstBits[b ^ 1];
+    mine.bits = firstBits[b];
+    for (int k = 0; k < kSlabs; ++k) mine.count[k] = 0;
+    now = next;
+  }
 }
 
 const char* TargetOfThisTarget() { return hwy::TargetName(HWY_TARGET); }
@@ -655,7 +697,7 @@ HWY_AFTER_NAMESPACE();
 namespace tfx {
 
 HWY_EXPORT(TetraRowOfTarget);
-HWY_EXPORT(TetraBandOfTarget);
+HWY_EXPORT(TetraBandsOfTarget);
 HWY_EXPORT(TargetOfThisTarget);
 
 // Here, after every target, HWY_MAX_BYTES is the last target's (the scalar one's 8 bytes), so
@@ -669,16 +711,19 @@ size_t TetraBandCapacity(int width, int rows) {
 }
 
 size_t TetraBandScratch(int width, int rows) {
-  // The slabs, then every vector's mask of each slab's lanes, in bytes rounded up to elements.
+  // The slabs, then every vector's mask of each slab's lanes, in bytes rounded up to whole lines;
+  // twice over.
   const size_t vectors =
       (static_cast<size_t>(width) + kSortLanes - 1) / kSortLanes * static_cast<size_t>(rows);
   const size_t maskBytes = vectors * TetraPlan::kMaxSlabs * ((kSortLanes + 7) / 8);
-  return TetraPlan::kMaxSlabs * TetraBandCapacity(width, rows) + (maskBytes + 3) / 4;
+  const size_t band = TetraPlan::kMaxSlabs * TetraBandCapacity(width, rows) + (maskBytes + 3) / 4;
+  return 2 * ((band + kSortLanes - 1) / kSortLanes * kSortLanes);
 }
 
-void TetraBandVector(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
-                     ptrdiff_t pitch, int width, int rows, uint32_t* scratch) {
-  HWY_DYNAMIC_DISPATCH(TetraBandOfTarget)(plan, in, inPitch, out, pitch, width, rows, scratch);
+void TetraBandsVector(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
+                      ptrdiff_t pitch, int width, int rows, int bandRows, uint32_t* scratch) {
+  HWY_DYNAMIC_DISPATCH(TetraBandsOfTarget)
+  (plan, in, inPitch, out, pitch, width, rows, bandRows, scratch);
 }
 
 void TetraRowVector(const TetraPlan& plan, const uint8_t* in, uint8_t* out, int width,

@@ -126,15 +126,16 @@ TEST(CubeLutApply, RandomAndHostileLatticesMatchTheReference) {
 }
 
 // A lattice too large for the cache goes through whole images a slab of red cells at a time: two
-// bands (the second partial), rows whose width is no whole number of vectors, a padded pitch, in
-// place and from a separate image, with pixels all over the lattice or all but the first of each
-// row in its first slab (which also takes the zeros that pad each row to whole vectors, so that
-// it fills right up to the next slab's pixels); and a rising index table altered so that its
-// slabs no longer hold whole bytes.
+// bands (the second partial, sorted while the first is put back), rows whose width is no whole
+// number of vectors, a padded pitch, in place and from a separate image, with pixels all over
+// the lattice or all but the first of each row in its first slab (which also takes the zeros
+// that pad each row to whole vectors, so that it fills right up to the next slab's pixels), or a
+// smooth first band that goes row by row before the second goes through the slabs; and a rising
+// index table altered so that its slabs no longer hold whole bytes.
 TEST(CubeLutApply, ImagesThroughSlabsMatchTheReference) {
   constexpr int kWidth = 1001, kHeight = 1100, kPitch = kWidth * 4 + 12;
-  for (const int n : {50, 64}) {
-    const bool firstSlab = n == 50;
+  for (const int n : {50, 64, 63}) {
+    const bool firstSlab = n == 50, smoothFirstBand = n == 63;
     Lattice lattice(n);
     std::mt19937 rng(static_cast<uint32_t>(n));
     std::uniform_real_distribution<float> value(-20.0f, 280.0f);
@@ -142,8 +143,10 @@ TEST(CubeLutApply, ImagesThroughSlabsMatchTheReference) {
     std::vector<uint8_t> source(static_cast<size_t>(kPitch) * kHeight);
     for (size_t i = 0; i < source.size(); ++i) {
       const uint32_t v = rng();
-      const bool red = i % 4 == 2, first = i % kPitch < 4;
+      const size_t x = i % kPitch / 4, y = i / kPitch;
+      const bool red = i % 4 == 2, first = x == 0;
       source[i] = static_cast<uint8_t>(firstSlab && red ? (first ? 70 + v % 60 : v % 60) : v);
+      if (smoothFirstBand && y < 1000) source[i] = static_cast<uint8_t>(i % 4 ? x / 8 : y / 8);
     }
     std::vector<uint8_t> expected = source;
     for (int y = 0; y < kHeight; ++y) {
