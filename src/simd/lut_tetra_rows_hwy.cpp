@@ -22,7 +22,7 @@
 // float) take two multiplies and an addition that the plan has checked against every byte, instead
 // of the per-byte look-ups, which as gathers cost the most; a division gave the same bytes but kept
 // the divider busy for 2-3% of a 64-point frame. Lattices too large for the cache go through
-// whole bands sorted into slabs of red cells (TetraBandVector).
+// whole bands sorted into slabs of red cells (TetraBandsVector).
 #include <cstring>
 
 #include "lut/CubeLutApply.h"
@@ -693,7 +693,6 @@ void Bands(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t*
 void TetraBandsOfTarget(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
                         ptrdiff_t pitch, int width, int rows, int bandRows, uint32_t* scratch) {
   if (width <= 0 || rows <= 0 || bandRows <= 0) return;
-  const Kernel kernel = MakeKernel(plan);
 #if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
   constexpr bool kSort = true;
   static_assert(HWY_MAX_BYTES == kSortBytes, "the band's sizes assume these vectors");
@@ -704,6 +703,7 @@ void TetraBandsOfTarget(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPi
     // Without a compress and an expand instruction, sorting into slabs and back costs more than
     // the cache misses it saves: a 64-point lattice on random pixels took three times as long
     // with AVX2 as the plain rows.
+    const Kernel kernel = MakeKernel(plan);
     for (int y = 0; y < rows; ++y) {
       Rows4<false>(kernel, in + y * inPitch, out + y * pitch, static_cast<size_t>(width));
     }
