@@ -518,7 +518,11 @@ struct Slabs {
   // not kept: the put-back finds them again in the red bytes of the line it is about to write,
   // which it reads from memory anyway (about 2% of a 64-point frame of random pixels).
   uint8_t* bits;
+  uint8_t* firstBits;
   static constexpr size_t kMaskBytes = (HWY_MAX_BYTES / sizeof(uint32_t) + 7) / 8;
+
+  // Back to the first vector's masks, for the pass that reads what the last one wrote.
+  void Rewind() { bits = firstBits; }
 
   // Which lanes of `p` fall in each slab: those whose red byte reaches the slab's start and not
   // the next one's.
@@ -655,7 +659,6 @@ void Bands(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t*
   // Two bands' slabs, each half of the scratch: one band's results are put back while the next
   // band is sorted.
   Slabs slabs[2];
-  uint8_t* firstBits[2];
   for (int b = 0; b < 2; ++b) {
     uint32_t* const base = scratch + b * (TetraBandScratch(width, bandRows) / 2);
     for (int k = 0; k < kSlabs; ++k) {
@@ -663,7 +666,7 @@ void Bands(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t*
       slabs[b].pixels[k] = base + k * capacity;
       slabs[b].count[k] = 0;
     }
-    slabs[b].bits = firstBits[b] = reinterpret_cast<uint8_t*>(base + kSlabs * capacity);
+    slabs[b].bits = slabs[b].firstBits = reinterpret_cast<uint8_t*>(base + kSlabs * capacity);
   }
   const auto band = [&](int y) {
     return Band{in + y * inPitch, inPitch, out + y * pitch, pitch,
@@ -671,7 +674,7 @@ void Bands(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t*
   };
   Band now = band(0);
   SortAndPutBack<kInPlace>(&now, slabs[0], nullptr, slabs[1], w);
-  slabs[0].bits = firstBits[0];
+  slabs[0].Rewind();
   for (int y = 0, b = 0; y < rows; y += bandRows, b ^= 1) {
     Slabs& mine = slabs[b];
     for (int k = 0; k < kSlabs; ++k) {
@@ -683,8 +686,8 @@ void Bands(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t*
     const Band next = more ? band(y + bandRows) : Band{};
     SortAndPutBack<kInPlace>(more ? &next : nullptr, slabs[b ^ 1], &now, mine, w);
     // The sorted band keeps its counts for its interpolation; this one starts afresh.
-    slabs[b ^ 1].bits = firstBits[b ^ 1];
-    mine.bits = firstBits[b];
+    slabs[b ^ 1].Rewind();
+    mine.Rewind();
     for (int k = 0; k < kSlabs; ++k) mine.count[k] = 0;
     now = next;
   }
