@@ -178,6 +178,7 @@ ColorAdjustPlan::ColorAdjustPlan(float e, float b, float c, float v, float s,
   hasTone_ = ComposeTone(e, b, c, tone_);
   if (!Empty() && !Fuse()) {
     ends_.clear();
+    gains_.clear();
   }
 }
 
@@ -185,7 +186,7 @@ ColorAdjustPlan::ColorAdjustPlan(float e, float b, float c, float v, float s,
 // per-pixel forms derive it; false where one pass could not give the operations' bytes.
 bool ColorAdjustPlan::Fuse() {
   if (!hasVibrance_ && !hasSaturation_) {
-    tables_ = {tone_, 0.0f, false, true, nullptr, 1.0f};
+    tables_ = {tone_, 0.0f, false, true, nullptr, nullptr, 1.0f};
     fused_ = true;
     return true;
   }
@@ -200,6 +201,7 @@ bool ColorAdjustPlan::Fuse() {
   }
   const bool increase = sigma_ >= 0.0f;
   ends_.assign(256 * 256, 0);
+  gains_.assign(256 * 256, 0.0f);
   for (int mx = 0; mx < 256; ++mx) {
     for (int mn = 0; mn <= mx; ++mn) {
       tagRGBQUAD ends{static_cast<uint8_t>(mn), static_cast<uint8_t>(mn), static_cast<uint8_t>(mx),
@@ -221,12 +223,18 @@ bool ColorAdjustPlan::Fuse() {
         uint32_t bits;
         std::memcpy(&bits, &a, sizeof(bits));
         entry |= uint64_t{bits} << 32;
+        gains_[static_cast<size_t>(mx) * 256 + mn] = a;
       }
       ends_[static_cast<size_t>(mx) * 256 + mn] = entry;
     }
   }
-  tables_ = {
-      hasTone_ ? tone_ : nullptr, vibrance_, hasSaturation_, increase, ends_.data(), 1.0f + sigma_};
+  tables_ = {hasTone_ ? tone_ : nullptr,
+             vibrance_,
+             hasSaturation_,
+             increase,
+             ends_.data(),
+             gains_.data(),
+             1.0f + sigma_};
   fused_ = true;
   return true;
 }

@@ -45,6 +45,7 @@ class ColorAdjustPlan {
   float vibrance_;  // the kernels' strength
   float sigma_;
   std::vector<uint64_t> ends_;
+  std::vector<float> gains_;
   FusedColourTables tables_ = {};
   bool fused_ = false;
 };

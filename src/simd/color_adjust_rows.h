@@ -21,6 +21,9 @@ struct FusedColourTables {
   // (bits 8..15), the sum of the two after vibrance (bits 16..31), and in bits 32..63 the bits of
   // saturation's a when increasing (0 for a grey, which keeps its channels).
   const uint64_t* ends;
+  // The same a alone, at the same index: a quarter of the cache lines for a target that gathers
+  // only it.
+  const float* gains;
   // Saturation's 1 + sigma when decreasing.
   float fixedGain;
 };

@@ -490,7 +490,9 @@ struct FusedColourVector {
 
 #if HWY_TARGET != HWY_SCALAR
 // FusedColourVector with every channel worked out as it works out the middle one, and only
-// saturation's gain looked up, one gather a pixel instead of two.
+// saturation's gain looked up: one gather a pixel instead of two, from a table of a quarter of
+// the cache lines (a sixth less time for the five operations together than gathering from the
+// ends).
 template <bool kTone, bool kVibrance, bool kSaturate, bool kIncrease, class Tone>
 struct ArithmeticColourVector {
   Tone tone;
@@ -505,9 +507,7 @@ struct ArithmeticColourVector {
     VI mn = hn::Min(c[0], hn::Min(c[1], c[2]));
     VF gain;
     if (kSaturate && kIncrease) {
-      const VI offset = hn::ShiftLeft<3>(hn::Or(hn::ShiftLeft<8>(mx), mn));
-      const auto* halves = reinterpret_cast<const int32_t*>(t->ends);
-      gain = hn::BitCast(df, hn::GatherOffset(di, halves + 1, offset));
+      gain = hn::GatherIndex(df, t->gains, hn::Or(hn::ShiftLeft<8>(mx), mn));
     } else {
       gain = hn::Set(df, t->fixedGain);
     }
