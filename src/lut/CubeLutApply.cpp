@@ -80,7 +80,7 @@ void TetraRowReference(const TetraTable& t, uint8_t* row, int width, int bytesPe
   }
 }
 
-void TetraPlan::Prepare(const TetraTable& table) {
+void TetraPlan::Prepare(const TetraTable& table, int pointFloats) {
   table_ = table;
   const int n = table.size;
   usable_ = n >= 1 && n <= 64;
@@ -136,7 +136,9 @@ void TetraPlan::Prepare(const TetraTable& table) {
   }
   // One more plane along each axis repeats the last: the upper neighbour of the last index is then
   // the point itself, as the cap makes it, and every upper neighbour is one stride on.
-  const int per = grey_ ? 1 : 4;
+  const int per = grey_                                  ? 1
+                  : pointFloats == 3 || pointFloats == 4 ? pointFloats
+                                                         : TetraPointFloats();
   const int m = n + 1;
   stride_[0] = m * m * per;
   stride_[1] = m * per;
@@ -158,7 +160,8 @@ void TetraPlan::Prepare(const TetraTable& table) {
       slabStart_[slab] = v;
     }
   }
-  const size_t floats = static_cast<size_t>(m) * m * m * per;
+  // One float more, which a 16-byte read of the last 12-byte point takes in.
+  const size_t floats = static_cast<size_t>(m) * m * m * per + 1;
   if (floats > capacity_) {
     points_.reset(static_cast<float*>(AllocateBlocks(floats * sizeof(float))));
     capacity_ = points_ ? floats : 0;
@@ -186,14 +189,16 @@ void TetraPlan::Prepare(const TetraTable& table) {
         out[0] = out[-1];
         out += 1;
       } else {
-        for (int k = 0; k < n; ++k, p += 3, out += 4) {
-          note(out[0] = p[0]), note(out[1] = p[1]), note(out[2] = p[2]), out[3] = 0.0f;
+        for (int k = 0; k < n; ++k, p += 3, out += per) {
+          note(out[0] = p[0]), note(out[1] = p[1]), note(out[2] = p[2]);
+          if (per == 4) out[3] = 0.0f;
         }
-        std::memcpy(out, out - 4, 4 * sizeof *out);
-        out += 4;
+        std::memcpy(out, out - per, per * sizeof *out);
+        out += per;
       }
     }
   }
+  *out = 0.0f;
   finite_ = (carried & 0x80000000u) == 0;
 }
 

@@ -67,15 +67,17 @@ struct FreeBlocks {
 };
 
 // A TetraTable laid out for the vector rows. Copying the lattice costs a small part of one 4K frame
-// and is what lets the rows read each corner as one aligned block: the N^3 points, and a last plane
+// and is what lets the rows read each corner as one 16-byte block: the N^3 points, and a last plane
 // repeated along each axis, packed one after another (blue fastest), each as red, green, blue and a
-// 0, or as one float when every point is grey (the three components the same bits, so one blend
-// gives all three bytes, as a key mask does), and per axis the offset in floats of each byte's
-// lower point.
+// 0 or as those three alone (TetraPointFloats), or as one float when every point is grey (the three
+// components the same bits, so one blend gives all three bytes, as a key mask does), and per axis
+// the offset in floats of each byte's lower point.
 class TetraPlan {
  public:
   // Reads the table as it is now; a later change to it is not seen until the next Prepare.
-  void Prepare(const TetraTable& table);
+  // `pointFloats` (3 or 4) lays out colour points as TetraPointFloats describes; any other value
+  // takes what the instruction set Highway picks now prefers. Every instruction set reads both.
+  void Prepare(const TetraTable& table, int pointFloats = 0);
 
   const TetraTable& Table() const { return table_; }
   // False for a size outside 1..64, which doLUT refuses; such a plan leaves pixels alone.

@@ -31,6 +31,12 @@ size_t TetraBandScratch(int width, int rows);
 void TetraBandsVector(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPitch, uint8_t* out,
                       ptrdiff_t pitch, int width, int rows, int bandRows, uint32_t* scratch);
 
+// The floats a colour point takes in a packed lattice on the instruction set Highway's dispatch
+// picks now: 4, aligned blocks of red, green, blue and 0, where the rows sort bands into slabs
+// (AVX-512); 3 elsewhere, a quarter less cache for the same lattice (AMD's Zen 3, whose
+// second-level cache a 33-point lattice outgrows, took a quarter longer with 4).
+int TetraPointFloats();
+
 // The name of the instruction set TetraRowVector would run now.
 const char* TetraRowVectorTarget();
 

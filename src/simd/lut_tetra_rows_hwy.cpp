@@ -273,7 +273,7 @@ HWY_INLINE hn::Vec<D> LoadBlocks(D d, const float* points, const int32_t* offset
     std::memcpy(&pair, offsets, sizeof pair);
     constexpr bool kLittle = __BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__;
     const int shift = (kSecond == 1) == kLittle ? 32 : 0;
-    return hn::Load(d, points + static_cast<uint32_t>(pair >> shift));
+    return hn::LoadU(d, points + static_cast<uint32_t>(pair >> shift));
   } else {
     const hn::Half<D> dh;
     const hn::Vec<decltype(dh)> lower = LoadBlocks<kSecond>(dh, points, offsets);
@@ -289,8 +289,9 @@ HWY_INLINE hn::Vec<D> LoadBlocks(D d, const float* points, const int32_t* offset
   }
 }
 
-// Each point is an aligned block of four floats, red, green, blue and 0; four vectors of them
-// are transposed into red, green and blue vectors.
+// Each point is read as four floats from its red: red, green, blue, and a 0 or the next point's
+// red, which the transposes drop; four vectors of them are transposed into red, green and blue
+// vectors.
 HWY_INLINE Corner LoadCorner(const float* points, const int32_t* offsets) {
   const DF df;
   const hn::Repartition<double, DF> dd;
@@ -719,6 +720,14 @@ void TetraBandsOfTarget(const TetraPlan& plan, const uint8_t* in, ptrdiff_t inPi
   }
 }
 
+int PointFloatsOfThisTarget() {
+#if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
+  return 4;
+#else
+  return 3;
+#endif
+}
+
 const char* TargetOfThisTarget() { return hwy::TargetName(HWY_TARGET); }
 
 }  // namespace HWY_NAMESPACE
@@ -731,6 +740,9 @@ namespace tfx {
 HWY_EXPORT(TetraRowOfTarget);
 HWY_EXPORT(TetraBandsOfTarget);
 HWY_EXPORT(TargetOfThisTarget);
+HWY_EXPORT(PointFloatsOfThisTarget);
+
+int TetraPointFloats() { return HWY_DYNAMIC_DISPATCH(PointFloatsOfThisTarget)(); }
 
 // Here, after every target, HWY_MAX_BYTES is the last target's (the scalar one's 8 bytes), so
 // sizes that must hold any target's vectors take the widest, which only sort into slabs.
