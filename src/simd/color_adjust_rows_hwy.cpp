@@ -211,6 +211,18 @@ HWY_INLINE VI MixChannelSmall(VI c, VI luma, VI k) {
   return hn::Max(hn::Min(mixed, hn::Set(di, 255)), hn::Zero(di));
 }
 
+// Vibrance's luma of a pixel whose largest and smallest channel are mx and mn, and the product
+// of its mask's weight and the strength, still to be truncated.
+HWY_INLINE VF VibranceProduct(VI mx, VI mn, float strength, VI* luma) {
+  const DI di;
+  const DF df;
+  *luma = hn::ShiftRight<1>(hn::Add(mx, mn));
+  // Of the three masks (channel - luma, floored at 0) the smallest is always 0 and the largest
+  // is mx - luma, so the luma of the mask is (mx - luma) >> 1.
+  const VI weight = hn::And(hn::Neg(hn::ShiftRight<1>(hn::Sub(mx, *luma))), hn::Set(di, 255));
+  return hn::Mul(hn::ConvertTo(df, weight), hn::Set(df, strength));
+}
+
 // kSmall: 255 * |strength| rounds below 2^22. Then so does every product of a weight and the
 // strength (rounding is monotonic), and k * 255 stays below 2^30.
 template <bool kSmall>
@@ -219,16 +231,10 @@ struct VibranceVector {
 
   HWY_INLINE VU operator()(VU p) const {
     const DU du;
-    const DI di;
-    const DF df;
     const VI c0 = Channel0(p), c1 = Channel1(p), c2 = Channel2(p);
-    const VI mx = hn::Max(c0, hn::Max(c1, c2));
-    const VI mn = hn::Min(c0, hn::Min(c1, c2));
-    const VI luma = hn::ShiftRight<1>(hn::Add(mx, mn));
-    // Of the three masks (channel - luma, floored at 0) the smallest is always 0 and the largest
-    // is mx - luma, so the luma of the mask is (mx - luma) >> 1.
-    const VI weight = hn::And(hn::Neg(hn::ShiftRight<1>(hn::Sub(mx, luma))), hn::Set(di, 255));
-    const VF product = hn::Mul(hn::ConvertTo(df, weight), hn::Set(df, strength));
+    VI luma;
+    const VF product = VibranceProduct(hn::Max(c0, hn::Max(c1, c2)), hn::Min(c0, hn::Min(c1, c2)),
+                                       strength, &luma);
     if (kSmall) {
       const VI k = SmallToInt(product);
       return Pack(p, MixChannelSmall(c0, luma, k), MixChannelSmall(c1, luma, k),
@@ -456,9 +462,8 @@ struct FusedColourVector {
     LookUpEnds(t->ends, index, &ends, &gain);
     VI mid = r.mid;
     if (kVibrance) {
-      const VI luma = hn::ShiftRight<1>(hn::Add(mx, mn));
-      const VI weight = hn::And(hn::Neg(hn::ShiftRight<1>(hn::Sub(mx, luma))), hn::Set(di, 255));
-      const VI k = SmallToInt(hn::Mul(hn::ConvertTo(df, weight), hn::Set(df, t->strength)));
+      VI luma;
+      const VI k = SmallToInt(VibranceProduct(mx, mn, t->strength, &luma));
 #if HWY_TARGET == HWY_SCALAR
       mid = MixChannelSmall(mid, luma, k);
 #else
@@ -512,9 +517,8 @@ struct ArithmeticColourVector {
       gain = hn::Set(df, t->fixedGain);
     }
     if (kVibrance) {
-      const VI luma = hn::ShiftRight<1>(hn::Add(mx, mn));
-      const VI weight = hn::And(hn::Neg(hn::ShiftRight<1>(hn::Sub(mx, luma))), hn::Set(di, 255));
-      const VI k = SmallToInt(hn::Mul(hn::ConvertTo(df, weight), hn::Set(df, t->strength)));
+      VI luma;
+      const VI k = SmallToInt(VibranceProduct(mx, mn, t->strength, &luma));
       const VI k16 = hn::And(k, hn::Set(di, 0xffff));
       for (VI& x : c) x = MixChannelShort(x, luma, k16);
       mx = MixChannelShort(mx, luma, k16);
