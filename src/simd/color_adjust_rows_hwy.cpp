@@ -671,7 +671,7 @@ struct ToneVector {
 #endif
 
 // With AVX-512 the gathers of both ends cost less than working them out; with AVX2 (measured on
-// AMD's Zen 3, whose second-level cache the ends table fills) vibrance alone took 2.3 times as
+// AMD's Zen 3, whose second-level cache the ends table fills) vibrance alone took 1.8 times as
 // long through them.
 #if HWY_TARGET == HWY_SCALAR || (HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3)
 template <bool kTone, bool kVibrance, bool kSaturate, bool kIncrease>
