@@ -46,12 +46,17 @@ HWY_INLINE hn::Mask<D8> AlphaBytes() {
 // 0..7 thus fire for i <= h, and with A_i = T_i ^ T_(i-1) (T_i the i-th run of 16 table entries,
 // T_(-1) = 0) they XOR to T_h. From 128 on, shuffles 1..8 fire for i >= h - 7, and with
 // B_i = T_(i+7) ^ T_(i+8) (T_16 = 0) they XOR to T_h as well. Both groups share their indices;
-// bit 7 of the byte picks the group whose result counts. The chunks are A_0..A_7, B_1..B_8.
-void MakeChunks(const uint8_t table[256], uint8_t chunks[256]) {
+// bit 7 of the byte picks the group whose result counts. The chunks are A_0..A_7, B_1..B_8, and
+// after them -16 * i (mod 256) for i = 1..8, sixteen times each: read from memory, these stay one
+// addition each, where GCC rebuilt constants in every iteration at three vector operations each.
+constexpr size_t kChunkBytes = 256 + 8 * 16;
+
+void MakeChunks(const uint8_t table[256], uint8_t chunks[kChunkBytes]) {
   for (int j = 0; j < 16; ++j) {
     for (int i = 0; i < 8; ++i) {
       chunks[16 * i + j] = table[16 * i + j] ^ (i > 0 ? table[16 * (i - 1) + j] : 0);
       chunks[128 + 16 * i + j] = table[16 * (i + 8) + j] ^ (i < 7 ? table[16 * (i + 9) + j] : 0);
+      chunks[256 + 16 * i + j] = static_cast<uint8_t>(256 - 16 * (i + 1));
     }
   }
 }
@@ -66,11 +71,6 @@ HWY_INLINE V8 LookUpChunk(const uint8_t* chunk, V8 index) {
   const V8 clean = hn::And(index, hn::Set(d8, uint8_t{0x8f}));
 #endif
   return hn::TableLookupBytesOr0(hn::LoadDup128(d8, chunk), clean);
-}
-
-// The byte minus 16 * i.
-HWY_INLINE V8 ShuffleIndex(V8 x, int i) {
-  return hn::Sub(x, hn::Set(D8(), static_cast<uint8_t>(16 * i)));
 }
 
 #if HWY_TARGET == HWY_AVX3_DL
@@ -94,8 +94,11 @@ struct ByteTable {
 struct TableVector {
   ByteTable table;
 
+  // Every byte from the table, alpha too.
+  HWY_INLINE V8 Lookup(V8 x) const { return V8{table(x.raw)}; }
+
   HWY_INLINE V8 operator()(V8 x) const {
-    return V8{_mm512_mask_blend_epi8(0x8888888888888888ull, table(x.raw), x.raw)};
+    return V8{_mm512_mask_blend_epi8(0x8888888888888888ull, Lookup(x).raw, x.raw)};
   }
 };
 
@@ -109,27 +112,34 @@ struct TableVector {
 
   const uint8_t* A(int i) const { return chunks + 16 * i; }
   const uint8_t* B(int i) const { return chunks + 128 + 16 * (i - 1); }
+  // The byte minus 16 * i, for i = 1..8.
+  HWY_INLINE V8 Index(V8 x, int i) const {
+    return hn::Add(x, hn::LoadDup128(D8(), chunks + 256 + 16 * (i - 1)));
+  }
 
-  HWY_INLINE V8 operator()(V8 x) const {
+  // Every byte from the table, alpha too.
+  HWY_INLINE V8 Lookup(V8 x) const {
     const D8 d8;
     const DI8 di8;
     V8 low = LookUpChunk(A(0), x);
-    V8 high = LookUpChunk(B(8), ShuffleIndex(x, 8));
+    V8 high = LookUpChunk(B(8), Index(x, 8));
     for (int i = 1; i < 7; i += 2) {
-      const V8 index = ShuffleIndex(x, i);
-      const V8 next = ShuffleIndex(x, i + 1);
+      const V8 index = Index(x, i);
+      const V8 next = Index(x, i + 1);
       low = hn::Xor3(low, LookUpChunk(A(i), index), LookUpChunk(A(i + 1), next));
       high = hn::Xor3(high, LookUpChunk(B(i), index), LookUpChunk(B(i + 1), next));
     }
-    const V8 index = ShuffleIndex(x, 7);
+    const V8 index = Index(x, 7);
     low = hn::Xor(low, LookUpChunk(A(7), index));
     high = hn::Xor(high, LookUpChunk(B(7), index));
     const auto upper = hn::RebindMask(d8, hn::Lt(hn::BitCast(di8, x), hn::Zero(di8)));
-    return hn::IfThenElse(AlphaBytes(), x, hn::IfThenElse(upper, high, low));
+    return hn::IfThenElse(upper, high, low);
   }
+
+  HWY_INLINE V8 operator()(V8 x) const { return hn::IfThenElse(AlphaBytes(), x, Lookup(x)); }
 };
 
-// `chunks` holds 256 bytes for MakeChunks.
+// `chunks` holds kChunkBytes for MakeChunks.
 HWY_INLINE TableVector MakeTableVector(const uint8_t table[256], uint8_t* chunks) {
   MakeChunks(table, chunks);
   return {chunks};
@@ -494,6 +504,41 @@ struct FusedColourVector {
 };
 
 #if HWY_TARGET != HWY_SCALAR
+// Bytes 0..2 of each lane the channels limited to 0..255, byte 3 the alpha of `p`. On x86 the
+// channels may lie anywhere in the int32 range: packing with signed saturation to 16 bits and then
+// unsigned to 8 limits them, in five operations where limiting each at both ends, shifting and
+// joining took twelve. Elsewhere they must be 0..255 already, as LimitAbove leaves them there.
+HWY_INLINE VU PackLimited(VU p, VI c0, VI c1, VI c2) {
+#if HWY_ARCH_X86 && HWY_TARGET == HWY_AVX2
+  const __m256i alpha = _mm256_srli_epi32(p.raw, 24);
+  // Per 128-bit block: c0 of its four pixels, then c1, c2 and alpha; the shuffle interleaves them.
+  const __m256i bytes =
+      _mm256_packus_epi16(_mm256_packs_epi32(c0.raw, c1.raw), _mm256_packs_epi32(c2.raw, alpha));
+  const __m256i order = _mm256_setr_epi8(0, 4, 8, 12, 1, 5, 9, 13, 2, 6, 10, 14, 3, 7, 11, 15, 0, 4,
+                                         8, 12, 1, 5, 9, 13, 2, 6, 10, 14, 3, 7, 11, 15);
+  return VU{_mm256_shuffle_epi8(bytes, order)};
+#elif HWY_ARCH_X86 && (HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3)
+  const __m128i alpha = _mm_srli_epi32(p.raw, 24);
+  const __m128i bytes =
+      _mm_packus_epi16(_mm_packs_epi32(c0.raw, c1.raw), _mm_packs_epi32(c2.raw, alpha));
+  const __m128i order = _mm_setr_epi8(0, 4, 8, 12, 1, 5, 9, 13, 2, 6, 10, 14, 3, 7, 11, 15);
+  return VU{_mm_shuffle_epi8(bytes, order)};
+#else
+  return Pack(p, c0, c1, c2);
+#endif
+}
+
+// What PackLimited needs of a float channel before truncation. On x86 truncation takes every
+// value below 0 to at most 0 (out of range to INT_MIN), which PackLimited takes to 0, so only
+// values from 2^31 up, which would not truncate into range, need limiting first.
+HWY_INLINE VF LimitAbove(VF v) {
+#if HWY_ARCH_X86 && (HWY_TARGET == HWY_AVX2 || HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3)
+  return hn::Min(v, hn::Set(DF(), 255.0f));
+#else
+  return ClampToByteRange<false>(v);
+#endif
+}
+
 // FusedColourVector with every channel worked out as it works out the middle one, and only
 // saturation's gain looked up: one gather a pixel instead of two, from a table of a quarter of
 // the cache lines (a sixth less time for the five operations together than gathering from the
@@ -506,7 +551,8 @@ struct ArithmeticColourVector {
   HWY_INLINE VU operator()(VU raw) const {
     const DI di;
     const DF df;
-    const VU p = kTone ? tone(raw) : raw;
+    // The alpha byte goes from `raw` to the result unlooked-up.
+    const VU p = kTone ? tone.Colours(raw) : raw;
     VI c[3] = {Channel0(p), Channel1(p), Channel2(p)};
     VI mx = hn::Max(c[0], hn::Max(c[1], c[2]));
     VI mn = hn::Min(c[0], hn::Min(c[1], c[2]));
@@ -521,8 +567,10 @@ struct ArithmeticColourVector {
       const VI k = SmallToInt(VibranceProduct(mx, mn, t->strength, &luma));
       const VI k16 = hn::And(k, hn::Set(di, 0xffff));
       for (VI& x : c) x = MixChannelShort(x, luma, k16);
-      mx = MixChannelShort(mx, luma, k16);
-      mn = MixChannelShort(mn, luma, k16);
+      // Vibrance keeps the order of the channels (the plan makes sure of it), so the largest and
+      // the smallest after it are those of the mixed channels.
+      mx = hn::Max(c[0], hn::Max(c[1], c[2]));
+      mn = hn::Min(c[0], hn::Min(c[1], c[2]));
     }
     if (kSaturate) {
       const VF lv = hn::Mul(hn::ConvertTo(df, hn::Add(mx, mn)), hn::Set(df, 0.5f));
@@ -530,10 +578,10 @@ struct ArithmeticColourVector {
         const VF f = hn::ConvertTo(df, x);
         const VF o = kIncrease ? hn::Add(f, hn::Mul(hn::Sub(f, lv), gain))
                                : hn::Add(lv, hn::Mul(hn::Sub(f, lv), gain));
-        x = SmallToInt(ClampToByteRange<false>(o));
+        x = SmallToInt(LimitAbove(o));
       }
     }
-    return Pack(p, c[0], c[1], c[2]);
+    return PackLimited(raw, c[0], c[1], c[2]);
   }
 };
 #endif
@@ -599,7 +647,7 @@ void ApplyTableRow(uint8_t* dst, const uint8_t* src, size_t count, const uint8_t
 }
 #else
 void ApplyTableRow(uint8_t* dst, const uint8_t* src, size_t count, const uint8_t table[256]) {
-  HWY_ALIGN uint8_t chunks[256];
+  HWY_ALIGN uint8_t chunks[kChunkBytes];
   ForEachVectorInto(D8(), dst, src, count, MakeTableVector(table, chunks));
 }
 #endif
@@ -667,6 +715,10 @@ struct ToneVector {
 struct ToneVector {
   TableVector bytes;
   HWY_INLINE VU operator()(VU p) const { return hn::BitCast(DU(), bytes(hn::BitCast(D8(), p))); }
+  // Bytes 0..2 as operator() gives them; byte 3 is left to the caller.
+  HWY_INLINE VU Colours(VU p) const {
+    return hn::BitCast(DU(), bytes.Lookup(hn::BitCast(D8(), p)));
+  }
 };
 #endif
 
@@ -686,7 +738,7 @@ void FusedColourRow(uint8_t* dst, const uint8_t* src, size_t count,
 #if HWY_TARGET == HWY_SCALAR
   const ToneVector tone{tables.tone};
 #else
-  HWY_ALIGN uint8_t chunks[256] = {};
+  HWY_ALIGN uint8_t chunks[kChunkBytes] = {};
   const uint8_t identity[256] = {};  // never read: without a tone the kernels skip the lookup
   const ToneVector tone{MakeTableVector(tables.tone ? tables.tone : identity, chunks)};
 #endif

@@ -206,12 +206,14 @@ INSTANTIATE_TEST_SUITE_P(ColorAdjust, AllColours, testing::ValuesIn(kOperations)
 
 TEST(ColorAdjustPlan, OnePassEqualsTheFiveOperationsInTurn) {
   // Every colour, on every kernel set. The settings cover both saturation forms, a vibrance that
-  // lowers, and the clamped contrast ramp. A vibrance whose products wrap and a NaN saturation
-  // must not fuse; they run the kernels tested above one after the other.
+  // lowers, the clamped contrast ramp, and a saturation far past -100 whose results overshoot
+  // both ends beyond the int32 range. A vibrance whose products wrap and a NaN
+  // saturation must not fuse; they run the kernels tested above one after the other.
   const struct {
     float e, b, c, v, s;
   } cases[] = {{20, 15, 30, 40, 25}, {0, 0, 0, -100, -60}, {-40, -3, 184, 100, 100},
-               {0, 0, 0, 0, -100},   {0, 0, 0, 40, 0},     {20, 15, 30, 0, 0}};
+               {0, 0, 0, 0, -100},   {0, 0, 0, 40, 0},     {20, 15, 30, 0, 0},
+               {0, 0, 0, 40, -1e10f}};
   for (const auto& c : cases) {
     const Image expected = Clone(EveryColour());
     ReferenceExposure(expected.get(), c.e);
