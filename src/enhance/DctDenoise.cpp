@@ -94,18 +94,26 @@ bool DenoiseInterleaved(CxImage* image, float sigma, bool hsl) {
            tfx::DctDenoisePlane(bits, bits, width, height, stride, threshold, bytesPerPixel, 3);
   }
   const bool redFirst = image->getFormat() == IPF_RGBA || image->getFormat() == IPF_RGB;
-  const size_t row = 3 * static_cast<size_t>(width);
-  const std::unique_ptr<uint8_t[]> triples(new (std::nothrow) uint8_t[row * height]);
-  if (!triples) return false;
+  // Three planes of their own, one byte a sample: each row converts with whole-vector loads and
+  // stores, and the denoiser reads and writes them as bytes in a row.
+  const size_t planeBytes = static_cast<size_t>(width) * height;
+  const std::unique_ptr<uint8_t[]> samples(new (std::nothrow) uint8_t[3 * planeBytes]);
+  if (!samples) return false;
+  uint8_t* const planes[3] = {samples.get(), samples.get() + planeBytes,
+                              samples.get() + 2 * planeBytes};
+  const auto at = [&](int plane, int y) { return planes[plane] + static_cast<size_t>(y) * width; };
   for (int y = 0; y < height; ++y) {
-    tfx::RgbToHslRow(bits + y * stride, bytesPerPixel, redFirst, &triples[y * row], width);
+    tfx::RgbToHslRow(bits + y * stride, bytesPerPixel, redFirst, at(0, y), at(1, y), at(2, y),
+                     width);
   }
-  if (blocks && !tfx::DctDenoisePlane(triples.get(), triples.get(), width, height,
-                                      static_cast<ptrdiff_t>(row), threshold, 3, 3)) {
-    return false;
+  for (uint8_t* plane : planes) {
+    if (blocks && !tfx::DctDenoisePlane(plane, plane, width, height, width, threshold)) {
+      return false;
+    }
   }
   for (int y = 0; y < height; ++y) {
-    tfx::HslToRgbRow(&triples[y * row], bits + y * stride, bytesPerPixel, redFirst, width);
+    tfx::HslToRgbRow(at(0, y), at(1, y), at(2, y), bits + y * stride, bytesPerPixel, redFirst,
+                     width);
   }
   return true;
 }

@@ -351,21 +351,22 @@ TEST(HslRows, GiveTheBytesOfCxImageConversionsForEveryColourOnEveryTarget) {
   std::vector<uint8_t> triples(3 * count), hsl(3 * count), rgb(4 * count);
   for (size_t i = 0; i < count; ++i) {
     const uint8_t* p = pixels + 4 * i;
-    std::copy(p, p + 3, &triples[3 * i]);
+    for (size_t k = 0; k < 3; ++k) triples[k * count + i] = p[k];
     const tagRGBQUAD t = CxImage::RGBtoHSL(tagRGBQUAD{p[0], p[1], p[2], p[3]});
-    hsl[3 * i] = t.rgbRed;
-    hsl[3 * i + 1] = t.rgbGreen;
-    hsl[3 * i + 2] = t.rgbBlue;
+    hsl[i] = t.rgbRed;
+    hsl[count + i] = t.rgbGreen;
+    hsl[2 * count + i] = t.rgbBlue;
     const tagRGBQUAD c = CxImage::HSLtoRGB(tagRGBQUAD{p[2], p[1], p[0], 0});
     const uint8_t back[4] = {c.rgbBlue, c.rgbGreen, c.rgbRed, p[3]};
     std::copy(back, back + 4, &rgb[4 * i]);
   }
   ForEveryTarget([&] {
     std::vector<uint8_t> out(3 * count);
-    tfx::RgbToHslRow(pixels, 4, false, out.data(), count);
+    tfx::RgbToHslRow(pixels, 4, false, &out[0], &out[count], &out[2 * count], count);
     EXPECT_TRUE(out == hsl);
     std::vector<uint8_t> back(pixels, pixels + 4 * count);
-    tfx::HslToRgbRow(triples.data(), back.data(), 4, false, count);
+    tfx::HslToRgbRow(&triples[0], &triples[count], &triples[2 * count], back.data(), 4, false,
+                     count);
     EXPECT_TRUE(back == rgb);
   });
 }
