@@ -22,10 +22,9 @@ namespace HWY_NAMESPACE {
 
 namespace hn = hwy::HWY_NAMESPACE;
 
-namespace {
+#include "simd/pixel_lanes-inl.h"
 
-using DF = hn::ScalableTag<float>;
-using VF = hn::Vec<DF>;
+namespace {
 
 // The most lanes of any target, for the byte staging arrays.
 constexpr size_t kMaxLanes = 64;
@@ -33,10 +32,7 @@ constexpr size_t kMaxLanes = 64;
 // floor(n / d) for the non-negative integers of RGBtoHSL.
 VF Quotient(VF n, VF d) { return hn::Floor(hn::Div(n, d)); }
 
-using DI = hn::RebindToSigned<DF>;
-using DU = hn::RebindToUnsigned<DF>;
 using D8 = hn::Rebind<uint8_t, DF>;  // one byte a lane
-using VU = hn::Vec<DU>;
 
 // Bytes of `count` (at most one vector) pixels into float lanes: the colour at offset `at`.
 VF Channel(const uint8_t* pixels, size_t step, size_t at, size_t count) {
@@ -66,14 +62,11 @@ void StorePixels(VU v, uint8_t* p) {
 #endif
 }
 
-// Byte `at` of each 32-bit lane as a float.
-VF ByteOf(VU pixels, int at) {
-  const VU byte = hn::And(hn::ShiftRightSame(pixels, 8 * at), hn::Set(DU(), 0xFFu));
-  return hn::ConvertTo(DF(), hn::BitCast(DI(), byte));
-}
+// Byte `at` (0..2) of each 32-bit lane as a float.
+VF ByteOf(VU pixels, int at) { return hn::ConvertTo(DF(), ChannelAt(pixels, 8 * at)); }
 
 // The low byte of each lane of `v`.
-hn::Vec<D8> LowBytes(hn::Vec<DI> v) { return hn::DemoteTo(D8(), hn::And(v, hn::Set(DI(), 255))); }
+hn::Vec<D8> LowBytes(VI v) { return hn::DemoteTo(D8(), hn::And(v, hn::Set(DI(), 255))); }
 
 // A whole vector of `count` bytes from each plane, or the bytes of a shorter tail.
 VF PlaneBytes(const uint8_t* plane, size_t count) {
@@ -99,17 +92,17 @@ VF HueToChannel(VF p, VF q, VF hue) {
 }
 
 // (int)(v * 255), of which the caller keeps the low byte.
-hn::Vec<DI> TruncatedByte(VF v) { return hn::ConvertTo(DI(), hn::Mul(v, hn::Set(DF(), 255.0f))); }
+VI TruncatedByte(VF v) { return hn::ConvertTo(DI(), hn::Mul(v, hn::Set(DF(), 255.0f))); }
 
 // The low byte of each lane of `v` to `out`, `step` bytes apart.
-void StoreByte(hn::Vec<DI> v, uint8_t* out, size_t step, size_t count) {
+void StoreByte(VI v, uint8_t* out, size_t step, size_t count) {
   HWY_ALIGN int32_t lanes[kMaxLanes];
   hn::Store(v, DI(), lanes);
   for (size_t i = 0; i < count; ++i) out[i * step] = static_cast<uint8_t>(lanes[i]);
 }
 
 // The low bytes of `v` into a plane.
-void StorePlane(hn::Vec<DI> v, uint8_t* plane, size_t count) {
+void StorePlane(VI v, uint8_t* plane, size_t count) {
   if (count == hn::Lanes(DF())) {
     hn::StoreU(LowBytes(v), D8(), plane);
   } else {
@@ -186,7 +179,7 @@ void HslToRgbRowOfTarget(const uint8_t* hue, const uint8_t* saturation, const ui
     if (bytesPerPixel == 4 && lanes == n) {
       const DU du;
       const VU byte = hn::Set(du, 0xFFu);
-      const auto low = [&](hn::Vec<DI> v) { return hn::And(hn::BitCast(du, v), byte); };
+      const auto low = [&](VI v) { return hn::And(hn::BitCast(du, v), byte); };
       const VU first = low(redFirst ? red : blue), last = low(redFirst ? blue : red);
       const VU kept = hn::And(LoadPixels(out), hn::Set(du, 0xFF000000u));
       const VU colour = hn::Or3(first, hn::ShiftLeft<8>(low(green)), hn::ShiftLeft<16>(last));
