@@ -1,7 +1,7 @@
 // The 8-point DCT kernels behind the DCT denoiser, compiled once per instruction set and picked at
 // run time (hwy::SetSupportedTargetsForTest included).
 //
-// One butterfly serves every transform here, on every instruction set: each output element is
+// Each transform here is one fixed butterfly on every instruction set: each output element is
 // the same sequence of single-precision adds and multiplies whatever the vector width, so every
 // target, the one-lane fallback included, gives the same bits.
 #pragma once
@@ -19,6 +19,16 @@ void Dct8x8(const float* in, float* out, bool inverse);
 
 // The forward transform down each column of a row-major 8 x 8 block; `out` may be `rows`.
 void Dct8x8Columns(const float* rows, float* out);
+
+// The scaled 8-point transforms the denoiser runs, with 5 multiplies instead of 22. Forward gives
+// DctForwardGain(k) times the DCT-II's output k; inverse gives the DCT-III of its input k times
+// 8 / DctForwardGain(k). Every target gives the same bits; `out` may be `in`.
+void Dct8Scaled(const float* in, float* out, bool inverse);
+double DctForwardGain(int k);
+
+// The denoiser's thresholds for the scaled coefficient of column frequency j and row frequency
+// k, at 8 k + j: `threshold` times both gains.
+void DctScaledThresholds(float threshold, float out[64]);
 
 // The sliding 8 x 8 hard-threshold denoiser of one plane: every block position is transformed,
 // coefficients below `threshold` in magnitude are zeroed, and the inverse transforms covering a

@@ -5,6 +5,7 @@
 // build passes -ffp-contract=off although the AVX2 and AVX-512 targets enable FMA). A lane's
 // result therefore never depends on how many lanes a vector has.
 #include <algorithm>
+#include <cmath>
 #include <cstring>
 #include <new>
 
@@ -88,6 +89,65 @@ HWY_INLINE void Inverse(D d, const V* X, V* x) {
   x[5] = hn::Sub(e2, o2);
   x[3] = hn::Add(e3, o3);
   x[4] = hn::Sub(e3, o3);
+}
+
+// Arai, Agui and Nakajima's factorisation, which the denoiser runs: 5 multiplies where the
+// butterfly above takes 22 (on Zen 3 the denoiser took 1.17 times as long with that one). Output
+// k of the forward form is DctForwardGain(k) times the orthonormal one, and the inverse form
+// takes input k at 8 / DctForwardGain(k) times. The gains are left in: those of a block's
+// coefficients go into its thresholds, and a block comes back 64 times its size (8 per
+// dimension), a power of 2 that the final division takes out exactly.
+template <class D, class V = hn::Vec<D>>
+HWY_INLINE void ForwardScaled(D d, const V* x, V* X) {
+  const V t0 = hn::Add(x[0], x[7]), t7 = hn::Sub(x[0], x[7]);
+  const V t1 = hn::Add(x[1], x[6]), t6 = hn::Sub(x[1], x[6]);
+  const V t2 = hn::Add(x[2], x[5]), t5 = hn::Sub(x[2], x[5]);
+  const V t3 = hn::Add(x[3], x[4]), t4 = hn::Sub(x[3], x[4]);
+  const V e0 = hn::Add(t0, t3), e3 = hn::Sub(t0, t3);
+  const V e1 = hn::Add(t1, t2), e2 = hn::Sub(t1, t2);
+  X[0] = hn::Add(e0, e1);
+  X[4] = hn::Sub(e0, e1);
+  const V z1 = hn::Mul(hn::Add(e2, e3), hn::Set(d, 0.707106781f));
+  X[2] = hn::Add(e3, z1);
+  X[6] = hn::Sub(e3, z1);
+  const V o0 = hn::Add(t4, t5), o1 = hn::Add(t5, t6), o2 = hn::Add(t6, t7);
+  const V z5 = hn::Mul(hn::Sub(o0, o2), hn::Set(d, 0.382683433f));
+  const V z2 = hn::Add(hn::Mul(hn::Set(d, 0.541196100f), o0), z5);
+  const V z4 = hn::Add(hn::Mul(hn::Set(d, 1.306562965f), o2), z5);
+  const V z3 = hn::Mul(o1, hn::Set(d, 0.707106781f));
+  const V z11 = hn::Add(t7, z3), z13 = hn::Sub(t7, z3);
+  X[5] = hn::Add(z13, z2);
+  X[3] = hn::Sub(z13, z2);
+  X[1] = hn::Add(z11, z4);
+  X[7] = hn::Sub(z11, z4);
+}
+
+template <class D, class V = hn::Vec<D>>
+HWY_INLINE void InverseScaled(D d, const V* X, V* x) {
+  const V sqrt2 = hn::Set(d, 1.414213562f);
+  const V p0 = hn::Add(X[0], X[4]), p1 = hn::Sub(X[0], X[4]);
+  const V q0 = hn::Add(X[2], X[6]);
+  const V q1 = hn::Sub(hn::Mul(hn::Sub(X[2], X[6]), sqrt2), q0);
+  const V e0 = hn::Add(p0, q0), e3 = hn::Sub(p0, q0);
+  const V e1 = hn::Add(p1, q1), e2 = hn::Sub(p1, q1);
+  const V z13 = hn::Add(X[5], X[3]), z10 = hn::Sub(X[5], X[3]);
+  const V z11 = hn::Add(X[1], X[7]), z12 = hn::Sub(X[1], X[7]);
+  const V o0 = hn::Add(z11, z13);
+  const V o11 = hn::Mul(hn::Sub(z11, z13), sqrt2);
+  const V z5 = hn::Mul(hn::Add(z10, z12), hn::Set(d, 1.847759065f));
+  const V o10 = hn::Sub(hn::Mul(z12, hn::Set(d, 1.082392200f)), z5);
+  const V o12 = hn::Sub(z5, hn::Mul(z10, hn::Set(d, 2.613125930f)));
+  const V o1 = hn::Sub(o12, o0);
+  const V o2 = hn::Sub(o11, o1);
+  const V o3 = hn::Add(o10, o2);
+  x[0] = hn::Add(e0, o0);
+  x[7] = hn::Sub(e0, o0);
+  x[1] = hn::Add(e1, o1);
+  x[6] = hn::Sub(e1, o1);
+  x[2] = hn::Add(e2, o2);
+  x[5] = hn::Sub(e2, o2);
+  x[3] = hn::Sub(e3, o3);
+  x[4] = hn::Add(e3, o3);
 }
 
 template <class D, class V = hn::Vec<D>>
@@ -242,31 +302,34 @@ void RowTransforms(const Scratch& s, const float* samples, size_t slot, size_t t
   for (size_t x = 0; x < tile; x += hn::Lanes(d)) {
     VF in[8], X[8];
     for (size_t n = 0; n < 8; ++n) in[n] = hn::LoadU(d, samples + x + n);
-    Forward(d, in, X);
+    ForwardScaled(d, in, X);
     for (size_t k = 0; k < 8; ++k) hn::Store(X[k], d, out + k * kTileBlocks + x);
   }
 }
 
 // Block row y: column transform, threshold, inverse column transform; row i of each block
-// starts the sums of row y + 7 and is added to those of rows y..y+6.
-void Blocks(const Scratch& s, size_t y, size_t tile, float threshold) {
+// starts the sums of row y + 7 and is added to those of rows y..y+6. `thresholds` holds the
+// threshold of column frequency j and row frequency k at 8 k + j.
+void Blocks(const Scratch& s, size_t y, size_t tile, const float* thresholds) {
   const DF d;
-  const VF t = hn::Set(d, threshold);
   const float* rows[8];
   float* sums[8];
   for (size_t i = 0; i < 8; ++i) {
     rows[i] = s.transforms + (y + i) % 8 * 8 * kTileBlocks;
     sums[i] = s.sums + (y + i) % 8 * 8 * kTileBlocks;
   }
-  for (size_t x = 0; x < tile; x += hn::Lanes(d)) {
-    for (size_t k = 0; k < 8 * kTileBlocks; k += kTileBlocks) {
+  for (size_t k = 0; k < 8 * kTileBlocks; k += kTileBlocks) {
+    VF t[8];
+    for (size_t j = 0; j < 8; ++j) t[j] = hn::Set(d, thresholds[k / kTileBlocks * 8 + j]);
+    for (size_t x = 0; x < tile; x += hn::Lanes(d)) {
       VF in[8], coefficients[8], out[8];
       for (size_t i = 0; i < 8; ++i) in[i] = hn::Load(d, rows[i] + k + x);
-      Forward(d, in, coefficients);
+      ForwardScaled(d, in, coefficients);
       for (size_t j = 0; j < 8; ++j) {
-        coefficients[j] = hn::IfThenZeroElse(hn::Lt(hn::Abs(coefficients[j]), t), coefficients[j]);
+        coefficients[j] =
+            hn::IfThenZeroElse(hn::Lt(hn::Abs(coefficients[j]), t[j]), coefficients[j]);
       }
-      Inverse(d, coefficients, out);
+      InverseScaled(d, coefficients, out);
       hn::Store(out[7], d, sums[7] + k + x);
       for (size_t i = 0; i < 7; ++i) {
         hn::Store(hn::Add(hn::Load(d, sums[i] + k + x), out[i]), d, sums[i] + k + x);
@@ -283,7 +346,7 @@ void InverseRows(const Scratch& s, size_t y, size_t tile) {
   for (size_t x = 0; x < tile; x += hn::Lanes(d)) {
     VF in[8], out[8];
     for (size_t k = 0; k < 8; ++k) in[k] = hn::Load(d, sums + k * kTileBlocks + x);
-    Inverse(d, in, out);
+    InverseScaled(d, in, out);
     for (size_t j = 0; j < 8; ++j) hn::Store(out[j], d, terms + j * kRowFloats + kLead + x);
   }
   // Lanes past the tile's blocks: no block there.
@@ -349,7 +412,8 @@ void StartTile(const Scratch& s, const Plane& plane, size_t first, size_t tile, 
   std::fill(s.terms[0], s.terms[0] + 16 * kRowFloats, 0.0f);
   std::fill(s.sums, s.sums + 64 * kTileBlocks, 0.0f);
   for (size_t u = 0; u < kRowFloats; ++u) {
-    s.columnWeight[u] = static_cast<float>(std::min<size_t>(first + u, 7) + 1);
+    // 64 times the blocks over the column: the scaled transforms' gain.
+    s.columnWeight[u] = static_cast<float>(64 * (std::min<size_t>(first + u, 7) + 1));
   }
   LoadSamples(plane, 0, rows, first, tile + 7, s.samples[0]);
   for (size_t row = 0; row < 7; ++row) {
@@ -362,11 +426,11 @@ void StartTile(const Scratch& s, const Plane& plane, size_t first, size_t tile, 
 // before anything reads a row below y + 7, and it lets the stores of each step settle before
 // the next step reads them. The last row is left to the caller.
 void StepTile(const Scratch& s, const Plane& plane, size_t first, size_t tile, size_t y,
-              size_t blockRows, float threshold) {
+              size_t blockRows, const float* thresholds) {
   RowTransforms(s, s.samples[(y + 7) % 2], (y + 7) % 8, tile);
   if (y + 1 < blockRows)
     LoadSamples(plane, y + 8, blockRows + 8, first, tile + 7, s.samples[y % 2]);
-  Blocks(s, y, tile, threshold);
+  Blocks(s, y, tile, thresholds);
   if (y > 0) WriteRow(s, plane, first, y - 1, tile);
   InverseRows(s, y, tile);
 }
@@ -393,6 +457,19 @@ void Dct8x8OfTarget(const float* in, float* out, bool inverse) {
 
 void Dct8x8ColumnsOfTarget(const float* rows, float* out) { Columns(rows, out, false); }
 
+void Dct8ScaledOfTarget(const float* in, float* out, bool inverse) {
+  const hn::CappedTag<float, 1> d1;
+  using V1 = hn::Vec<decltype(d1)>;
+  V1 x[8], X[8];
+  for (int n = 0; n < 8; ++n) x[n] = hn::LoadU(d1, in + n);
+  if (inverse) {
+    InverseScaled(d1, x, X);
+  } else {
+    ForwardScaled(d1, x, X);
+  }
+  for (int k = 0; k < 8; ++k) hn::StoreU(X[k], d1, out + k);
+}
+
 bool DctDenoisePlaneOfTarget(const uint8_t* src, uint8_t* dst, int width, int height,
                              ptrdiff_t stride, float threshold, size_t step, size_t channels) {
   const size_t blockColumns = static_cast<size_t>(width) - 8;
@@ -404,6 +481,8 @@ bool DctDenoisePlaneOfTarget(const uint8_t* src, uint8_t* dst, int width, int he
   const size_t floats = group * kTileFloats + carried;
   float* scratch = new (std::align_val_t(kAlignment), std::nothrow) float[floats]();  // zero-filled
   if (!scratch) return false;
+  float thresholds[64];
+  DctScaledThresholds(threshold, thresholds);
   const auto state = [&](size_t t) {
     float* tile = scratch + (t % group) * kTileFloats;
     float* rows = tile + 128 * kTileBlocks;
@@ -433,7 +512,7 @@ bool DctDenoisePlaneOfTarget(const uint8_t* src, uint8_t* dst, int width, int he
         for (size_t t = g0; t < g1; ++t) {
           const Scratch s = state(t);
           for (size_t y = y0; y < y1; ++y) {
-            StepTile(s, plane, t * kTileBlocks, tileWidth(t), y, blockRows, threshold);
+            StepTile(s, plane, t * kTileBlocks, tileWidth(t), y, blockRows, thresholds);
           }
         }
       }
@@ -458,6 +537,7 @@ namespace tfx {
 HWY_EXPORT(Dct8OfTarget);
 HWY_EXPORT(Dct8x8OfTarget);
 HWY_EXPORT(Dct8x8ColumnsOfTarget);
+HWY_EXPORT(Dct8ScaledOfTarget);
 HWY_EXPORT(DctDenoisePlaneOfTarget);
 HWY_EXPORT(Dct8TargetOfThisTarget);
 
@@ -471,6 +551,25 @@ void Dct8x8(const float* in, float* out, bool inverse) {
 
 void Dct8x8Columns(const float* rows, float* out) {
   HWY_DYNAMIC_DISPATCH(Dct8x8ColumnsOfTarget)(rows, out);
+}
+
+void Dct8Scaled(const float* in, float* out, bool inverse) {
+  HWY_DYNAMIC_DISPATCH(Dct8ScaledOfTarget)(in, out, inverse);
+}
+
+double DctForwardGain(int k) {
+  // sqrt(8) times 1 for k = 0, else sqrt(2) cos(k pi / 16).
+  const double pi = 3.14159265358979323846;
+  return std::sqrt(8.0) * (k == 0 ? 1.0 : std::sqrt(2.0) * std::cos(k * pi / 16));
+}
+
+void DctScaledThresholds(float threshold, float out[64]) {
+  // Worked out in double and rounded once; the coefficients they meet carry the same gains.
+  for (int k = 0; k < 8; ++k) {
+    for (int j = 0; j < 8; ++j) {
+      out[8 * k + j] = static_cast<float>(DctForwardGain(j) * DctForwardGain(k) * threshold);
+    }
+  }
 }
 
 bool DctDenoisePlane(const uint8_t* src, uint8_t* dst, int width, int height, ptrdiff_t stride,

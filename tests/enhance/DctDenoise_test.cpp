@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "simd/dct8.h"
 #include "simd/hsl_rows.h"
 #include "support/EveryTarget.h"
 #include "support/ImageBuilders.h"
@@ -62,11 +63,12 @@ TEST(DctTransform, MatchesTheTextbookTransformInPlaceAndOnEveryTarget) {
     std::vector<float> all;
     for (size_t b = 0; b < input.size(); b += 64) {
       const float* in = &input[b];
-      // 1-D forward and inverse, 2-D forward and inverse, columns of row transforms.
-      for (int kind = 0; kind < 5; ++kind) {
+      // 1-D forward and inverse, 2-D forward and inverse, columns of row transforms, the
+      // denoiser's scaled 1-D forward and inverse.
+      for (int kind = 0; kind < 7; ++kind) {
         SCOPED_TRACE(kind);
         const bool inverse = kind % 2 == 1;
-        const int n = kind < 2 ? 8 : 64;
+        const int n = kind < 2 || kind > 4 ? 8 : 64;
         double l1 = 0;
         for (int i = 0; i < n; ++i) l1 += std::abs(in[i]);
         std::vector<double> expected(in, in + 64);
@@ -80,14 +82,22 @@ TEST(DctTransform, MatchesTheTextbookTransformInPlaceAndOnEveryTarget) {
           Textbook2D(expected.data(), inverse);
           DCT8X82D(in, out, inverse);
           DCT8X82D(inPlace, inPlace, inverse);
-        } else {
+        } else if (kind == 4) {
           Textbook2D(expected.data(), false, false);
           DCT8X82DR(in, out);
           DCT8X82DR(inPlace, inPlace);
+        } else {
+          for (int k = 0; inverse && k < 8; ++k) expected[k] *= 8 / tfx::DctForwardGain(k);
+          Textbook(expected.data(), inverse);
+          for (int k = 0; !inverse && k < 8; ++k) expected[k] *= tfx::DctForwardGain(k);
+          tfx::Dct8Scaled(in, out, inverse);
+          tfx::Dct8Scaled(inPlace, inPlace, inverse);
         }
         // The float constants are off by up to 4e-7 relative and each output sums at most 64
-        // products: 2e-6 of the L1 norm bounds the error, and any wrong term is off by more.
-        for (int i = 0; i < n; ++i) ASSERT_NEAR(expected[i], out[i], 2e-6 * l1) << i;
+        // products: 2e-6 of the L1 norm bounds the error (times the scaled forms' largest gain,
+        // 10.3), and any wrong term is off by more.
+        const double bound = (kind > 4 ? 10.3 : 1.0) * 2e-6 * l1;
+        for (int i = 0; i < n; ++i) ASSERT_NEAR(expected[i], out[i], bound) << i;
         EXPECT_EQ(std::memcmp(out, inPlace, n * sizeof(float)), 0);
         all.insert(all.end(), out, out + n);
       }
@@ -124,41 +134,44 @@ std::vector<uint8_t> Denoised(const Plane& p, float sigma) {
   return out;
 }
 
-// The denoiser's defined arithmetic, one 8-point transform at a time: each block's rows, then its
-// columns, thresholded and inverted; block rows summed into pixel rows in increasing block row
-// order; the inverse row transform of those sums added into the pixels in increasing block
-// column order; each sum divided by the number of blocks over the pixel.
+// The denoiser's defined arithmetic, one scaled 8-point transform at a time: each block's rows,
+// then its columns, thresholded at the scaled thresholds and inverted; block rows summed into
+// pixel rows in increasing block row order; the inverse row transform of those sums added into
+// the pixels in increasing block column order; each sum divided by 64 (the scaled transforms'
+// gain) times the number of blocks over the pixel.
 std::vector<uint8_t> Defined(const Plane& p, float sigma) {
   const int w = p.width, h = p.height, blockColumns = w - 8, blockRows = h - 8;
-  const float threshold = 3.0f * sigma;
+  float thresholds[64];
+  tfx::DctScaledThresholds(3.0f * sigma, thresholds);
   std::vector<float> sum(size_t(w) * h, 0.0f), rows(size_t(h) * 8), strip(size_t(h) * 8);
   for (int x = 0; x < blockColumns; ++x) {
     for (int y = 0; y < h; ++y) {
       float in[8];
       for (int n = 0; n < 8; ++n) in[n] = p.bytes[size_t(y) * p.stride + x + n];
-      DCT8X81D(in, &rows[size_t(y) * 8], false);
+      tfx::Dct8Scaled(in, &rows[size_t(y) * 8], false);
     }
     std::fill(strip.begin(), strip.end(), 0.0f);
     for (int y = 0; y < blockRows; ++y) {
       for (int k = 0; k < 8; ++k) {
         float column[8];
         for (int i = 0; i < 8; ++i) column[i] = rows[size_t(y + i) * 8 + k];
-        DCT8X81D(column, column, false);
-        for (float& c : column) c = std::abs(c) < threshold ? 0.0f : c;
-        DCT8X81D(column, column, true);
+        tfx::Dct8Scaled(column, column, false);
+        for (int j = 0; j < 8; ++j)
+          column[j] = std::abs(column[j]) < thresholds[8 * k + j] ? 0.0f : column[j];
+        tfx::Dct8Scaled(column, column, true);
         for (int i = 0; i < 8; ++i) strip[size_t(y + i) * 8 + k] += column[i];
       }
     }
     for (int y = 0; y < blockRows; ++y) {
       float out[8];
-      DCT8X81D(&strip[size_t(y) * 8], out, true);
+      tfx::Dct8Scaled(&strip[size_t(y) * 8], out, true);
       for (int j = 0; j < 8; ++j) sum[size_t(y) * w + x + j] += out[j];
     }
   }
   std::vector<uint8_t> bytes = p.bytes;
   for (int y = 0; y < blockRows; ++y) {
     for (int x = 0; x < blockColumns; ++x) {
-      const float weight = float(std::min(y, 7) + 1) * float(std::min(x, 7) + 1);
+      const float weight = float(std::min(y, 7) + 1) * float(64 * (std::min(x, 7) + 1));
       const float mean = std::clamp(sum[size_t(y) * w + x] / weight, 0.0f, 255.0f);
       bytes[size_t(y) * p.stride + x] = static_cast<uint8_t>(mean);
     }
@@ -199,31 +212,22 @@ TEST(DctDenoise, FollowsTheDefinedArithmeticToTheBitOnEveryTarget) {
 }
 
 TEST(DctDenoise, KeepsAFlatPlaneUnlessTheThresholdPassesItsDcTerm) {
-  // A flat plane of v has one coefficient, the DC term 8 v. 3 sigma = 8 v exactly when v is a
-  // multiple of 3 (sigma = 8 v / 3 is then an integer); it is kept, being not below. In float the
-  // term is 8 v (1 + 1.3e-7): the rounded constant sqrt(1/8) is a little large.
+  // A flat plane of v has one coefficient, the DC term 8 v, which the scaled transforms carry
+  // exactly. It is kept up to the largest sigma with 3 sigma <= 8 v in float, and the next sigma
+  // up zeroes the blocks.
   const int w = 20, h = 18;
-  int atDc = 0;
-  for (int v = 0; v < 256; ++v) {
+  for (int v = 1; v < 256; ++v) {
     SCOPED_TRACE(v);
     const Plane p{w, h, w, std::vector<uint8_t>(size_t(w) * h, uint8_t(v))};
-    EXPECT_EQ(Denoised(p, v % 3 == 0 ? 8.0f * v / 3 : 0.5f * v), p.bytes);
-    // A threshold of exactly the float DC term keeps it too: only what is below goes.
-    float block[64];
-    std::fill(block, block + 64, float(v));
-    DCT8X82D(block, block, false);
-    float sigma = block[0] / 3;
-    while (3.0f * sigma < block[0]) sigma = std::nextafter(sigma, 1e9f);
-    if (3.0f * sigma == block[0]) {
-      EXPECT_EQ(Denoised(p, sigma), p.bytes);
-      ++atDc;
-    }
-    const std::vector<uint8_t> out = Denoised(p, 8.0f * v / 3 * 1.000001f);
+    float sigma = 8.0f * v / 3;
+    while (3.0f * sigma > 8.0f * v) sigma = std::nextafter(sigma, 0.0f);
+    while (3.0f * std::nextafter(sigma, 1e9f) <= 8.0f * v) sigma = std::nextafter(sigma, 1e9f);
+    EXPECT_EQ(Denoised(p, sigma), p.bytes);
+    const std::vector<uint8_t> out = Denoised(p, std::nextafter(sigma, 1e9f));
     for (size_t i = 0; i < out.size(); ++i) {
       ASSERT_EQ(out[i], int(i / w) < h - 8 && int(i % w) < w - 8 ? 0 : v) << i;
     }
   }
-  EXPECT_GT(atDc, 100);
 }
 
 TEST(DctDenoise, LeavesBadInputAlone) {
