@@ -200,8 +200,12 @@ bool ColorAdjustPlan::Fuse() {
     if (TruncToInt(static_cast<float>(weight) * vibrance_) < -256) return false;
   }
   const bool increase = sigma_ >= 0.0f;
-  ends_.assign(256 * 256, 0);
-  gains_.assign(256 * 256, 0.0f);
+  // Only the table the kernels read is filled: when settings change from frame to frame, the
+  // plan is built for every frame.
+  const bool readsEnds = rows_->readsEnds;
+  const bool readsGains = !readsEnds && hasSaturation_ && increase;
+  if (readsEnds) ends_.assign(256 * 256, 0);
+  if (readsGains) gains_.assign(256 * 256, 0.0f);
   for (int mx = 0; mx < 256; ++mx) {
     for (int mn = 0; mn <= mx; ++mn) {
       tagRGBQUAD ends{static_cast<uint8_t>(mn), static_cast<uint8_t>(mn), static_cast<uint8_t>(mx),
@@ -209,7 +213,7 @@ bool ColorAdjustPlan::Fuse() {
       if (hasVibrance_) ends = VibrancePixel(ends, vibrance_);
       // The pair after vibrance, which keeps the two channels largest and smallest.
       const int top = ends.rgbRed, bottom = ends.rgbBlue;
-      if (hasSaturation_) ends = calNewColor(ends, sigma_);
+      if (hasSaturation_ && readsEnds) ends = calNewColor(ends, sigma_);
       uint64_t entry = ends.rgbRed | uint32_t{ends.rgbBlue} << 8 | uint32_t(top + bottom) << 16;
       // A grey stays as it is, whatever the gain.
       const SaturationSpread spread = SpreadOf(static_cast<float>(top), static_cast<float>(bottom));
@@ -223,17 +227,17 @@ bool ColorAdjustPlan::Fuse() {
         uint32_t bits;
         std::memcpy(&bits, &a, sizeof(bits));
         entry |= uint64_t{bits} << 32;
-        gains_[static_cast<size_t>(mx) * 256 + mn] = a;
+        if (readsGains) gains_[static_cast<size_t>(mx) * 256 + mn] = a;
       }
-      ends_[static_cast<size_t>(mx) * 256 + mn] = entry;
+      if (readsEnds) ends_[static_cast<size_t>(mx) * 256 + mn] = entry;
     }
   }
   tables_ = {hasTone_ ? tone_ : nullptr,
              vibrance_,
              hasSaturation_,
              increase,
-             ends_.data(),
-             gains_.data(),
+             readsEnds ? ends_.data() : nullptr,
+             readsGains ? gains_.data() : nullptr,
              1.0f + sigma_};
   fused_ = true;
   return true;

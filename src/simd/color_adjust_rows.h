@@ -22,7 +22,7 @@ struct FusedColourTables {
   // saturation's a when increasing (0 for a grey, which keeps its channels).
   const uint64_t* ends;
   // The same a alone, at the same index: a quarter of the cache lines for a target that gathers
-  // only it.
+  // only it. Each of the two may be null where ColorAdjustRows::readsEnds says it is not read.
   const float* gains;
   // Saturation's 1 + sigma when decreasing.
   float fixedGain;
@@ -48,6 +48,9 @@ struct ColorAdjustRows {
   // `dst` may be `src`.
   void (*fusedColour)(uint8_t* dst, const uint8_t* src, size_t count,
                       const FusedColourTables& tables);
+  // Whether fusedColour reads FusedColourTables::ends; if not, it reads gains alone, and only
+  // when saturation increases.
+  bool readsEnds;
 };
 
 inline constexpr size_t kBrightestTableBytes = 256 * 256 + 3;

@@ -728,9 +728,11 @@ struct ToneVector {
 #if HWY_TARGET == HWY_SCALAR || (HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3)
 template <bool kTone, bool kVibrance, bool kSaturate, bool kIncrease>
 using Fused = FusedColourVector<kTone, kVibrance, kSaturate, kIncrease, ToneVector>;
+constexpr bool kReadsEnds = true;
 #else
 template <bool kTone, bool kVibrance, bool kSaturate, bool kIncrease>
 using Fused = ArithmeticColourVector<kTone, kVibrance, kSaturate, kIncrease, ToneVector>;
+constexpr bool kReadsEnds = false;
 #endif
 
 void FusedColourRow(uint8_t* dst, const uint8_t* src, size_t count,
@@ -778,8 +780,8 @@ void FusedColourRow(uint8_t* dst, const uint8_t* src, size_t count,
 
 const ColorAdjustRows* RowsOfThisTarget() {
   static const ColorAdjustRows rows = {
-      hwy::TargetName(HWY_TARGET), &ApplyTableRow,     &VibranceRow,   &SaturationRow,
-      &ScaleChannelsRow,           &BrightestTableRow, &FusedColourRow};
+      hwy::TargetName(HWY_TARGET), &ApplyTableRow,     &VibranceRow,    &SaturationRow,
+      &ScaleChannelsRow,           &BrightestTableRow, &FusedColourRow, kReadsEnds};
   return &rows;
 }
 
