@@ -61,6 +61,19 @@ HWY_INLINE void Forward(D d, const V* x, V* X) {
                  hn::Mul(c1, d34));
 }
 
+// The last stage of both inverses: x[i] = e_i + o_i and x[7 - i] = e_i - o_i.
+template <class V>
+HWY_INLINE void Recombine(V e0, V e1, V e2, V e3, V o0, V o1, V o2, V o3, V* x) {
+  x[0] = hn::Add(e0, o0);
+  x[7] = hn::Sub(e0, o0);
+  x[1] = hn::Add(e1, o1);
+  x[6] = hn::Sub(e1, o1);
+  x[2] = hn::Add(e2, o2);
+  x[5] = hn::Sub(e2, o2);
+  x[3] = hn::Add(e3, o3);
+  x[4] = hn::Sub(e3, o3);
+}
+
 // The DCT-III (the transpose) of X[0..7] into x[0..7]. The odd 4 x 4 block of the matrix is
 // symmetric, so the odd half uses the same products as Forward.
 template <class D, class V = hn::Vec<D>>
@@ -81,14 +94,7 @@ HWY_INLINE void Inverse(D d, const V* X, V* x) {
                        hn::Mul(c3, X[7]));
   const V o3 = hn::Sub(hn::Add(hn::Sub(hn::Mul(c7, X[1]), hn::Mul(c5, X[3])), hn::Mul(c3, X[5])),
                        hn::Mul(c1, X[7]));
-  x[0] = hn::Add(e0, o0);
-  x[7] = hn::Sub(e0, o0);
-  x[1] = hn::Add(e1, o1);
-  x[6] = hn::Sub(e1, o1);
-  x[2] = hn::Add(e2, o2);
-  x[5] = hn::Sub(e2, o2);
-  x[3] = hn::Add(e3, o3);
-  x[4] = hn::Sub(e3, o3);
+  Recombine(e0, e1, e2, e3, o0, o1, o2, o3, x);
 }
 
 // Arai, Agui and Nakajima's factorisation, which the denoiser runs: 5 multiplies where the
@@ -135,19 +141,13 @@ HWY_INLINE void InverseScaled(D d, const V* X, V* x) {
   const V o0 = hn::Add(z11, z13);
   const V o11 = hn::Mul(hn::Sub(z11, z13), sqrt2);
   const V z5 = hn::Mul(hn::Add(z10, z12), hn::Set(d, 1.847759065f));
-  const V o10 = hn::Sub(hn::Mul(z12, hn::Set(d, 1.082392200f)), z5);
+  // The negated odd terms of the published form, which negation leaves exact.
+  const V o10 = hn::Sub(z5, hn::Mul(z12, hn::Set(d, 1.082392200f)));
   const V o12 = hn::Sub(z5, hn::Mul(z10, hn::Set(d, 2.613125930f)));
   const V o1 = hn::Sub(o12, o0);
   const V o2 = hn::Sub(o11, o1);
-  const V o3 = hn::Add(o10, o2);
-  x[0] = hn::Add(e0, o0);
-  x[7] = hn::Sub(e0, o0);
-  x[1] = hn::Add(e1, o1);
-  x[6] = hn::Sub(e1, o1);
-  x[2] = hn::Add(e2, o2);
-  x[5] = hn::Sub(e2, o2);
-  x[3] = hn::Sub(e3, o3);
-  x[4] = hn::Add(e3, o3);
+  const V o3 = hn::Sub(o10, o2);
+  Recombine(e0, e1, e2, e3, o0, o1, o2, o3, x);
 }
 
 template <class D, class V = hn::Vec<D>>
