@@ -10,6 +10,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+#include <vector>
 
 #include "adjust/ColorAdjustFormulas.h"
 #include "adjust/ColorAdjustRows.h"
@@ -182,6 +183,40 @@ ColorAdjustPlan::ColorAdjustPlan(float e, float b, float c, float v, float s,
   }
 }
 
+namespace {
+
+// Saturation's sat of a pair of largest and smallest channel (top > bottom), and 1 / sat - 1,
+// its gain where sat + sigma >= 1. Neither depends on the settings, and their divisions took most
+// of a plan's build, which settings that change every frame pay on every frame; so they are worked
+// out once, for every pair.
+struct PairSaturation {
+  float sat, inverse;
+};
+
+struct PairSaturations {
+  std::vector<PairSaturation> pairs;  // at top * (top - 1) / 2 + bottom
+  bool halfSums;                      // l * 255 is half of top + bottom for every pair
+};
+
+const PairSaturations& SaturationOfPairs() {
+  static const PairSaturations table = [] {
+    PairSaturations t{std::vector<PairSaturation>(256 * 255 / 2), true};
+    for (int top = 0; top < 256; ++top) {
+      for (int bottom = 0; bottom <= top; ++bottom) {
+        const SaturationSpread p = SpreadOf(static_cast<float>(top), static_cast<float>(bottom));
+        if (p.lv != static_cast<float>(top + bottom) * 0.5f) t.halfSums = false;
+        if (bottom == top) continue;
+        const float sat = p.l < 0.5f ? p.delta / p.sum : p.delta / (2.0f - p.sum);
+        t.pairs[static_cast<size_t>(top * (top - 1) / 2 + bottom)] = {sat, 1.0f / sat - 1.0f};
+      }
+    }
+    return t;
+  }();
+  return table;
+}
+
+}  // namespace
+
 // What vibrance and saturation derive from each pair of largest and smallest channel, as the
 // per-pixel forms derive it; false where one pass could not give the operations' bytes.
 bool ColorAdjustPlan::Fuse() {
@@ -200,6 +235,15 @@ bool ColorAdjustPlan::Fuse() {
     if (TruncToInt(static_cast<float>(weight) * vibrance_) < -256) return false;
   }
   const bool increase = sigma_ >= 0.0f;
+  const PairSaturations* saturations = hasSaturation_ ? &SaturationOfPairs() : nullptr;
+  // The kernels take l * 255 as half the sum.
+  if (saturations && !saturations->halfSums) return false;
+  const float fixedGain = 1.0f / (1.0f - sigma_) - 1.0f;
+  // Vibrance's k of each weight of a pixel's mask, as mixLumaAndColor works it out.
+  int vibranceK[256];
+  for (int weight = 0; weight < 256; ++weight) {
+    vibranceK[weight] = TruncToInt(static_cast<float>(weight) * vibrance_);
+  }
   // Only the table the kernels read is filled: when settings change from frame to frame, the
   // plan is built for every frame.
   const bool readsEnds = rows_->readsEnds;
@@ -208,28 +252,43 @@ bool ColorAdjustPlan::Fuse() {
   if (readsGains) gains_.assign(256 * 256, 0.0f);
   for (int mx = 0; mx < 256; ++mx) {
     for (int mn = 0; mn <= mx; ++mn) {
-      tagRGBQUAD ends{static_cast<uint8_t>(mn), static_cast<uint8_t>(mn), static_cast<uint8_t>(mx),
-                      0};
-      if (hasVibrance_) ends = VibrancePixel(ends, vibrance_);
+      // VibrancePixel of (mn, mn, mx): the mask of the largest channel is mx - luma, of the
+      // others 0.
+      int top = mx, bottom = mn;
+      if (hasVibrance_) {
+        const int luma = (mn + mx) >> 1;
+        const int k = vibranceK[static_cast<uint8_t>(-((mx - luma) >> 1))];
+        top = MixChannel(mx, luma, k);
+        bottom = MixChannel(mn, luma, k);
+      }
       // The pair after vibrance, which keeps the two channels largest and smallest.
-      const int top = ends.rgbRed, bottom = ends.rgbBlue;
-      if (hasSaturation_ && readsEnds) ends = calNewColor(ends, sigma_);
-      uint64_t entry = ends.rgbRed | uint32_t{ends.rgbBlue} << 8 | uint32_t(top + bottom) << 16;
-      // A grey stays as it is, whatever the gain.
-      const SaturationSpread spread = SpreadOf(static_cast<float>(top), static_cast<float>(bottom));
-      // The kernels take l * 255 as half the sum, which it is for every pair.
-      if (hasSaturation_ && spread.lv != static_cast<float>(top + bottom) * 0.5f) return false;
-      if (hasSaturation_ && increase && top != bottom) {
-        const float sat =
-            spread.l < 0.5f ? spread.delta / spread.sum : spread.delta / (2.0f - spread.sum);
-        const float a = sat + sigma_ >= 1.0f ? 1.0f / sat - 1.0f : 1.0f / (1.0f - sigma_) - 1.0f;
-        if (!std::isfinite(a)) return false;
+      if (top < bottom) return false;
+      int topOut = top, bottomOut = bottom;
+      float a = 0.0f;  // a grey stays as it is, whatever the gain
+      if (hasSaturation_ && top != bottom) {
+        // calNewColor's arithmetic on the pair.
+        const PairSaturation& pair = saturations->pairs[top * (top - 1) / 2 + bottom];
+        const float lv = static_cast<float>(top + bottom) * 0.5f;
+        const auto saturated = [&](float f) {
+          return FloatToByte(increase ? f + (f - lv) * a : lv + (f - lv) * (1.0f + sigma_));
+        };
+        if (increase) {
+          a = pair.sat + sigma_ >= 1.0f ? pair.inverse : fixedGain;
+          if (!std::isfinite(a)) return false;
+        }
+        if (readsEnds) {
+          topOut = saturated(static_cast<float>(top));
+          bottomOut = saturated(static_cast<float>(bottom));
+        }
+      }
+      const size_t index = static_cast<size_t>(mx) * 256 + mn;
+      if (readsGains) gains_[index] = a;
+      if (readsEnds) {
         uint32_t bits;
         std::memcpy(&bits, &a, sizeof(bits));
-        entry |= uint64_t{bits} << 32;
-        if (readsGains) gains_[static_cast<size_t>(mx) * 256 + mn] = a;
+        ends_[index] = static_cast<uint32_t>(topOut) | static_cast<uint32_t>(bottomOut) << 8 |
+                       static_cast<uint32_t>(top + bottom) << 16 | uint64_t{bits} << 32;
       }
-      if (readsEnds) ends_[static_cast<size_t>(mx) * 256 + mn] = entry;
     }
   }
   tables_ = {hasTone_ ? tone_ : nullptr,
