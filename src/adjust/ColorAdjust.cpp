@@ -206,7 +206,7 @@ const PairSaturations& SaturationOfPairs() {
         const SaturationSpread p = SpreadOf(static_cast<float>(top), static_cast<float>(bottom));
         if (p.lv != static_cast<float>(top + bottom) * 0.5f) t.halfSums = false;
         if (bottom == top) continue;
-        const float sat = p.l < 0.5f ? p.delta / p.sum : p.delta / (2.0f - p.sum);
+        const float sat = SaturationOf(p);
         t.pairs[static_cast<size_t>(top * (top - 1) / 2 + bottom)] = {sat, 1.0f / sat - 1.0f};
       }
     }
@@ -268,17 +268,14 @@ bool ColorAdjustPlan::Fuse() {
       if (hasSaturation_ && top != bottom) {
         // calNewColor's arithmetic on the pair.
         const PairSaturation& pair = saturations->pairs[top * (top - 1) / 2 + bottom];
-        const float lv = static_cast<float>(top + bottom) * 0.5f;
-        const auto saturated = [&](float f) {
-          return FloatToByte(increase ? f + (f - lv) * a : lv + (f - lv) * (1.0f + sigma_));
-        };
         if (increase) {
           a = pair.sat + sigma_ >= 1.0f ? pair.inverse : fixedGain;
           if (!std::isfinite(a)) return false;
         }
         if (readsEnds) {
-          topOut = saturated(static_cast<float>(top));
-          bottomOut = saturated(static_cast<float>(bottom));
+          const float lv = static_cast<float>(top + bottom) * 0.5f;
+          topOut = FloatToByte(SaturatedBy(static_cast<float>(top), lv, sigma_, a));
+          bottomOut = FloatToByte(SaturatedBy(static_cast<float>(bottom), lv, sigma_, a));
         }
       }
       const size_t index = static_cast<size_t>(mx) * 256 + mn;

@@ -81,15 +81,24 @@ inline SaturationSpread SpreadOf(float mx, float mn) {
   return p;
 }
 
+// The saturation of a colour that is not a grey (max > min).
+inline float SaturationOf(const SaturationSpread& p) {
+  return p.l < 0.5f ? p.delta / p.sum : p.delta / (2.0f - p.sum);
+}
+
+// One channel f under saturation s, given its colour's lv and, when s >= 0, the gain a.
+inline float SaturatedBy(float f, float lv, float s, float a) {
+  return s >= 0.0f ? f + (f - lv) * a : lv + (f - lv) * (1.0f + s);
+}
+
 // One channel f under saturation s = strength / 100, before any limiting. The colour must not be
 // a grey (max > min).
 inline float SaturatedChannel(float f, const SaturationSpread& p, float s) {
   if (s >= 0.0f) {
-    const float sat = p.l < 0.5f ? p.delta / p.sum : p.delta / (2.0f - p.sum);
-    const float a = sat + s >= 1.0f ? 1.0f / sat - 1.0f : 1.0f / (1.0f - s) - 1.0f;
-    return f + (f - p.lv) * a;
+    const float sat = SaturationOf(p);
+    return SaturatedBy(f, p.lv, s, sat + s >= 1.0f ? 1.0f / sat - 1.0f : 1.0f / (1.0f - s) - 1.0f);
   }
-  return p.lv + (f - p.lv) * (1.0f + s);
+  return SaturatedBy(f, p.lv, s, 0.0f);
 }
 
 }  // namespace tfx

@@ -1,6 +1,7 @@
 // The 8-point DCT kernels, compiled once per instruction set by foreach_target.h.
 //
-// Every transform is the even/odd butterfly below, evaluated lane by lane in the order written,
+// Every transform is one of the two butterflies below (the textbook even/odd one for the exported
+// transforms, a scaled one for the denoiser), evaluated lane by lane in the order written,
 // in single precision, with nothing fused into a multiply-add (there is no MulAdd here, and the
 // build passes -ffp-contract=off although the AVX2 and AVX-512 targets enable FMA). A lane's
 // result therefore never depends on how many lanes a vector has.
