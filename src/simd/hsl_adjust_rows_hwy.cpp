@@ -111,19 +111,11 @@ HWY_INLINE void LookUpEntries(const float* table, VI index, VF& shift, VF& k, VF
   HWY_ALIGN int32_t at[8];
   hn::Store(index, DI(), at);
   const hn::Half<DF> dh;
-  const hn::Repartition<double, DF> dd;
   const auto pair = [&](int q) {
     return hn::Combine(df, hn::LoadU(dh, table + at[4 + q]), hn::LoadU(dh, table + at[q]));
   };
   // Block m of a_q is the entry of lane 4m + q.
-  const VF a0 = pair(0), a1 = pair(1), a2 = pair(2), a3 = pair(3);
-  const auto t0 = hn::BitCast(dd, hn::InterleaveLower(df, a0, a1));
-  const auto t1 = hn::BitCast(dd, hn::InterleaveUpper(df, a0, a1));
-  const auto t2 = hn::BitCast(dd, hn::InterleaveLower(df, a2, a3));
-  const auto t3 = hn::BitCast(dd, hn::InterleaveUpper(df, a2, a3));
-  shift = hn::BitCast(df, hn::InterleaveLower(dd, t0, t2));
-  k = hn::BitCast(df, hn::InterleaveUpper(dd, t0, t2));
-  light = hn::BitCast(df, hn::InterleaveLower(dd, t1, t3));
+  TransposeBlocks(pair(0), pair(1), pair(2), pair(3), shift, k, light);
 #else
   shift = hn::GatherIndex(df, table, index);
   k = hn::GatherIndex(df, table + 1, index);

@@ -294,18 +294,13 @@ HWY_INLINE hn::Vec<D> LoadBlocks(D d, const float* points, const int32_t* offset
 // vectors.
 HWY_INLINE Corner LoadCorner(const float* points, const int32_t* offsets) {
   const DF df;
-  const hn::Repartition<double, DF> dd;
   // Block m of a_q is the point of pixel 4m + q, so the transpose inside each 128-bit block puts
   // every pixel's values in its own lane.
-  const VF a0 = LoadBlocks<0>(df, points, offsets), a1 = LoadBlocks<1>(df, points, offsets);
-  const VF a2 = LoadBlocks<0>(df, points, offsets + 2), a3 = LoadBlocks<1>(df, points, offsets + 2);
-  const auto t0 = hn::BitCast(dd, hn::InterleaveLower(df, a0, a1));  // r0 r1 g0 g1
-  const auto t1 = hn::BitCast(dd, hn::InterleaveUpper(df, a0, a1));  // b0 b1 00 00
-  const auto t2 = hn::BitCast(dd, hn::InterleaveLower(df, a2, a3));  // r2 r3 g2 g3
-  const auto t3 = hn::BitCast(dd, hn::InterleaveUpper(df, a2, a3));  // b2 b3 00 00
-  return {hn::BitCast(df, hn::InterleaveLower(dd, t0, t2)),
-          hn::BitCast(df, hn::InterleaveUpper(dd, t0, t2)),
-          hn::BitCast(df, hn::InterleaveLower(dd, t1, t3))};
+  Corner c;
+  TransposeBlocks(LoadBlocks<0>(df, points, offsets), LoadBlocks<1>(df, points, offsets),
+                  LoadBlocks<0>(df, points, offsets + 2), LoadBlocks<1>(df, points, offsets + 2),
+                  c.red, c.green, c.blue);
+  return c;
 }
 
 #endif  // HWY_TARGET == HWY_SCALAR

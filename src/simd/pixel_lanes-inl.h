@@ -30,3 +30,20 @@ HWY_INLINE VI SmallToInt(VF v) {
   return hn::Sub(hn::BitCast(DI(), shifted), hn::Set(DI(), 0x4b400000));
 #endif
 }
+
+#if HWY_TARGET != HWY_SCALAR
+// Four vectors whose 128-bit block m holds, in a_q, the four floats of the item of lane 4m + q
+// (as separate loads of 16 bytes fill them); the items' first, second and third floats come out
+// one vector each, in lane order. A transpose inside each block; the fourth floats are dropped.
+HWY_INLINE void TransposeBlocks(VF a0, VF a1, VF a2, VF a3, VF& first, VF& second, VF& third) {
+  const DF df;
+  const hn::Repartition<double, DF> dd;
+  const auto t0 = hn::BitCast(dd, hn::InterleaveLower(df, a0, a1));  // x0 x1 y0 y1
+  const auto t1 = hn::BitCast(dd, hn::InterleaveUpper(df, a0, a1));  // z0 z1 w0 w1
+  const auto t2 = hn::BitCast(dd, hn::InterleaveLower(df, a2, a3));  // x2 x3 y2 y3
+  const auto t3 = hn::BitCast(dd, hn::InterleaveUpper(df, a2, a3));  // z2 z3 w2 w3
+  first = hn::BitCast(df, hn::InterleaveLower(dd, t0, t2));
+  second = hn::BitCast(df, hn::InterleaveUpper(dd, t0, t2));
+  third = hn::BitCast(df, hn::InterleaveLower(dd, t1, t3));
+}
+#endif
