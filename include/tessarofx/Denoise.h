@@ -21,10 +21,10 @@ TFX_API void DCT8X82DR(const float* rows, float* out);
 // Denoises one plane: every 8 x 8 block position is transformed, coefficients below 3 sigma in
 // magnitude (the DC term included) are zeroed, and the inverse transforms are averaged. The
 // transforms are factored for speed: the result agrees with the orthonormal transforms above to
-// float rounding, and is the same on every CPU. `dst` may be `src`. The last 8 rows and the last 8 columns are copied from the source unfiltered,
-// so planes narrower or shorter than 9 pixels come back unchanged. Rows are `stride` bytes
-// apart; a null plane, a size below 1, a stride below the width, or a plane above INT_MAX bytes
-// (stride * height) does nothing.
+// float rounding, and is the same on every CPU. `dst` may be `src`. The last 8 rows and the last 8
+// columns are copied from the source unfiltered, so planes narrower or shorter than 9 pixels come
+// back unchanged. Rows are `stride` bytes apart; a null plane, a size below 1, a stride below the
+// width, or a plane above INT_MAX bytes (stride * height) does nothing.
 TFX_API void dct_Denosing(const unsigned char* src, unsigned char* dst, int width, int height,
                           int stride, float sigma);
 
