@@ -115,7 +115,8 @@ HWY_INLINE void LookUpEntries(const float* table, VI index, VF& shift, VF& k, VF
     return hn::Combine(df, hn::LoadU(dh, table + at[4 + q]), hn::LoadU(dh, table + at[q]));
   };
   // Block m of a_q is the entry of lane 4m + q.
-  TransposeBlocks(pair(0), pair(1), pair(2), pair(3), shift, k, light);
+  const VF a0 = pair(0), a1 = pair(1), a2 = pair(2), a3 = pair(3);
+  TransposeBlocks(a0, a1, a2, a3, shift, k, light);
 #else
   shift = hn::GatherIndex(df, table, index);
   k = hn::GatherIndex(df, table + 1, index);

@@ -296,10 +296,10 @@ HWY_INLINE Corner LoadCorner(const float* points, const int32_t* offsets) {
   const DF df;
   // Block m of a_q is the point of pixel 4m + q, so the transpose inside each 128-bit block puts
   // every pixel's values in its own lane.
+  const VF a0 = LoadBlocks<0>(df, points, offsets), a1 = LoadBlocks<1>(df, points, offsets);
+  const VF a2 = LoadBlocks<0>(df, points, offsets + 2), a3 = LoadBlocks<1>(df, points, offsets + 2);
   Corner c;
-  TransposeBlocks(LoadBlocks<0>(df, points, offsets), LoadBlocks<1>(df, points, offsets),
-                  LoadBlocks<0>(df, points, offsets + 2), LoadBlocks<1>(df, points, offsets + 2),
-                  c.red, c.green, c.blue);
+  TransposeBlocks(a0, a1, a2, a3, c.red, c.green, c.blue);
   return c;
 }
 
