@@ -151,9 +151,13 @@ HWY_INLINE void InverseScaled(D d, const V* X, V* x) {
   Recombine(e0, e1, e2, e3, o0, o1, o2, o3, x);
 }
 
-template <class D, class V = hn::Vec<D>>
+template <bool kScaled = false, class D, class V = hn::Vec<D>>
 HWY_INLINE void Transform(D d, const V* in, V* out, bool inverse) {
-  if (inverse) {
+  if (kScaled && inverse) {
+    InverseScaled(d, in, out);
+  } else if (kScaled) {
+    ForwardScaled(d, in, out);
+  } else if (inverse) {
     Inverse(d, in, out);
   } else {
     Forward(d, in, out);
@@ -438,13 +442,19 @@ void StepTile(const Scratch& s, const Plane& plane, size_t first, size_t tile, s
 
 }  // namespace
 
-void Dct8OfTarget(const float* in, float* out, bool inverse) {
+// One 8-point transform, a lane at a time.
+template <bool kScaled>
+void OneTransform(const float* in, float* out, bool inverse) {
   const hn::CappedTag<float, 1> d1;
   using V1 = hn::Vec<decltype(d1)>;
   V1 x[8], X[8];
   for (int n = 0; n < 8; ++n) x[n] = hn::LoadU(d1, in + n);
-  Transform(d1, x, X, inverse);
+  Transform<kScaled>(d1, x, X, inverse);
   for (int k = 0; k < 8; ++k) hn::StoreU(X[k], d1, out + k);
+}
+
+void Dct8OfTarget(const float* in, float* out, bool inverse) {
+  OneTransform<false>(in, out, inverse);
 }
 
 void Dct8x8OfTarget(const float* in, float* out, bool inverse) {
@@ -459,16 +469,7 @@ void Dct8x8OfTarget(const float* in, float* out, bool inverse) {
 void Dct8x8ColumnsOfTarget(const float* rows, float* out) { Columns(rows, out, false); }
 
 void Dct8ScaledOfTarget(const float* in, float* out, bool inverse) {
-  const hn::CappedTag<float, 1> d1;
-  using V1 = hn::Vec<decltype(d1)>;
-  V1 x[8], X[8];
-  for (int n = 0; n < 8; ++n) x[n] = hn::LoadU(d1, in + n);
-  if (inverse) {
-    InverseScaled(d1, x, X);
-  } else {
-    ForwardScaled(d1, x, X);
-  }
-  for (int k = 0; k < 8; ++k) hn::StoreU(X[k], d1, out + k);
+  OneTransform<true>(in, out, inverse);
 }
 
 bool DctDenoisePlaneOfTarget(const uint8_t* src, uint8_t* dst, int width, int height,
