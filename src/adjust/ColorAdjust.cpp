@@ -230,20 +230,18 @@ bool ColorAdjustPlan::Fuse() {
   }
   // Beyond this vibrance's k no longer fits the kernels' 16-bit products.
   if (!(std::fabs(255.0f * vibrance_) < 32768.0f) || !std::isfinite(sigma_)) return false;
-  // Below -256 vibrance would turn a channel's order round.
+  // Vibrance's k of each weight of a pixel's mask, as mixLumaAndColor works it out. Below -256
+  // it would turn a channel's order round.
+  int vibranceK[256];
   for (int weight = 0; weight < 256; ++weight) {
-    if (TruncToInt(static_cast<float>(weight) * vibrance_) < -256) return false;
+    vibranceK[weight] = TruncToInt(static_cast<float>(weight) * vibrance_);
+    if (vibranceK[weight] < -256) return false;
   }
   const bool increase = sigma_ >= 0.0f;
   const PairSaturations* saturations = hasSaturation_ ? &SaturationOfPairs() : nullptr;
   // The kernels take l * 255 as half the sum.
   if (saturations && !saturations->halfSums) return false;
   const float fixedGain = 1.0f / (1.0f - sigma_) - 1.0f;
-  // Vibrance's k of each weight of a pixel's mask, as mixLumaAndColor works it out.
-  int vibranceK[256];
-  for (int weight = 0; weight < 256; ++weight) {
-    vibranceK[weight] = TruncToInt(static_cast<float>(weight) * vibrance_);
-  }
   // Only the table the kernels read is filled: when settings change from frame to frame, the
   // plan is built for every frame.
   const bool readsEnds = rows_->readsEnds;
