@@ -7,6 +7,10 @@
 #   BENCH_CORE=1 FFMPEG_FRAMES=8 MIN_TIME=0.3 scripts/bench-peers.sh
 #   BEFORE_REV=<commit> scripts/bench-peers.sh
 #   BEFORE_BIN=<dir of bench binaries> scripts/bench-peers.sh
+#   NO_BUILD=1 BEFORE_BIN=<dir> scripts/bench-peers.sh   (build/release/bin as it is, no cmake)
+#
+# Where FFmpeg is not installed, its rows are left out and the rest runs: a machine that has
+# only the built binaries (and python3) still gives OpenColorIO's, OpenCV's and our own cases.
 #
 # With BEFORE_REV, the library at that commit is built with today's benchmarks (in a temporary
 # worktree, build/before-<commit>, which later runs reuse), and with BEFORE_BIN its binaries are
@@ -34,15 +38,22 @@ min_time=${MIN_TIME:-0.3}
 reps=${CASE_REPS:-3}
 pin=(taskset -c "$core")
 
-for tool in cmake ffmpeg python3 taskset; do
+no_build=${NO_BUILD:-}
+tools=(python3 taskset)
+[ -n "$no_build" ] || tools+=(cmake)
+for tool in "${tools[@]}"; do
   command -v "$tool" >/dev/null || { echo "bench-peers: $tool is missing (scripts/setup.sh)" >&2; exit 1; }
 done
+have_ffmpeg=$(command -v ffmpeg >/dev/null && echo 1 || true)
+[ -n "$have_ffmpeg" ] || echo "bench-peers: ffmpeg is missing: FFmpeg's rows are left out" >&2
 
-[ -f build/release/CMakeCache.txt ] || cmake --preset release >/dev/null
 benches=(bench_color_adjust bench_white_balance bench_hsl_adjust bench_vignette bench_lens_adjust
          bench_cube_lut bench_lut_effects bench_denoise bench_blur bench_light_adjust
          bench_grade_chain bench_peer_ocio_lut)
-cmake --build build/release -j "$(nproc)" --target "${benches[@]}" >/dev/null
+if [ -z "$no_build" ]; then
+  [ -f build/release/CMakeCache.txt ] || cmake --preset release >/dev/null
+  cmake --build build/release -j "$(nproc)" --target "${benches[@]}" >/dev/null
+fi
 bin=build/release/bin
 
 before_bin=${BEFORE_BIN:-}
@@ -172,7 +183,9 @@ peer() {  # ID GRAPH [FRAMES]
     echo "$id $label $w $h $frames $with $without ${format:--}" >>"$work/ffmpeg.txt"
   done
 }
-echo "bench-peers: FFmpeg, $ffmpeg_frames frames a case" >&2
+: >"$work/ffmpeg.txt"
+[ -n "$have_ffmpeg" ] && echo "bench-peers: FFmpeg, $ffmpeg_frames frames a case" >&2
+[ -n "$have_ffmpeg" ] || peer() { :; }
 peer vibrance 'vibrance=intensity=0.4'
 peer colortemperature 'colortemperature=temperature=5000'
 peer huesaturation 'huesaturation=hue=20:saturation=-0.2:intensity=0.1'
@@ -257,6 +270,8 @@ for size in ("1080p", "4K"):
         mine = ours.get(bench.format(size))
         note = ""
         if kind == "ff":
+            if not ffmpeg:  # not installed here
+                continue
             theirs, conv = ffmpeg.get((key, size), (None, "-"))
             if conv != "-":
                 note = "converts to " + conv
