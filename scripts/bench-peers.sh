@@ -183,9 +183,13 @@ peer() {  # ID GRAPH [FRAMES]
     echo "$id $label $w $h $frames $with $without ${format:--}" >>"$work/ffmpeg.txt"
   done
 }
-: >"$work/ffmpeg.txt"
-[ -n "$have_ffmpeg" ] && echo "bench-peers: FFmpeg, $ffmpeg_frames frames a case" >&2
-[ -n "$have_ffmpeg" ] || peer() { :; }
+# Without FFmpeg there is no ffmpeg.txt, and the table leaves its rows out.
+if [ -n "$have_ffmpeg" ]; then
+  : >"$work/ffmpeg.txt"
+  echo "bench-peers: FFmpeg, $ffmpeg_frames frames a case" >&2
+else
+  peer() { :; }
+fi
 peer vibrance 'vibrance=intensity=0.4'
 peer colortemperature 'colortemperature=temperature=5000'
 peer huesaturation 'huesaturation=hue=20:saturation=-0.2:intensity=0.1'
@@ -222,9 +226,10 @@ def rates(folder):  # benchmark name without /real_time -> Mpixel/s by CPU time
 ours = rates(work)
 before = rates(os.path.join(work, "before"))
 
-ffmpeg = {}
-with open(os.path.join(work, "ffmpeg.txt")) as f:
-    for line in f:
+ffmpeg = None  # FFmpeg not installed
+if os.path.exists(os.path.join(work, "ffmpeg.txt")):
+    ffmpeg = {}
+    for line in open(os.path.join(work, "ffmpeg.txt")):
         fid, size, w, h, frames, with_t, without_t, fmt = line.split()
         seconds = float(with_t) - float(without_t)
         rate = int(frames) * int(w) * int(h) / seconds / 1e6 if seconds > 0 else float("nan")
@@ -270,7 +275,7 @@ for size in ("1080p", "4K"):
         mine = ours.get(bench.format(size))
         note = ""
         if kind == "ff":
-            if not ffmpeg:  # not installed here
+            if ffmpeg is None:
                 continue
             theirs, conv = ffmpeg.get((key, size), (None, "-"))
             if conv != "-":
