@@ -232,6 +232,13 @@ TEST(ColorAdjustPlan, OnePassEqualsTheFiveOperationsInTurn) {
       plan.ApplyInto(actual->GetBits(), EveryColour().GetBits(),
                      size_t{actual->GetWidth()} * actual->GetHeight());
       ASSERT_TRUE(SameBuffer(*expected, *actual));
+      // In place, ending inside a block of the tone pass and inside a vector; nothing beyond.
+      const size_t odd = 1000 * 1000 + 3;
+      const Image inPlace = Clone(EveryColour());
+      plan.ApplyInto(inPlace->GetBits(), inPlace->GetBits(), odd);
+      ASSERT_EQ(0, std::memcmp(inPlace->GetBits(), expected->GetBits(), odd * 4));
+      ASSERT_EQ(0,
+                std::memcmp(inPlace->GetBits() + odd * 4, EveryColour().GetBits() + odd * 4, 64));
     });
   }
   const tfx::ColorAdjustRows& best = tfx::BestColorAdjustRows();
