@@ -539,6 +539,36 @@ HWY_INLINE VF LimitAbove(VF v) {
 #endif
 }
 
+// LimitAbove for saturation that increases. Its gain is then below 255: sat is at least 1 / 255,
+// and 1 / (1 - sigma) - 1 applies only where sat < 1 - sigma. With |f - lv| at most 127.5 every
+// result lies far inside the int32 range, which truncation on x86 takes as PackLimited needs.
+HWY_INLINE VF LimitAboveIncreasing(VF v) {
+#if HWY_ARCH_X86 && (HWY_TARGET == HWY_AVX2 || HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3)
+  return v;
+#else
+  return LimitAbove(v);
+#endif
+}
+
+// Channel0, Channel1 and Channel2 of each lane. On x86 bytes 1 and 2 take a byte shuffle each
+// instead of a shift and a mask.
+HWY_INLINE void ColourChannels(VU p, VI c[3]) {
+  c[0] = Channel0(p);
+#if HWY_ARCH_X86 && (HWY_TARGET == HWY_AVX2 || HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3)
+  const D8 d8;
+  const DI di;
+  alignas(16) static constexpr uint8_t kByte1[16] = {1, 0x80, 0x80, 0x80, 5,  0x80, 0x80, 0x80,
+                                                     9, 0x80, 0x80, 0x80, 13, 0x80, 0x80, 0x80};
+  alignas(16) static constexpr uint8_t kByte2[16] = {2,  0x80, 0x80, 0x80, 6,  0x80, 0x80, 0x80,
+                                                     10, 0x80, 0x80, 0x80, 14, 0x80, 0x80, 0x80};
+  c[1] = hn::BitCast(di, hn::TableLookupBytesOr0(hn::BitCast(d8, p), hn::LoadDup128(d8, kByte1)));
+  c[2] = hn::BitCast(di, hn::TableLookupBytesOr0(hn::BitCast(d8, p), hn::LoadDup128(d8, kByte2)));
+#else
+  c[1] = Channel1(p);
+  c[2] = Channel2(p);
+#endif
+}
+
 // FusedColourVector with every channel worked out as it works out the middle one, and only
 // saturation's gain looked up: one gather a pixel instead of two, from a table of a quarter of
 // the cache lines (a sixth less time for the five operations together than gathering from the
@@ -553,7 +583,8 @@ struct ArithmeticColourVector {
     const DF df;
     // The alpha byte goes from `raw` to the result unlooked-up.
     const VU p = kTone ? tone.Colours(raw) : raw;
-    VI c[3] = {Channel0(p), Channel1(p), Channel2(p)};
+    VI c[3];
+    ColourChannels(p, c);
     VI mx = hn::Max(c[0], hn::Max(c[1], c[2]));
     VI mn = hn::Min(c[0], hn::Min(c[1], c[2]));
     VF gain;
@@ -578,7 +609,7 @@ struct ArithmeticColourVector {
         const VF f = hn::ConvertTo(df, x);
         const VF o = kIncrease ? hn::Add(f, hn::Mul(hn::Sub(f, lv), gain))
                                : hn::Add(lv, hn::Mul(hn::Sub(f, lv), gain));
-        x = SmallToInt(LimitAbove(o));
+        x = SmallToInt(kIncrease ? LimitAboveIncreasing(o) : LimitAbove(o));
       }
     }
     return PackLimited(raw, c[0], c[1], c[2]);
