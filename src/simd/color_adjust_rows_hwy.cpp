@@ -17,6 +17,13 @@
 #include <hwy/foreach_target.h>  // IWYU pragma: keep
 #include <hwy/highway.h>
 
+// The x86 targets below AVX-512, evaluated anew for each target this file is compiled for: 16
+// vector registers, and truncation that takes out-of-range values to INT_MIN.
+#ifndef TFX_X86_BELOW_AVX512
+#define TFX_X86_BELOW_AVX512 \
+  (HWY_ARCH_X86 && (HWY_TARGET == HWY_AVX2 || HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3))
+#endif
+
 HWY_BEFORE_NAMESPACE();
 namespace tfx {
 namespace HWY_NAMESPACE {
@@ -532,7 +539,7 @@ HWY_INLINE VU PackLimited(VU p, VI c0, VI c1, VI c2) {
 // value below 0 to at most 0 (out of range to INT_MIN), which PackLimited takes to 0, so only
 // values from 2^31 up, which would not truncate into range, need limiting first.
 HWY_INLINE VF LimitAbove(VF v) {
-#if HWY_ARCH_X86 && (HWY_TARGET == HWY_AVX2 || HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3)
+#if TFX_X86_BELOW_AVX512
   return hn::Min(v, hn::Set(DF(), 255.0f));
 #else
   return ClampToByteRange<false>(v);
@@ -543,7 +550,7 @@ HWY_INLINE VF LimitAbove(VF v) {
 // and 1 / (1 - sigma) - 1 applies only where sat < 1 - sigma. With |f - lv| at most 127.5 every
 // result lies far inside the int32 range, which truncation on x86 takes as PackLimited needs.
 HWY_INLINE VF LimitAboveIncreasing(VF v) {
-#if HWY_ARCH_X86 && (HWY_TARGET == HWY_AVX2 || HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3)
+#if TFX_X86_BELOW_AVX512
   return v;
 #else
   return LimitAbove(v);
@@ -554,7 +561,7 @@ HWY_INLINE VF LimitAboveIncreasing(VF v) {
 // instead of a shift and a mask.
 HWY_INLINE void ColourChannels(VU p, VI c[3]) {
   c[0] = Channel0(p);
-#if HWY_ARCH_X86 && (HWY_TARGET == HWY_AVX2 || HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3)
+#if TFX_X86_BELOW_AVX512
   const D8 d8;
   const DI di;
   alignas(16) static constexpr uint8_t kByte1[16] = {1, 0x80, 0x80, 0x80, 5,  0x80, 0x80, 0x80,
@@ -771,7 +778,7 @@ constexpr bool kReadsEnds = false;
 // cache (on Zen 3, all five operations 1.17 times as fast with AVX2 and SSE4, 1.09 times with
 // SSSE3). There the tone curve goes over a block of pixels first, and the rest follows over that
 // block.
-#if HWY_ARCH_X86 && (HWY_TARGET == HWY_AVX2 || HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3)
+#if TFX_X86_BELOW_AVX512
 constexpr bool kToneFirst = true;
 #else
 constexpr bool kToneFirst = false;
