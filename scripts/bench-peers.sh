@@ -117,20 +117,29 @@ ours bench_lut_effects '^BM_ChromeKeyLut3d/[^/]+/mask/'
 ours bench_denoise '^BM_DeNoiseRGB/'
 ours bench_blur '^BM_(GaussianBlur|CvGaussianBlur)/[^/]+/bgra|^BM_(FastAverageBlur|CvBlur)/[^/]+/bgr/r7/|^BM_(FastFilter|CvMedianBlur)/[^/]+/r7/'
 
-# Our own cases at 4K, each beside the memcpy of the frame in the same binary and run; the fastest
-# of CASE_REPS repetitions of each (default 3), as a shared machine only ever slows a run down.
+# Our own cases at 4K, each beside the memcpy of the frame in the same binary and invocation, in
+# CASE_REPS rounds (default 3); within a round before and now run back to back, in turns first.
+# Each figure is the median over the rounds of what one round gives (a fraction of that
+# invocation's memcpy, a speed-up over the same round's before): on a shared machine the speed of
+# memory and of the cores drifts by tens of percent within minutes, and a ratio of two fastest
+# times taken at different moments carries that drift into the table.
 our_case() {  # BINARY FILTER
-  for side in now before; do
-    local dir=$bin
-    if [ "$side" = before ]; then
-      [ -n "$before_bin" ] || continue
-      dir=$before_bin
-    fi
-    mkdir -p "$work/cases/$side"
-    TFX_BENCH_CUBE="$work/look33.cube" "${pin[@]}" "$dir/$1" --benchmark_filter="$2|^BM_Memcpy/4K/" \
-      --benchmark_min_time="$min_time" --benchmark_repetitions="$reps" \
-      --benchmark_out="$work/cases/$side/$1.json" \
-      --benchmark_out_format=json >/dev/null 2>&1 || echo "bench-peers: $1 failed ($side)" >&2
+  local round side dir
+  for round in $(seq "$reps"); do
+    local order=(now before)
+    [ $((round % 2)) -eq 1 ] || order=(before now)
+    for side in "${order[@]}"; do
+      dir=$bin
+      if [ "$side" = before ]; then
+        [ -n "$before_bin" ] || continue
+        dir=$before_bin
+      fi
+      mkdir -p "$work/cases/$side"
+      TFX_BENCH_CUBE="$work/look33.cube" "${pin[@]}" "$dir/$1" \
+        --benchmark_filter="$2|^BM_Memcpy/4K/" --benchmark_min_time="$min_time" \
+        --benchmark_out="$work/cases/$side/$1.$round.json" \
+        --benchmark_out_format=json >/dev/null 2>&1 || echo "bench-peers: $1 failed ($side)" >&2
+    done
   done
 }
 echo "bench-peers: our cases against memcpy" >&2
@@ -294,25 +303,30 @@ for size in ("1080p", "4K"):
                     "n/a" if not was or not mine else "%.2fx" % (mine / was)]
         rows.append(tuple(row + [note]))
 
-def cases(folder):  # name without /real_time -> (real time in ms, the memcpy of its binary in ms)
+def cases(folder):  # name without /real_time -> {round: (real time in ms, that round's memcpy)}
     found = {}
     if not os.path.isdir(folder):
         return found
+    scale = {"ns": 1e-6, "us": 1e-3, "ms": 1.0, "s": 1e3}
     for name in os.listdir(folder):
+        round_ = int(name.split(".")[-2])
         with open(os.path.join(folder, name)) as f:
             runs = [b for b in json.load(f).get("benchmarks", [])
                     if not b.get("error_occurred") and b.get("run_type", "iteration") == "iteration"]
-        scale = {"ns": 1e-6, "us": 1e-3, "ms": 1.0, "s": 1e3}
-        times = {}
-        for b in runs:
-            key = b["run_name"].replace("/real_time", "")
-            t = b["real_time"] * scale[b["time_unit"]]
-            times[key] = min(times.get(key, t), t)
+        times = {b["run_name"].replace("/real_time", ""):
+                 b["real_time"] * scale[b["time_unit"]] for b in runs}
         memcpy = times.get("BM_Memcpy/4K")
         for key, t in times.items():
             if key != "BM_Memcpy/4K":
-                found[key] = (t, memcpy)
+                found.setdefault(key, {})[round_] = (t, memcpy)
     return found
+
+def median(values):
+    values = sorted(v for v in values if v)
+    if not values:
+        return None
+    mid = len(values) // 2
+    return values[mid] if len(values) % 2 else (values[mid - 1] + values[mid]) / 2
 
 now_cases = cases(os.path.join(work, "cases", "now"))
 before_cases = cases(os.path.join(work, "cases", "before"))
@@ -359,12 +373,13 @@ pair_cases = [  # label, ours, theirs, target
 speed_cases = [("deNoiseRGB", "BM_DeNoiseRGB/4K"), ("deNoiseLumiance", "BM_DeNoiseLumiance/4K")]
 
 def fraction(table, key):
-    t, memcpy = table.get(key, (None, None))
-    return "n/a" if not t or not memcpy else "%.3f" % (memcpy / t)
+    f = median(memcpy / t for t, memcpy in table.get(key, {}).values() if t and memcpy)
+    return "n/a" if f is None else "%.3f" % f
 
 def over(table, mine, theirs):
-    a, b = table.get(mine, (None, None))[0], table.get(theirs, (None, None))[0]
-    return "n/a" if not a or not b else "%.2f" % (b / a)
+    a, b = table.get(mine, {}), table.get(theirs, {})
+    f = median(b[r][0] / a[r][0] for r in a if r in b and a[r][0] and b[r][0])
+    return "n/a" if f is None else "%.2f" % f
 
 if now_cases:
     print()
@@ -380,9 +395,10 @@ if now_cases:
     for label, mine, theirs, target in pair_cases:
         row(label, over(before_cases, mine, theirs), over(now_cases, mine, theirs), target)
     for label, key in speed_cases:
-        was = before_cases.get(key, (None, None))[0]
-        now = now_cases.get(key, (None, None))[0]
-        row(label + " (ms a frame)", "n/a" if not was else "%.0f" % was,
-            "n/a" if not now else "%.0f" % now + (" (%.2fx)" % (was / now) if was else ""),
+        was, now = before_cases.get(key, {}), now_cases.get(key, {})
+        was_ms, now_ms = median(t for t, _ in was.values()), median(t for t, _ in now.values())
+        gain = median(was[r][0] / now[r][0] for r in now if r in was and now[r][0])
+        row(label + " (ms a frame)", "n/a" if not was_ms else "%.0f" % was_ms,
+            "n/a" if not now_ms else "%.0f" % now_ms + (" (%.2fx)" % gain if gain else ""),
             "2x faster")
 PY
