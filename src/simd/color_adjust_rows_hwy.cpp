@@ -654,9 +654,10 @@ HWY_INLINE void ForEachVector(D d, uint8_t* pixels, size_t count, const Kernel& 
 // ForEachVector from `src` to `dst`.
 // How far ahead of the pixels it reads a row asks for its input: the hardware's own prefetch
 // stops at every 4 KiB page, and in a chain of effects the frames come from memory, not cache.
+// A source already in the first-level cache (kFromCache) is read without that hint.
 constexpr size_t kPrefetchAhead = 4096;
 
-template <class D, class Kernel>
+template <bool kFromCache = false, class D, class Kernel>
 HWY_INLINE void ForEachVectorInto(D d, uint8_t* dst, const uint8_t* src, size_t count,
                                   const Kernel& kernel) {
   using T = hn::TFromD<D>;
@@ -664,9 +665,11 @@ HWY_INLINE void ForEachVectorInto(D d, uint8_t* dst, const uint8_t* src, size_t 
   const size_t bytes = count * 4;
   size_t i = 0;
   for (; i + step <= bytes; i += step) {
-    // Only a hint, and past the row at its end: an integer, not a pointer beyond the array.
-    hwy::Prefetch(
-        reinterpret_cast<const uint8_t*>(reinterpret_cast<uintptr_t>(src) + i + kPrefetchAhead));
+    if (!kFromCache) {
+      // Only a hint, and past the row at its end: an integer, not a pointer beyond the array.
+      hwy::Prefetch(
+          reinterpret_cast<const uint8_t*>(reinterpret_cast<uintptr_t>(src) + i + kPrefetchAhead));
+    }
     hn::StoreU(kernel(hn::LoadU(d, reinterpret_cast<const T*>(src + i))), d,
                reinterpret_cast<T*>(dst + i));
   }
@@ -804,30 +807,35 @@ void FusedColourRow(uint8_t* dst, const uint8_t* src, size_t count,
     }
     return;
   }
-  const auto run = [&](auto tone_flag, auto vibrance_flag, uint8_t* to, const uint8_t* from,
-                       size_t n) {
+  // `cached_flag`: `from` is the toned block.
+  const auto run = [&](auto tone_flag, auto vibrance_flag, auto cached_flag, uint8_t* to,
+                       const uint8_t* from, size_t n) {
     constexpr bool kTone = decltype(tone_flag)::value;
     constexpr bool kVibrance = decltype(vibrance_flag)::value;
+    constexpr bool kCached = decltype(cached_flag)::value;
     if (!tables.saturate) {
-      ForEachVectorInto(DU(), to, from, n, Fused<kTone, kVibrance, false, true>{tone, &tables});
+      ForEachVectorInto<kCached>(DU(), to, from, n,
+                                 Fused<kTone, kVibrance, false, true>{tone, &tables});
     } else if (tables.increase) {
-      ForEachVectorInto(DU(), to, from, n, Fused<kTone, kVibrance, true, true>{tone, &tables});
+      ForEachVectorInto<kCached>(DU(), to, from, n,
+                                 Fused<kTone, kVibrance, true, true>{tone, &tables});
     } else {
-      ForEachVectorInto(DU(), to, from, n, Fused<kTone, kVibrance, true, false>{tone, &tables});
+      ForEachVectorInto<kCached>(DU(), to, from, n,
+                                 Fused<kTone, kVibrance, true, false>{tone, &tables});
     }
   };
   const auto with_tone = [&](auto vibrance_flag) {
     if (!tables.tone) {
-      run(std::false_type(), vibrance_flag, dst, src, count);
+      run(std::false_type(), vibrance_flag, std::false_type(), dst, src, count);
     } else if (!kToneFirst) {
-      run(std::true_type(), vibrance_flag, dst, src, count);
+      run(std::true_type(), vibrance_flag, std::false_type(), dst, src, count);
     } else {
       // In place too: a block is read whole before its pixels are written.
       HWY_ALIGN uint8_t toned[kToneBlock * 4];
       for (size_t done = 0; done < count; done += kToneBlock) {
         const size_t n = count - done < kToneBlock ? count - done : kToneBlock;
         ForEachVectorInto(DU(), toned, src + done * 4, n, tone);
-        run(std::false_type(), vibrance_flag, dst + done * 4, toned, n);
+        run(std::false_type(), vibrance_flag, std::true_type(), dst + done * 4, toned, n);
       }
     }
   };
