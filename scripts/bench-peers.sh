@@ -210,27 +210,66 @@ peer dctdnoiz 'dctdnoiz=sigma=4.5' 1
 peer gblur 'gblur=sigma=5'
 peer avgblur 'avgblur=sizeX=7'
 
+# --- doLUT against lut3d and OpenColorIO, in rounds ---------------------------------------------
+# The first table times each program once, minutes apart from its peer. For the pairs with a
+# target, each round runs doLUT (now and before), OpenColorIO and lut3d back to back on the same
+# frame and file, and the second table gives the median over the rounds of each round's ratio.
+echo "bench-peers: doLUT, OpenColorIO and lut3d in $reps rounds" >&2
+mkdir -p "$work/lut/now" "$work/lut/before"
+: >"$work/lut/peers.txt"
+for round in $(seq "$reps"); do
+  for side in now before; do
+    dir=$bin
+    if [ "$side" = before ]; then
+      [ -n "$before_bin" ] || continue
+      dir=$before_bin
+    fi
+    TFX_BENCH_CUBE="$work/look33.cube" "${pin[@]}" "$dir/bench_cube_lut" \
+      --benchmark_filter='^BM_CubeLutDoLUT/[^/]+/file/' --benchmark_min_time="$min_time" \
+      --benchmark_out="$work/lut/$side/bench_cube_lut.$round.json" \
+      --benchmark_out_format=json >/dev/null 2>&1 || echo "bench-peers: doLUT failed ($side)" >&2
+  done
+  for s in "${sizes[@]}"; do
+    read -r label w h <<<"$s"
+    echo "$round $label ocio $("${pin[@]}" "$bin/bench_peer_ocio_lut" "$work/look33.cube" "$w" "$h" 2)" \
+      >>"$work/lut/peers.txt"
+    if [ -n "$have_ffmpeg" ]; then
+      # Frames, width, height, and the utime with lut3d and with null, as in ffmpeg.txt.
+      echo "$round $label lut3d $ffmpeg_frames $w $h" \
+        "$(ffmpeg_run "$label" "$ffmpeg_frames" "lut3d=file=$work/look33.cube:interp=tetrahedral")" \
+        "$(ffmpeg_run "$label" "$ffmpeg_frames" null)" >>"$work/lut/peers.txt"
+    fi
+  done
+done
+
 # --- the table ----------------------------------------------------------------------------------
 python3 - "$work" <<'PY'
 import json, os, sys
 
 work = sys.argv[1]
 
-def rates(folder):  # benchmark name without /real_time -> Mpixel/s by CPU time
+def file_rates(path):  # benchmark name without /real_time -> Mpixel/s by CPU time
     found = {}
-    if not os.path.isdir(folder):
-        return found
-    for name in os.listdir(folder):
-        if not name.endswith(".json"):
-            continue
-        with open(os.path.join(folder, name)) as f:
-            for b in json.load(f).get("benchmarks", []):
-                if b.get("error_occurred") or "items_per_second" not in b:
-                    continue
-                # Items per second are by real time; the two times share a unit.
-                rate = b["items_per_second"] * b["real_time"] / b["cpu_time"] / 1e6
-                found[b["run_name"].replace("/real_time", "")] = rate
+    with open(path) as f:
+        for b in json.load(f).get("benchmarks", []):
+            if b.get("error_occurred") or "items_per_second" not in b:
+                continue
+            # Items per second are by real time; the two times share a unit.
+            rate = b["items_per_second"] * b["real_time"] / b["cpu_time"] / 1e6
+            found[b["run_name"].replace("/real_time", "")] = rate
     return found
+
+def rates(folder):
+    found = {}
+    if os.path.isdir(folder):
+        for name in os.listdir(folder):
+            if name.endswith(".json"):
+                found.update(file_rates(os.path.join(folder, name)))
+    return found
+
+def ffmpeg_rate(frames, w, h, with_t, without_t):
+    seconds = float(with_t) - float(without_t)
+    return int(frames) * int(w) * int(h) / seconds / 1e6 if seconds > 0 else float("nan")
 
 ours = rates(work)
 before = rates(os.path.join(work, "before"))
@@ -240,9 +279,7 @@ if os.path.exists(os.path.join(work, "ffmpeg.txt")):
     ffmpeg = {}
     for line in open(os.path.join(work, "ffmpeg.txt")):
         fid, size, w, h, frames, with_t, without_t, fmt = line.split()
-        seconds = float(with_t) - float(without_t)
-        rate = int(frames) * int(w) * int(h) / seconds / 1e6 if seconds > 0 else float("nan")
-        ffmpeg[(fid, size)] = (rate, fmt)
+        ffmpeg[(fid, size)] = (ffmpeg_rate(frames, w, h, with_t, without_t), fmt)
 ocio = {}
 with open(os.path.join(work, "ocio.txt")) as f:
     for line in f:
@@ -372,6 +409,29 @@ pair_cases = [  # label, ours, theirs, target
 ]
 speed_cases = [("deNoiseRGB", "BM_DeNoiseRGB/4K"), ("deNoiseLumiance", "BM_DeNoiseLumiance/4K")]
 
+# doLUT over each LUT peer, by round: {(peer, size): {round: Mpixel/s}}, and doLUT's own.
+lut_peers = {}
+for line in open(os.path.join(work, "lut", "peers.txt")):
+    fields = line.split()
+    if len(fields) != (4 if fields[2] == "ocio" else 8):
+        continue  # a peer that gave no figure
+    round_, size, peer = fields[:3]
+    rate = float(fields[3]) if peer == "ocio" else ffmpeg_rate(*fields[3:8])
+    lut_peers.setdefault((peer, size), {})[round_] = rate
+def lut_rounds(side):  # {size: {round: Mpixel/s}}
+    found = {}
+    folder = os.path.join(work, "lut", side)
+    for name in os.listdir(folder):
+        for key, rate in file_rates(os.path.join(folder, name)).items():
+            found.setdefault(key.split("/")[1], {})[name.split(".")[-2]] = rate
+    return found
+lut_now, lut_before = lut_rounds("now"), lut_rounds("before")
+lut_cases = [("FFmpeg lut3d tetrahedral", "lut3d"), ("OpenColorIO CPU, tetrahedral", "ocio")]
+def lut_over(mine, peer, size):
+    a, b = mine.get(size, {}), lut_peers.get((peer, size), {})
+    f = median(a[r] / b[r] for r in a if r in b and b[r] == b[r] and b[r] > 0)
+    return "n/a" if f is None else "%.2f" % f
+
 def fraction(table, key):
     f = median(memcpy / t for t, memcpy in table.get(key, {}).values() if t and memcpy)
     return "n/a" if f is None else "%.3f" % f
@@ -394,6 +454,10 @@ if now_cases:
         row(label + " (x memcpy)", fraction(before_cases, key), fraction(now_cases, key), target)
     for label, mine, theirs, target in pair_cases:
         row(label, over(before_cases, mine, theirs), over(now_cases, mine, theirs), target)
+    for label, peer in lut_cases:
+        for size in ("1080p", "4K"):
+            row("doLUT 33 over %s, %s" % (label, size), lut_over(lut_before, peer, size),
+                lut_over(lut_now, peer, size), ">= 8")
     for label, key in speed_cases:
         was, now = before_cases.get(key, {}), now_cases.get(key, {})
         was_ms, now_ms = median(t for t, _ in was.values()), median(t for t, _ in now.values())
