@@ -95,16 +95,21 @@ for s in "${sizes[@]}"; do
 done
 
 # --- ours ---------------------------------------------------------------------------------------
-ours() {  # BINARY FILTER
-  TFX_BENCH_CUBE="$work/look33.cube" "${pin[@]}" "$bin/$1" --benchmark_filter="$2" \
-    --benchmark_min_time="$min_time" --benchmark_out="$work/$1.json" --benchmark_out_format=json \
-    >/dev/null 2>&1
-  if [ -n "$before_bin" ]; then
-    mkdir -p "$work/before"
-    TFX_BENCH_CUBE="$work/look33.cube" "${pin[@]}" "$before_bin/$1" --benchmark_filter="$2" \
-      --benchmark_min_time="$min_time" --benchmark_out="$work/before/$1.json" \
-      --benchmark_out_format=json >/dev/null 2>&1 || echo "bench-peers: $1 failed before" >&2
+# One benchmark binary of SIDE (now, or before where one was given), its results as JSON in OUT.
+bench_json() {  # SIDE BINARY FILTER OUT
+  local dir=$bin
+  if [ "$1" = before ]; then
+    [ -n "$before_bin" ] || return 0
+    dir=$before_bin
   fi
+  mkdir -p "$(dirname "$4")"
+  TFX_BENCH_CUBE="$work/look33.cube" "${pin[@]}" "$dir/$2" --benchmark_filter="$3" \
+    --benchmark_min_time="$min_time" --benchmark_out="$4" --benchmark_out_format=json \
+    >/dev/null 2>&1 || echo "bench-peers: $2 failed ($1)" >&2
+}
+ours() {  # BINARY FILTER
+  bench_json now "$1" "$2" "$work/$1.json"
+  bench_json before "$1" "$2" "$work/before/$1.json"
 }
 echo "bench-peers: our benchmarks on core $core${before_bin:+, and before from $before_bin}" >&2
 ours bench_color_adjust '^BM_ColorAdjust/[^/]+/vibrance/'
@@ -124,21 +129,12 @@ ours bench_blur '^BM_(GaussianBlur|CvGaussianBlur)/[^/]+/bgra|^BM_(FastAverageBl
 # memory and of the cores drifts by tens of percent within minutes, and a ratio of two fastest
 # times taken at different moments carries that drift into the table.
 our_case() {  # BINARY FILTER
-  local round side dir
+  local round side
   for round in $(seq "$reps"); do
     local order=(now before)
     [ $((round % 2)) -eq 1 ] || order=(before now)
     for side in "${order[@]}"; do
-      dir=$bin
-      if [ "$side" = before ]; then
-        [ -n "$before_bin" ] || continue
-        dir=$before_bin
-      fi
-      mkdir -p "$work/cases/$side"
-      TFX_BENCH_CUBE="$work/look33.cube" "${pin[@]}" "$dir/$1" \
-        --benchmark_filter="$2|^BM_Memcpy/4K/" --benchmark_min_time="$min_time" \
-        --benchmark_out="$work/cases/$side/$1.$round.json" \
-        --benchmark_out_format=json >/dev/null 2>&1 || echo "bench-peers: $1 failed ($side)" >&2
+      bench_json "$side" "$1" "$2|^BM_Memcpy/4K/" "$work/cases/$side/$1.$round.json"
     done
   done
 }
@@ -219,15 +215,8 @@ mkdir -p "$work/lut/now" "$work/lut/before"
 : >"$work/lut/peers.txt"
 for round in $(seq "$reps"); do
   for side in now before; do
-    dir=$bin
-    if [ "$side" = before ]; then
-      [ -n "$before_bin" ] || continue
-      dir=$before_bin
-    fi
-    TFX_BENCH_CUBE="$work/look33.cube" "${pin[@]}" "$dir/bench_cube_lut" \
-      --benchmark_filter='^BM_CubeLutDoLUT/[^/]+/file/' --benchmark_min_time="$min_time" \
-      --benchmark_out="$work/lut/$side/bench_cube_lut.$round.json" \
-      --benchmark_out_format=json >/dev/null 2>&1 || echo "bench-peers: doLUT failed ($side)" >&2
+    bench_json "$side" bench_cube_lut '^BM_CubeLutDoLUT/[^/]+/file/' \
+      "$work/lut/$side/bench_cube_lut.$round.json"
   done
   for s in "${sizes[@]}"; do
     read -r label w h <<<"$s"
