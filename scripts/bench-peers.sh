@@ -210,25 +210,41 @@ peer avgblur 'avgblur=sizeX=7'
 # The first table times each program once, minutes apart from its peer. For the pairs with a
 # target, each round runs doLUT (now and before), OpenColorIO and lut3d back to back on the same
 # frame and file, and the second table gives the median over the rounds of each round's ratio.
+# Odd rounds run ours first (now, then before), even rounds the peers first and then ours the
+# other way round, so that no program always comes first after a pause or last after a long run.
 echo "bench-peers: doLUT, OpenColorIO and lut3d in $reps rounds" >&2
 mkdir -p "$work/lut/now" "$work/lut/before"
 : >"$work/lut/peers.txt"
-for round in $(seq "$reps"); do
-  for side in now before; do
+lut_ours() {  # ROUND SIDE...
+  local round=$1 side
+  shift
+  for side in "$@"; do
     bench_json "$side" bench_cube_lut '^BM_CubeLutDoLUT/[^/]+/file/' \
       "$work/lut/$side/bench_cube_lut.$round.json"
   done
+}
+lut_peers() {  # ROUND
+  local s label w h
   for s in "${sizes[@]}"; do
     read -r label w h <<<"$s"
-    echo "$round $label ocio $("${pin[@]}" "$bin/bench_peer_ocio_lut" "$work/look33.cube" "$w" "$h" 2)" \
+    echo "$1 $label ocio $("${pin[@]}" "$bin/bench_peer_ocio_lut" "$work/look33.cube" "$w" "$h" 2)" \
       >>"$work/lut/peers.txt"
     if [ -n "$have_ffmpeg" ]; then
       # Frames, width, height, and the utime with lut3d and with null, as in ffmpeg.txt.
-      echo "$round $label lut3d $ffmpeg_frames $w $h" \
+      echo "$1 $label lut3d $ffmpeg_frames $w $h" \
         "$(ffmpeg_run "$label" "$ffmpeg_frames" "lut3d=file=$work/look33.cube:interp=tetrahedral")" \
         "$(ffmpeg_run "$label" "$ffmpeg_frames" null)" >>"$work/lut/peers.txt"
     fi
   done
+}
+for round in $(seq "$reps"); do
+  if [ $((round % 2)) -eq 1 ]; then
+    lut_ours "$round" now before
+    lut_peers "$round"
+  else
+    lut_peers "$round"
+    lut_ours "$round" before now
+  fi
 done
 
 # --- the table ----------------------------------------------------------------------------------
