@@ -128,12 +128,14 @@ ours bench_blur '^BM_(GaussianBlur|CvGaussianBlur)/[^/]+/bgra|^BM_(FastAverageBl
 # invocation's memcpy, a speed-up over the same round's before): on a shared machine the speed of
 # memory and of the cores drifts by tens of percent within minutes, and a ratio of two fastest
 # times taken at different moments carries that drift into the table.
+# FIRST and SECOND in that order in odd rounds and the other way round in even ones.
+in_turns() {  # ROUND FIRST SECOND
+  if [ $(($1 % 2)) -eq 1 ]; then echo "$2 $3"; else echo "$3 $2"; fi
+}
 our_case() {  # BINARY FILTER
   local round side
   for round in $(seq "$reps"); do
-    local order=(now before)
-    [ $((round % 2)) -eq 1 ] || order=(before now)
-    for side in "${order[@]}"; do
+    for side in $(in_turns "$round" now before); do
       bench_json "$side" "$1" "$2|^BM_Memcpy/4K/" "$work/cases/$side/$1.$round.json"
     done
   done
@@ -211,16 +213,16 @@ peer avgblur 'avgblur=sizeX=7'
 # target, each round runs doLUT (now and before), OpenColorIO and lut3d back to back on the same
 # frame and file, and the second table gives the median over the rounds of each round's ratio.
 # Odd rounds run ours first (now, then before), even rounds the peers first and then ours the
-# other way round, so that no program always comes first after a pause or last after a long run.
+# other way round (in_turns), so that no program always comes first after a pause or last after a
+# long run.
 echo "bench-peers: doLUT, OpenColorIO and lut3d in $reps rounds" >&2
 mkdir -p "$work/lut/now" "$work/lut/before"
 : >"$work/lut/peers.txt"
-lut_ours() {  # ROUND SIDE...
-  local round=$1 side
-  shift
-  for side in "$@"; do
+lut_ours() {  # ROUND
+  local side
+  for side in $(in_turns "$1" now before); do
     bench_json "$side" bench_cube_lut '^BM_CubeLutDoLUT/[^/]+/file/' \
-      "$work/lut/$side/bench_cube_lut.$round.json"
+      "$work/lut/$side/bench_cube_lut.$1.json"
   done
 }
 lut_peers() {  # ROUND
@@ -238,13 +240,9 @@ lut_peers() {  # ROUND
   done
 }
 for round in $(seq "$reps"); do
-  if [ $((round % 2)) -eq 1 ]; then
-    lut_ours "$round" now before
-    lut_peers "$round"
-  else
-    lut_peers "$round"
-    lut_ours "$round" before now
-  fi
+  for part in $(in_turns "$round" lut_ours lut_peers); do
+    "$part" "$round"
+  done
 done
 
 # --- the table ----------------------------------------------------------------------------------
