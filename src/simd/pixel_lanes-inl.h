@@ -2,6 +2,13 @@
 // HWY_NAMESPACE (or a namespace within it), once per target, after
 // `namespace hn = hwy::HWY_NAMESPACE;`.
 
+// The x86 targets below AVX-512, evaluated anew for each target a kernel file is compiled for: 16
+// vector registers, and truncation that takes out-of-range values to INT_MIN.
+#ifndef TFX_X86_BELOW_AVX512
+#define TFX_X86_BELOW_AVX512 \
+  (HWY_ARCH_X86 && (HWY_TARGET == HWY_AVX2 || HWY_TARGET == HWY_SSE4 || HWY_TARGET == HWY_SSSE3))
+#endif
+
 using DU = hn::ScalableTag<uint32_t>;
 using DI = hn::RebindToSigned<DU>;
 using DF = hn::RebindToFloat<DU>;
