@@ -282,11 +282,10 @@ CxImage* temperatureAdjustment(CxImage* image, long t) {
 
   Packing pk;
   if (PackedPixels(*image, &pk)) {
-    int32_t red[256], green[256], blue[256];
-    for (int v = 0; v < 256; ++v) red[v] = mixRed[v], green[v] = mixGreen[v], blue[v] = mixBlue[v];
     const tfx::HslRelightRows& rows = tfx::BestHslRelightRows();
-    ForEachRow(image,
-               [&](uint8_t* p, size_t count) { rows.relight(p, count, pk.red, red, green, blue); });
+    ForEachRow(image, [&](uint8_t* p, size_t count) {
+      rows.relight(p, count, pk.red, mixRed, mixGreen, mixBlue);
+    });
   } else {
     ForEachPixel(image, [&](tagRGBQUAD c) {
       const tagRGBQUAD mixed{mixBlue[c.rgbBlue], mixGreen[c.rgbGreen], mixRed[c.rgbRed], 0};

@@ -151,8 +151,8 @@ struct SaturationVector {
     const VF f0 = hn::ConvertTo(df, c0), f1 = hn::ConvertTo(df, c1), f2 = hn::ConvertTo(df, c2);
     const VI mx = hn::Max(c0, hn::Max(c1, c2));
     const VI mn = hn::Min(c0, hn::Min(c1, c2));
-    const VF sum = DivideBy<255>(df, hn::ConvertTo(df, hn::Add(mx, mn)));
-    const VF delta = DivideBy<255>(df, hn::ConvertTo(df, hn::Sub(mx, mn)));
+    const VF sum = DivideWholeBy255(df, hn::ConvertTo(df, hn::Add(mx, mn)));
+    const VF delta = DivideWholeBy255(df, hn::ConvertTo(df, hn::Sub(mx, mn)));
     // l * 255 with l = sum / 2: halving is exact, so this rounds the same product once.
     const VF lv = hn::Mul(sum, hn::Set(df, 127.5f));
     VF o0, o1, o2;

@@ -18,3 +18,14 @@ HWY_INLINE hn::Vec<DF> DivideBy(DF df, hn::Vec<DF> x) {
   return hn::Combine(df, high, low);
 #endif
 }
+
+// x / 255 as float division rounds it, for whole numbers x from 0 to 510, without widening to
+// double: 1 / 255 is 2^-8 + 2^-16 plus 2^-16 / 255. The product of x and the first part (9
+// significant bits each) is exact; the product with the small rest and the sum each round, and
+// for all 511 such x the result is the float quotient (the every-colour tests of the kernels
+// that use this reach each of them).
+template <class DF>
+HWY_INLINE hn::Vec<DF> DivideWholeBy255(DF df, hn::Vec<DF> x) {
+  return hn::Add(hn::Mul(x, hn::Set(df, 0x1.01p-8f)),
+                 hn::Mul(x, hn::Set(df, (1.0f / 255.0f) * 0x1p-16f)));
+}
