@@ -19,7 +19,7 @@ struct HslRelightRows {
 };
 
 // RGBtoHSL's saturation as HSLtoRGB reads it, s / 255 in float, at max * 256 + min (min <=
-// max): it depends on nothing else. Built on first use; every set reads it.
+// max): it depends on nothing else. Built on first use; the sets that gather read it.
 const float* HslSaturationByMaxMin();
 
 // HSLtoRGB's choice per hue byte h, which fixes the hue in degrees and so, for each channel
