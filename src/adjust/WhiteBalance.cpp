@@ -282,10 +282,8 @@ CxImage* temperatureAdjustment(CxImage* image, long t) {
 
   Packing pk;
   if (PackedPixels(*image, &pk)) {
-    const tfx::HslRelightRows& rows = tfx::BestHslRelightRows();
-    ForEachRow(image, [&](uint8_t* p, size_t count) {
-      rows.relight(p, count, pk.red, mixRed, mixGreen, mixBlue);
-    });
+    tfx::BestHslRelightRows().relight(image->GetBits(), image->GetWidth(), image->GetHeight(),
+                                      image->GetEffWidth(), pk.red, mixRed, mixGreen, mixBlue);
   } else {
     ForEachPixel(image, [&](tagRGBQUAD c) {
       const tagRGBQUAD mixed{mixBlue[c.rgbBlue], mixGreen[c.rgbGreen], mixRed[c.rgbRed], 0};

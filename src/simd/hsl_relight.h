@@ -10,12 +10,13 @@ namespace tfx {
 
 struct HslRelightRows {
   const char* name;  // the instruction set, as Highway names it
-  // Rewrites `count` consecutive 4-byte pixels in place; red is byte `red` (0 or 2), blue the
-  // other of the two, alpha byte 3 and kept. Each colour goes through the per-channel tables,
-  // then RGBtoHSL; its lightness is replaced by (max + min) / 2 of the pixel as it came in, and
-  // HSLtoRGB gives the result.
-  void (*relight)(uint8_t* pixels, size_t count, int red, const uint8_t mixRed[256],
-                  const uint8_t mixGreen[256], const uint8_t mixBlue[256]);
+  // Rewrites `height` rows of `width` 4-byte pixels in place, the rows `stride` bytes apart; red
+  // is byte `red` (0 or 2), blue the other of the two, alpha byte 3 and kept. Each colour goes
+  // through the per-channel tables, then RGBtoHSL; its lightness is replaced by (max + min) / 2
+  // of the pixel as it came in, and HSLtoRGB gives the result.
+  void (*relight)(uint8_t* pixels, size_t width, size_t height, size_t stride, int red,
+                  const uint8_t mixRed[256], const uint8_t mixGreen[256],
+                  const uint8_t mixBlue[256]);
 };
 
 // RGBtoHSL's saturation as HSLtoRGB reads it, s / 255 in float, at max * 256 + min (min <=
