@@ -25,9 +25,9 @@ namespace {
 
 #include "simd/pixel_lanes-inl.h"
 // Where the mixes come from byte shuffles rather than gathers: below AVX-512, and with VBMI's
-// byte permutes, where the round trip ran 1.44 times as fast so on an Intel Xeon (Emerald Rapids).
-// There a gather is cheap enough that the saturation's and the hue code's stay (working either
-// out was slower).
+// byte permutes, where the round trip ran 1.36 to 1.44 times as fast so on an Intel Xeon
+// (Emerald Rapids). There a gather is cheap enough that the saturation's and the hue code's stay
+// (working either out was slower).
 #define TFX_SHUFFLED_MIX (TFX_X86_BELOW_AVX512 || HWY_TARGET == HWY_AVX3_DL)
 #if TFX_SHUFFLED_MIX
 #include "simd/byte_table-inl.h"
