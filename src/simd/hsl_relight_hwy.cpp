@@ -24,10 +24,9 @@ namespace hn = hwy::HWY_NAMESPACE;
 namespace {
 
 #include "simd/pixel_lanes-inl.h"
-// Where the mixes come from byte shuffles rather than gathers: below AVX-512, and with VBMI's
-// byte permutes, where the round trip ran 1.36 to 1.44 times as fast so on an Intel Xeon
-// (Emerald Rapids). There a gather is cheap enough that the saturation's and the hue code's stay
-// (working either out was slower).
+// Where the channels' mixes come from byte shuffles over a block of pixels rather than from
+// gathers: below AVX-512, and with VBMI's byte permutes (the round trip 1.36 to 1.44 times as fast
+// so on an Intel Xeon, Emerald Rapids).
 #define TFX_SHUFFLED_MIX (TFX_X86_BELOW_AVX512 || HWY_TARGET == HWY_AVX3_DL)
 #if TFX_SHUFFLED_MIX
 #include "simd/byte_table-inl.h"
@@ -55,10 +54,10 @@ HWY_INLINE VI Choose(VI code, VI pByte, VI qByte, VI rampByte) {
                         hn::IfThenElse(hn::Eq(which, hn::Set(di, 1)), qByte, pByte));
 }
 
-// Below AVX-512 on x86 a gather costs about what its loads one at a time do. There the channels'
-// mixes come from byte shuffles over a block of pixels, RGBtoHSL's saturation is worked out, and
-// the hue's code comes from counting where it changes (the round trip 1.15 to 1.19 times as fast on
-// Zen 3); elsewhere each lane looks the last two up (the mixes: TFX_SHUFFLED_MIX).
+// Below AVX-512 on x86 a gather costs about what its loads one at a time do. There, besides the
+// mixes, RGBtoHSL's saturation is worked out and the hue's code comes from counting where it
+// changes (the round trip 1.15 to 1.19 times as fast on Zen 3). Elsewhere each lane looks the two
+// up: on the Xeon above, working either out was slower even with the mixes shuffled.
 #if TFX_X86_BELOW_AVX512
 // HslSaturationByMaxMin's entry as its builder works it out: l = (sum * 255 + 255) / 510 is at
 // most 127 exactly when sum < 255. A grey has s = 0 as it should (den / 2 < den), and 510 - sum is
@@ -73,12 +72,7 @@ HWY_INLINE VF SaturationUnits(VI cMax, VI cMin, const float*) {
                 hn::Max(den, hn::Set(di, 1)));
   return DivideWholeBy255(df, hn::ConvertTo(df, s));
 }
-#else
-HWY_INLINE VF SaturationUnits(VI cMax, VI cMin, const float* saturation) {
-  return hn::GatherIndex(DF(), saturation, hn::Add(hn::ShiftLeft<8>(cMax), cMin));
-}
-#endif
-#if TFX_X86_BELOW_AVX512
+
 // hue.code[h], from the starts of its runs and one byte shuffle.
 HWY_INLINE VI HueCode(VI h, const HslHueChoice& hue) {
   const DI di;
@@ -92,6 +86,10 @@ HWY_INLINE VI HueCode(VI h, const HslHueChoice& hue) {
   return hn::And(hn::BitCast(di, code), hn::Set(di, 255));
 }
 #else
+HWY_INLINE VF SaturationUnits(VI cMax, VI cMin, const float* saturation) {
+  return hn::GatherIndex(DF(), saturation, hn::Add(hn::ShiftLeft<8>(cMax), cMin));
+}
+
 HWY_INLINE VI HueCode(VI h, const HslHueChoice& hue) { return hn::GatherIndex(DI(), hue.code, h); }
 #endif
 
