@@ -85,22 +85,6 @@ HWY_INLINE VU ComponentBytes(VF v) {
   return hn::And(hn::BitCast(du, rounded), hn::Set(du, 255u));
 }
 
-// Lanes whose byte is the truncation of the float sum v + 0.5f: from 0 up, where the sum rounds
-// across an integer only for the largest float below 0.5 (it rounds to 1). Above 0.5 the sum has
-// at most one more bit than v, and lies less than 0.5 above a power of two it crossed, so a
-// rounding never reaches the next integer. NaN fails the comparison.
-HWY_INLINE MF Plain(VF v) {
-  const DF df;
-  return hn::And(hn::Ge(v, hn::Zero(df)), hn::Ne(v, hn::Set(df, 0.49999997f)));
-}
-
-// ComponentBytes for lanes that pass Plain.
-HWY_INLINE VU PlainBytes(VF v) {
-  const DF df;
-  const VF c = hn::Min(v, hn::Set(df, 254.5f));
-  return hn::BitCast(DU(), SmallToInt(hn::Add(c, hn::Set(df, 0.5f))));
-}
-
 // What a position lies above its lower lattice point (positions are never negative), exactly;
 // the position less it is that point. AVX-512 has it in one instruction, where rounding down
 // takes two on the same port: truncating, as x - x then gives +0 and not -0.
@@ -305,20 +289,57 @@ HWY_INLINE Corner LoadCorner(const float* points, const int32_t* offsets) {
 
 #endif  // HWY_TARGET == HWY_SCALAR
 
-// Whether every lane of r, g and b is at least 0.5 (NaN is not), each comparison masked by the
-// one before rather than the masks joined after.
-HWY_INLINE bool AllAtLeastHalf(VF r, VF g, VF b) {
+// Whether every lane of r, g and b is at least `least` (NaN is not), each comparison masked by
+// the one before rather than the masks joined after.
+HWY_INLINE bool AllAtLeast(VF r, VF g, VF b, float least) {
   const DF df;
-  const VF half = hn::Set(df, 0.5f);
+  const VF bound = hn::Set(df, least);
 #if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
-  __mmask16 k = _mm512_cmp_ps_mask(r.raw, half.raw, _CMP_GE_OQ);
-  k = _mm512_mask_cmp_ps_mask(k, g.raw, half.raw, _CMP_GE_OQ);
-  k = _mm512_mask_cmp_ps_mask(k, b.raw, half.raw, _CMP_GE_OQ);
+  __mmask16 k = _mm512_cmp_ps_mask(r.raw, bound.raw, _CMP_GE_OQ);
+  k = _mm512_mask_cmp_ps_mask(k, g.raw, bound.raw, _CMP_GE_OQ);
+  k = _mm512_mask_cmp_ps_mask(k, b.raw, bound.raw, _CMP_GE_OQ);
   return k == 0xFFFF;
 #else
-  return hn::AllTrue(df, hn::And(hn::Ge(r, half), hn::And(hn::Ge(g, half), hn::Ge(b, half))));
+  return hn::AllTrue(df, hn::And(hn::Ge(r, bound), hn::And(hn::Ge(g, bound), hn::Ge(b, bound))));
 #endif
 }
+
+// Lattices stay within 0..255 in practice, and their blends convert by ShortBytes wherever Short
+// holds for every channel; ComponentBytes is for the others. ShortBytes is the truncation of
+// min(v, 254.5) + 0.5 in float.
+#if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
+// With the sum rounded toward zero, its truncation is that of the exact sum for every v from 0 up
+// (NaN is not), so one comparison a channel admits them all (a keyer's colours, many of them 0,
+// passed neither of the two tests below and went through both).
+HWY_INLINE bool Short(VF r, VF g, VF b) { return AllAtLeast(r, g, b, 0.0f); }
+
+HWY_INLINE VU ShortBytes(VF v) {
+  const DF df;
+  const VF c = hn::Min(v, hn::Set(df, 254.5f));
+  const __m512 sum =
+      _mm512_add_round_ps(c.raw, hn::Set(df, 0.5f).raw, _MM_FROUND_TO_ZERO | _MM_FROUND_NO_EXC);
+  return hn::BitCast(DU(), SmallToInt(VF{sum}));
+}
+#else
+// Rounded to nearest, the sum crosses an integer from 0 up only for the largest float below 0.5
+// (it rounds to 1). Above 0.5 the sum has at most one more bit than v, and lies less than 0.5
+// above a power of two it crossed, so a rounding never reaches the next integer. Values from 0.5
+// up (NaN fails the comparison) pass at half the comparisons of the full test.
+HWY_INLINE bool Short(VF r, VF g, VF b) {
+  const DF df;
+  const auto plain = [&](VF v) {
+    return hn::And(hn::Ge(v, hn::Zero(df)), hn::Ne(v, hn::Set(df, 0.49999997f)));
+  };
+  return AllAtLeast(r, g, b, 0.5f) ||
+         hn::AllTrue(df, hn::And(plain(r), hn::And(plain(g), plain(b))));
+}
+
+HWY_INLINE VU ShortBytes(VF v) {
+  const DF df;
+  const VF c = hn::Min(v, hn::Set(df, 254.5f));
+  return hn::BitCast(DU(), SmallToInt(hn::Add(c, hn::Set(df, 0.5f))));
+}
+#endif
 
 // The second pass for one vector of pixels `p` whose first pass is at lane `at` of `prepared`.
 template <bool kGrey>
@@ -336,7 +357,7 @@ HWY_INLINE VU Finish(const Kernel& kernel, VU p, const Prepared& prepared, size_
       c[k] = hn::GatherIndex(df, kernel.points, hn::Load(di, prepared.corner[k] + at));
     }
     const VF v = Blend(w, c[0], c[1], c[2], c[3]);
-    const VU v8 = hn::AllTrue(df, Plain(v)) ? PlainBytes(v) : ComponentBytes(v);
+    const VU v8 = Short(v, v, v) ? ShortBytes(v) : ComponentBytes(v);
     return hn::Or(alpha, hn::Or(hn::Or(v8, hn::ShiftLeft<8>(v8)), hn::ShiftLeft<16>(v8)));
   } else {
     Corner c[4];
@@ -349,11 +370,8 @@ HWY_INLINE VU Finish(const Kernel& kernel, VU p, const Prepared& prepared, size_
     const VF g = Blend(w, c[0].green, c[1].green, c[2].green, c[3].green);
     const VF b = Blend(w, c[0].blue, c[1].blue, c[2].blue, c[3].blue);
     VU r8, g8, b8;
-    // Lattices stay within 0..255 in practice; the general conversion is for the others. Values
-    // from 0.5 up (NaN fails the comparison) pass Plain at half the comparisons.
-    if (AllAtLeastHalf(r, g, b) ||
-        hn::AllTrue(df, hn::And(Plain(r), hn::And(Plain(g), Plain(b))))) {
-      r8 = PlainBytes(r), g8 = PlainBytes(g), b8 = PlainBytes(b);
+    if (Short(r, g, b)) {
+      r8 = ShortBytes(r), g8 = ShortBytes(g), b8 = ShortBytes(b);
     } else {
       r8 = ComponentBytes(r), g8 = ComponentBytes(g), b8 = ComponentBytes(b);
     }

@@ -196,8 +196,13 @@ TEST(CubeLutApply, EverySizeFindsItsPositionsByMultiplying) {
 // corners weight 0. Those corners have an odd index, so keeping odd points at 0 lets every even
 // point's value reach the byte conversion unmixed, NaN and infinities included.
 TEST(CubeLutApply, LatticePointsConvertLikeTheScalarHelper) {
-  std::vector<float> values = EdgeValues();
   const float inf = std::numeric_limits<float>::infinity();
+  // First a whole vector of values from 0 up, every other one the float below 0.5, which the
+  // float sum v + 0.5f would round up to 1.
+  std::vector<float> values;
+  for (int i = 0; i < 48; ++i) values.push_back(i % 2 ? std::nextafter(0.5f, 0.0f) : i * 0.25f);
+  const std::vector<float> edges = EdgeValues();
+  values.insert(values.end(), edges.begin(), edges.end());
   for (int k = -300; k <= 300; ++k) {
     for (const float v : {static_cast<float>(k), k + 0.5f}) {
       values.insert(values.end(), {v, std::nextafter(v, -inf), std::nextafter(v, inf)});
