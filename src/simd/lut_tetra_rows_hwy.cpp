@@ -100,10 +100,11 @@ HWY_INLINE VF FractionOf(VF where) {
 constexpr size_t kLineLanes = 16;
 constexpr size_t kAhead = 1024;
 
-// A prefetch kAhead pixels on from `p`. Only a hint: the address may lie past the row, so it is
-// made as an integer rather than by pointer arithmetic.
+// A prefetch kPixels pixels on from `p`. Only a hint: the address may lie past the row or the
+// slab, so it is made as an integer rather than by pointer arithmetic.
+template <size_t kPixels = kAhead>
 HWY_INLINE void PrefetchAhead(const uint32_t* p) {
-  hwy::Prefetch(reinterpret_cast<const uint8_t*>(reinterpret_cast<uintptr_t>(p) + kAhead * 4));
+  hwy::Prefetch(reinterpret_cast<const uint8_t*>(reinterpret_cast<uintptr_t>(p) + kPixels * 4));
 }
 
 // What the first pass leaves for the second, per pixel of a block.
@@ -524,6 +525,11 @@ using MU = hn::Mask<DU>;
 // The slabs of a band: which slab each pixel's red byte falls in, the slab's pixels in the order
 // they were met, and how far each slab has been filled or read back.
 struct Slabs {
+  // How far ahead of the sort and of the put-back each slab's pixels are asked for: each slab
+  // fills or drains at about a quarter of the walk's pace, and the hardware's prefetch, following
+  // the frame and every slab at once, fell behind (together with the counts kept in registers,
+  // below, a 64-point frame of random pixels 1.025 times as fast, faster in 14 of 14 rounds).
+  static constexpr size_t kSlabAhead = 256;
   int32_t start[kSlabs];
   uint32_t* pixels[kSlabs];
   size_t count[kSlabs];
@@ -566,6 +572,7 @@ struct Slabs {
 #if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
       // The register form and a whole store: the memory form is several times slower on Intel
       // cores, and every slab has a vector to spare past its end.
+      PrefetchAhead<kSlabAhead>(pixels[k] + count[k]);
       hn::StoreU(VU{_mm512_maskz_compress_epi32(m.raw, p.raw)}, du, pixels[k] + count[k]);
       count[k] += hn::CountTrue(du, m);
 #else
@@ -587,6 +594,7 @@ struct Slabs {
         in[k] = hn::LoadMaskBits(du, bits);
         bits += kMaskBytes;
       }
+      PrefetchAhead<kSlabAhead>(pixels[k] + count[k]);
       result = hn::Or(result, ExpandLoad(in[k], pixels[k] + count[k]));
       count[k] += hn::CountTrue(du, in[k]);
     }
@@ -624,8 +632,11 @@ struct Band {
 // whole vectors, and its last partial vector through a zero-padded copy, in both passes alike,
 // so both meet the same pixels in the same order. kInPlace: `put` writes over its input.
 template <bool kInPlace>
-HWY_INLINE void SortAndPutBack(const Band* sort, Slabs& sorting, const Band* put, Slabs& putting,
-                               size_t width) {
+HWY_INLINE void SortAndPutBack(const Band* sort, Slabs& sortingOut, const Band* put,
+                               Slabs& puttingOut, size_t width) {
+  // On copies, whose counts stay in registers: kept in the caller's slabs, each count went to
+  // memory after every vector and its next update waited on that store (1.014 times as fast).
+  Slabs sorting = sortingOut, putting = puttingOut;
   const DU du;
   const size_t lanes = hn::Lanes(du);
   const size_t whole = width / lanes * lanes;
@@ -661,6 +672,8 @@ HWY_INLINE void SortAndPutBack(const Band* sort, Slabs& sorting, const Band* put
       }
     }
   }
+  sortingOut = sorting;
+  puttingOut = putting;
 }
 
 // The bands through the slabs, on the instruction sets that sort.
