@@ -635,7 +635,8 @@ template <bool kInPlace>
 HWY_INLINE void SortAndPutBack(const Band* sort, Slabs& sortingOut, const Band* put,
                                Slabs& puttingOut, size_t width) {
   // On copies, whose counts stay in registers: kept in the caller's slabs, each count went to
-  // memory after every vector and its next update waited on that store (1.014 times as fast).
+  // memory after every vector and its next update waited on that store (a 64-point frame of
+  // random pixels 1.014 times as fast).
   Slabs sorting = sortingOut, putting = puttingOut;
   const DU du;
   const size_t lanes = hn::Lanes(du);
