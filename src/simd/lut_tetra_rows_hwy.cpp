@@ -313,14 +313,6 @@ HWY_INLINE bool AllAtLeast(VF r, VF g, VF b, float least) {
 // (NaN is not), so one comparison a channel admits them all (a keyer's colours, many of them 0,
 // passed neither of the two tests below and went through both).
 HWY_INLINE bool Short(VF r, VF g, VF b) { return AllAtLeast(r, g, b, 0.0f); }
-
-HWY_INLINE VU ShortBytes(VF v) {
-  const DF df;
-  const VF c = hn::Min(v, hn::Set(df, 254.5f));
-  const __m512 sum =
-      _mm512_add_round_ps(c.raw, hn::Set(df, 0.5f).raw, _MM_FROUND_TO_ZERO | _MM_FROUND_NO_EXC);
-  return hn::BitCast(DU(), SmallToInt(VF{sum}));
-}
 #else
 // Rounded to nearest, the sum crosses an integer from 0 up only for the largest float below 0.5
 // (it rounds to 1). Above 0.5 the sum has at most one more bit than v, and lies less than 0.5
@@ -334,13 +326,19 @@ HWY_INLINE bool Short(VF r, VF g, VF b) {
   return AllAtLeast(r, g, b, 0.5f) ||
          hn::AllTrue(df, hn::And(plain(r), hn::And(plain(g), plain(b))));
 }
+#endif
 
 HWY_INLINE VU ShortBytes(VF v) {
   const DF df;
   const VF c = hn::Min(v, hn::Set(df, 254.5f));
-  return hn::BitCast(DU(), SmallToInt(hn::Add(c, hn::Set(df, 0.5f))));
-}
+#if HWY_ARCH_X86 && HWY_TARGET <= HWY_AVX3
+  const VF sum{
+      _mm512_add_round_ps(c.raw, hn::Set(df, 0.5f).raw, _MM_FROUND_TO_ZERO | _MM_FROUND_NO_EXC)};
+#else
+  const VF sum = hn::Add(c, hn::Set(df, 0.5f));
 #endif
+  return hn::BitCast(DU(), SmallToInt(sum));
+}
 
 // The second pass for one vector of pixels `p` whose first pass is at lane `at` of `prepared`.
 template <bool kGrey>
