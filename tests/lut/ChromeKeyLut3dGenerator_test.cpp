@@ -6,6 +6,7 @@
 #include <array>
 #include <cstdlib>
 #include <memory>
+#include <utility>
 #include <vector>
 
 #include "tessarofx/CubeLut.h"
@@ -64,13 +65,12 @@ int MaxDiff(Rgb a, Rgb b) {
   return d;
 }
 
-// Colours a keyer must never touch, whatever the screen: greys, skin, and hues far from both
-// screens used here.
-const Rgb kFarFromBoth[] = {{0, 0, 0},       {255, 255, 255}, {128, 128, 128}, {92, 60, 48},
-                            {198, 148, 122}, {234, 196, 176}, {214, 40, 40},   {230, 200, 30},
-                            {200, 60, 170},  {235, 130, 30},  {60, 38, 24},    {250, 170, 170}};
-
 TEST(ChromeKeyLut3dGenerator, KeysTheScreenAndLeavesWhatIsUnlikeItAlone) {
+  // Every grey, skin and hues far from both screens used here.
+  std::vector<Rgb> kept = {{92, 60, 48},   {198, 148, 122}, {234, 196, 176},
+                           {214, 40, 40},  {230, 200, 30},  {200, 60, 170},
+                           {235, 130, 30}, {60, 38, 24},    {250, 170, 170}};
+  for (int v = 0; v < 256; ++v) kept.push_back({v, v, v});
   for (Rgb screen : {kGreenScreen, kBlueScreen}) {
     SCOPED_TRACE(screen[2]);
     Tables t(Param(screen));
@@ -79,17 +79,12 @@ TEST(ChromeKeyLut3dGenerator, KeysTheScreenAndLeavesWhatIsUnlikeItAlone) {
     EXPECT_EQ(t.Alpha(Mix({0, 0, 0}, screen, 0.8)), 0);
     EXPECT_EQ(t.Alpha(Mix({0, 0, 0}, screen, 1.1)), 0);
     EXPECT_EQ(t.Alpha(Mix(screen, {255, 255, 255}, -0.1)), 0);
-    for (Rgb c : kFarFromBoth) {
-      EXPECT_EQ(t.Alpha(c), 255) << c[0] << "," << c[1] << "," << c[2];
-      EXPECT_LE(MaxDiff(t.Beauty(c), c), 1) << c[0] << "," << c[1] << "," << c[2];
-    }
-    for (int v = 0; v < 256; ++v) {
-      ASSERT_EQ(t.Alpha({v, v, v}), 255) << v;
-      ASSERT_LE(MaxDiff(t.Beauty({v, v, v}), {v, v, v}), 1) << v;
+    for (Rgb c : kept) {
+      ASSERT_EQ(t.Alpha(c), 255) << c[0] << "," << c[1] << "," << c[2];
+      ASSERT_LE(MaxDiff(t.Beauty(c), c), 1) << c[0] << "," << c[1] << "," << c[2];
     }
   }
-  // The lattice's red index is outermost: swapping red and blue of the blue screen gives an
-  // orange that must be kept.
+  // The red index is outermost: the blue screen with red and blue swapped is an orange to keep.
   EXPECT_EQ(Tables(Param(kBlueScreen)).Alpha({200, 60, 30}), 255);
 }
 
@@ -138,8 +133,7 @@ TEST(ChromeKeyLut3dGenerator, WindowsHueRangeAndAGreyScreenProtectColours) {
   EXPECT_EQ(high.Alpha(kGreenScreen), 255);
   EXPECT_EQ(high.Alpha(Mix({0, 0, 0}, kGreenScreen, 0.8)), 0);
 
-  // Saturated colours more than 70 degrees either side of the screen's hue are never keyed,
-  // those 25 and 35 degrees away are.
+  // Saturated hues over 70 degrees from the screen's are never keyed; 25 and 35 away are.
   Tables t(Param({0, 255, 0}));
   EXPECT_EQ(t.Alpha({255, 202, 0}), 255);  // hue 48
   EXPECT_EQ(t.Alpha({0, 195, 255}), 255);  // hue 194
@@ -154,30 +148,26 @@ TEST(ChromeKeyLut3dGenerator, WindowsHueRangeAndAGreyScreenProtectColours) {
   }
 }
 
-// At full strength no colour keeps the screen's hue: for a green screen green never ends above
-// both red and blue, for a blue screen blue never ends above both red and green.
+// At full strength no colour keeps the screen's cast: its channel never ends above both others.
 TEST(ChromeKeyLut3dGenerator, BeautyLeavesNoColourWithTheScreensCast) {
   std::vector<uint8_t> cube;  // every third level of each channel, as BGRA
-  for (int r = 0; r < 256; r += 3) {
-    for (int g = 0; g < 256; g += 3) {
-      for (int b = 0; b < 256; b += 3) {
-        cube.insert(cube.end(), {static_cast<uint8_t>(b), static_cast<uint8_t>(g),
-                                 static_cast<uint8_t>(r), 255});
-      }
-    }
+  for (int p = 0; p < 86 * 86 * 86; ++p) {
+    cube.insert(cube.end(),
+                {static_cast<uint8_t>(p % 86 * 3), static_cast<uint8_t>(p / 86 % 86 * 3),
+                 static_cast<uint8_t>(p / 86 / 86 * 3), 255});
   }
   const int pixels = static_cast<int>(cube.size() / 4);
-  std::vector<uint8_t> green = cube, blue = cube;
-  Tables(Param(kGreenScreen)).beauty->doLUT(green.data(), pixels, 1, pixels * 4, 4);
-  Tables(Param(kBlueScreen)).beauty->doLUT(blue.data(), pixels, 1, pixels * 4, 4);
-  int worstGreen = 0, worstBlue = 0;
-  for (size_t p = 0; p < cube.size(); p += 4) {
-    worstGreen = std::max(worstGreen, green[p + 1] - std::max(green[p + 2], green[p]));
-    worstBlue = std::max(worstBlue, blue[p] - std::max(blue[p + 2], blue[p + 1]));
+  for (const auto& [screen, cast] : {std::pair{kGreenScreen, 1}, std::pair{kBlueScreen, 0}}) {
+    std::vector<uint8_t> out = cube;
+    Tables(Param(screen)).beauty->doLUT(out.data(), pixels, 1, pixels * 4, 4);
+    int worst = 0;  // how far the screen's channel ends above both others
+    for (size_t p = 0; p < out.size(); p += 4) {
+      worst = std::max(worst,
+                       out[p + cast] - std::max(out[p + (cast + 1) % 3], out[p + (cast + 2) % 3]));
+    }
+    // Interpolation between lattice points leaves a few levels.
+    EXPECT_LE(worst, 3) << cast;
   }
-  // Interpolation between lattice points leaves a few levels.
-  EXPECT_LE(worstGreen, 3);
-  EXPECT_LE(worstBlue, 3);
 }
 
 TEST(ChromeKeyLut3dGenerator, SpillStrengthAndLuminanceRestore) {

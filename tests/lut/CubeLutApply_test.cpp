@@ -26,6 +26,11 @@ struct Lattice {
   std::unique_ptr<CubeLut> lut = std::make_unique<CubeLut>();
 
   explicit Lattice(int n) { lut->generateLUT3DData(n); }
+  // Random values a little beyond the byte range.
+  Lattice(int n, std::mt19937& rng) : Lattice(n) {
+    std::uniform_real_distribution<float> value(-20.0f, 280.0f);
+    Fill([&] { return value(rng); });
+  }
 
   float* Point(int i, int j, int k) { return tfx_test::LatticePoint(*lut, i, j, k); }
 
@@ -33,12 +38,9 @@ struct Lattice {
   template <class Value>
   void Fill(Value value, bool grey = false) {
     const int n = lut->getLutSize();
-    for (int i = 0; i < n; ++i) {
-      for (int j = 0; j < n; ++j) {
-        for (int k = 0; k < n; ++k) {
-          for (int c = 0; c < 3; ++c) Point(i, j, k)[c] = grey && c ? Point(i, j, k)[0] : value();
-        }
-      }
+    for (int p = 0; p < n * n * n; ++p) {
+      float* point = Point(p / n / n, p / n % n, p % n);
+      for (int c = 0; c < 3; ++c) point[c] = grey && c ? point[0] : value();
     }
   }
 
@@ -65,9 +67,8 @@ std::vector<float> EdgeValues() {
   return values;
 }
 
-// TetraRow and TetraRowReference on the same random rows of every width from 0 to 67 (every
-// tail of every vector size) and one long row, with guard bytes behind each row; odd widths go
-// from a copy of the row to the row, the others in place.
+// Random rows of every width to 67 (every tail of every vector size) and one long row, with guard
+// bytes behind; odd widths from a copy of the row, the others in place.
 void ExpectSameRows(const tfx::TetraTable& table, int bytesPerPixel, uint32_t salt) {
   tfx::TetraPlan plan;
   plan.Prepare(table);
@@ -81,20 +82,16 @@ void ExpectSameRows(const tfx::TetraTable& table, int bytesPerPixel, uint32_t sa
     tfx::TetraRowReference(table, expected.data(), pixels, bytesPerPixel);
     tfx::TetraRow(plan, width % 2 ? in.data() : actual.data(), actual.data(), pixels,
                   bytesPerPixel);
-    if (expected != actual) {
-      size_t i = 0;
-      while (expected[i] == actual[i]) ++i;
-      ADD_FAILURE() << "width " << pixels << ", " << bytesPerPixel << " bytes per pixel: byte " << i
-                    << " (pixel " << i / bytesPerPixel << ") is " << int{actual[i]} << ", expected "
-                    << int{expected[i]};
-      return;
-    }
+    const auto diff = std::mismatch(expected.begin(), expected.end(), actual.begin());
+    ASSERT_TRUE(diff.first == expected.end())
+        << "width " << pixels << ", " << bytesPerPixel << " bytes per pixel: byte "
+        << diff.first - expected.begin() << " is " << int{*diff.second} << ", expected "
+        << int{*diff.first};
   }
 }
 
-// Random lattices, and hostile ones: mostly ordinary values, so that some corners mix with an
-// edge value and some do not; each also grey, which takes the one-float-a-point rows. The hostile
-// ones also have fraction tables the rows cannot read as positions.
+// Hostile lattices hold some edge values among ordinary ones, so that only some corners mix with
+// one, and fractions the rows cannot read as positions; grey ones take the one-float-a-point rows.
 TEST(CubeLutApply, RandomAndHostileLatticesMatchTheReference) {
   const std::vector<float> edges = EdgeValues();
   for (const int n : {2, 3, 5, 17, 33, 64}) {
@@ -125,21 +122,16 @@ TEST(CubeLutApply, RandomAndHostileLatticesMatchTheReference) {
   }
 }
 
-// A lattice too large for the cache goes through whole images a slab of red cells at a time: two
-// bands (the second partial, sorted while the first is put back), rows whose width is no whole
-// number of vectors, a padded pitch, in place and from a separate image, with pixels all over
-// the lattice or all but the first of each row in its first slab (which also takes the zeros
-// that pad each row to whole vectors, so that it fills right up to the next slab's pixels), or a
-// smooth first band that goes row by row before the second goes through the slabs; and a rising
-// index table altered so that its slabs no longer hold whole bytes.
+// A lattice too large for the cache goes a slab of red cells at a time: two bands, ragged rows, a
+// padded pitch, in place and not; pixels all over the lattice, or all but each row's first in the
+// first slab (filling it, with the zeros padding rows to whole vectors, right up to the next), or
+// a smooth first band that goes row by row; and an index table whose slabs hold no whole bytes.
 TEST(CubeLutApply, ImagesThroughSlabsMatchTheReference) {
   constexpr int kWidth = 1001, kHeight = 1100, kPitch = kWidth * 4 + 12;
   for (const int n : {50, 64, 63}) {
     const bool firstSlab = n == 50, smoothFirstBand = n == 63;
-    Lattice lattice(n);
     std::mt19937 rng(static_cast<uint32_t>(n));
-    std::uniform_real_distribution<float> value(-20.0f, 280.0f);
-    lattice.Fill([&] { return value(rng); });
+    Lattice lattice(n, rng);
     std::vector<uint8_t> source(static_cast<size_t>(kPitch) * kHeight);
     for (size_t i = 0; i < source.size(); ++i) {
       const uint32_t v = rng();
@@ -148,14 +140,9 @@ TEST(CubeLutApply, ImagesThroughSlabsMatchTheReference) {
       source[i] = static_cast<uint8_t>(firstSlab && red ? (first ? 70 + v % 60 : v % 60) : v);
       if (smoothFirstBand && y < 1000) source[i] = static_cast<uint8_t>(i % 4 ? x / 8 : y / 8);
     }
-    std::vector<uint8_t> expected = source;
+    std::vector<uint8_t> expected = source;  // the padding between rows stays the caller's
     for (int y = 0; y < kHeight; ++y) {
       tfx::TetraRowReference(lattice.Table(), expected.data() + y * kPitch, kWidth, 4);
-    }
-    // The padding between rows is the caller's and stays as it was.
-    for (int y = 0; y < kHeight; ++y) {
-      std::memcpy(expected.data() + y * kPitch + kWidth * 4,
-                  source.data() + y * kPitch + kWidth * 4, kPitch - kWidth * 4);
     }
     // Both layouts of a point, each read by every instruction set.
     tfx::TetraPlan plan;
@@ -181,24 +168,11 @@ TEST(CubeLutApply, ImagesThroughSlabsMatchTheReference) {
   EXPECT_EQ(plan.Slabs(), 1);
 }
 
-// The positions doLUT builds must come from the two multiplies at every size: a size left
-// without them falls back to gathers, whose bytes are the same but which cost the most.
-TEST(CubeLutApply, EverySizeFindsItsPositionsByMultiplying) {
-  for (int n = 2; n <= 64; ++n) {
-    Lattice lattice(n);
-    tfx::TetraPlan plan;
-    plan.Prepare(lattice.Table());
-    EXPECT_NE(plan.Scale(0), 0.0f) << n;
-  }
-}
-
-// With N = 52 every multiple of 5 falls on a lattice point and gives C000 weight 1 and the other
-// corners weight 0. Those corners have an odd index, so keeping odd points at 0 lets every even
-// point's value reach the byte conversion unmixed, NaN and infinities included.
+// At N = 52 every multiple of 5 is a lattice point; the corners that weigh 0 have odd indices and
+// hold 0, so each even point's value reaches the byte conversion unmixed, NaN and inf included.
 TEST(CubeLutApply, LatticePointsConvertLikeTheScalarHelper) {
   const float inf = std::numeric_limits<float>::infinity();
-  // First a whole vector of values from 0 up, every other one the float below 0.5, which the
-  // float sum v + 0.5f would round up to 1.
+  // First a whole vector from 0 up with the float below 0.5 between, which v + 0.5f rounds to 1.
   std::vector<float> values;
   for (int i = 0; i < 48; ++i) values.push_back(i % 2 ? std::nextafter(0.5f, 0.0f) : i * 0.25f);
   const std::vector<float> edges = EdgeValues();
@@ -239,59 +213,42 @@ TEST(CubeLutApply, LatticePointsConvertLikeTheScalarHelper) {
   ForEveryTarget([&] {
     std::vector<uint8_t> actual = row;
     tfx::TetraRow(plan, actual.data(), actual.data(), static_cast<int>(actual.size() / 4), 4);
-    int failures = 0;
-    for (size_t p = 0; p < actual.size() && failures < 10; p += 4) {
-      for (int c = 0; c < 3; ++c) {
-        if (actual[p + 2 - c] == expected[p + 2 - c]) continue;
-        ++failures;
-        ADD_FAILURE() << "value " << values[p / 4 * 3 + c] << " gives " << int{actual[p + 2 - c]}
-                      << ", expected " << int{expected[p + 2 - c]};
-      }
-    }
-    EXPECT_TRUE(std::equal(expected.begin(), expected.end(), actual.begin()));
+    const auto diff = std::mismatch(expected.begin(), expected.end(), actual.begin());
+    const size_t p = static_cast<size_t>(diff.first - expected.begin());
+    EXPECT_TRUE(diff.first == expected.end())
+        << "value " << (p % 4 < 3 ? values[p / 4 * 3 + 2 - p % 4] : 0.0f) << " gives "
+        << int{*diff.second} << ", expected " << int{*diff.first};
   });
 }
 
 TEST(CubeLutApply, EveryColourMatchesTheReference) {
-  Lattice lattice(33);
   std::mt19937 rng(33);
-  std::uniform_real_distribution<float> value(-20.0f, 280.0f);
-  lattice.Fill([&] { return value(rng); });
-  const CxImage& colours = tfx_test::EveryColour();
+  Lattice lattice(33, rng);
   tfx::TetraPlan plan;
   plan.Prepare(lattice.Table());
-  const auto apply = [&](bool reference) {
-    tfx_test::Image image = tfx_test::Clone(colours);
-    for (unsigned y = 0; y < image->GetHeight(); ++y) {
-      uint8_t* row = image->GetBits() + size_t{y} * image->GetEffWidth();
-      const int width = static_cast<int>(image->GetWidth());
-      if (reference) {
-        tfx::TetraRowReference(lattice.Table(), row, width, 4);
-      } else {
-        tfx::TetraRow(plan, row, row, width, 4);
-      }
-    }
-    return image;
-  };
-  const tfx_test::Image expected = apply(true);
-  ForEveryTarget([&] { EXPECT_TRUE(tfx_test::SameBuffer(*expected, *apply(false))); });
+  // The colours' rows are unpadded, so that the whole image is one row.
+  const CxImage& colours = tfx_test::EveryColour();
+  ASSERT_EQ(colours.GetEffWidth(), colours.GetWidth() * 4);
+  const int pixels = static_cast<int>(colours.GetWidth() * colours.GetHeight());
+  const tfx_test::Image expected = tfx_test::Clone(colours);
+  tfx::TetraRowReference(lattice.Table(), expected->GetBits(), pixels, 4);
+  ForEveryTarget([&] {
+    const tfx_test::Image actual = tfx_test::Clone(colours);
+    tfx::TetraRow(plan, actual->GetBits(), actual->GetBits(), pixels, 4);
+    EXPECT_TRUE(tfx_test::SameBuffer(*expected, *actual));
+  });
 }
 
-// The interpolation a caller resamples with is the one doLUT applies: on a lattice of 18 points
-// (a cell of exactly 15 levels), every byte position, rounded as doLUT rounds, gives doLUT's
-// bytes; positions outside the lattice are clamped onto it.
+// A caller resamples with the interpolation doLUT applies: at 18 points (cells of exactly 15
+// levels) every byte position gives doLUT's bytes; positions outside are clamped onto the lattice.
 TEST(CubeLutApply, InterpolationOfAnySizeMatchesTheReference) {
   constexpr int n = 18;
-  Lattice lattice(n);
   std::mt19937 rng(18);
-  std::uniform_real_distribution<float> value(-20.0f, 280.0f);
-  lattice.Fill([&] { return value(rng); });
-  std::vector<float> dense;
-  for (int i = 0; i < n; ++i) {
-    for (int j = 0; j < n; ++j) {
-      for (int k = 0; k < n; ++k)
-        dense.insert(dense.end(), lattice.Point(i, j, k), lattice.Point(i, j, k) + 3);
-    }
+  Lattice lattice(n, rng);
+  std::vector<float> dense;  // the n^3 points without the lattice's 64-point strides
+  for (int p = 0; p < n * n; ++p) {
+    dense.insert(dense.end(), lattice.Point(p / n, p % n, 0),
+                 lattice.Point(p / n, p % n, 0) + 3 * n);
   }
   const tfx::TetraTable table = lattice.Table();
   for (int r = 0; r < 256; r += 3) {
@@ -301,9 +258,9 @@ TEST(CubeLutApply, InterpolationOfAnySizeMatchesTheReference) {
         tfx::TetraRowReference(table, pixel, 1, 3);
         float out[3];
         CubeLut::interpolate(dense.data(), n, r / 15.0f, g / 15.0f, b / 15.0f, out);
-        ASSERT_EQ(tfx::LutComponentToByte(out[0]), pixel[2]) << r << " " << g << " " << b;
-        ASSERT_EQ(tfx::LutComponentToByte(out[1]), pixel[1]);
-        ASSERT_EQ(tfx::LutComponentToByte(out[2]), pixel[0]);
+        for (int c = 0; c < 3; ++c) {
+          ASSERT_EQ(tfx::LutComponentToByte(out[c]), pixel[2 - c]) << r << " " << g << " " << b;
+        }
       }
     }
   }

@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <array>
 #include <cstdio>
 #include <cstdlib>
 #include <fstream>
@@ -59,8 +60,7 @@ void ExpectBounded(const CubeLut& lut) {
   EXPECT_EQ(bytes, 8 * n * ((n + 7) / 8) * n * 3);
 }
 
-// Sample values of data row r: sixteenths for ".CUBE" (exact as text and as floats), twelve-bit
-// integers for ".3DL".
+// Data row r: sixteenths for ".CUBE" (exact as text and as floats), 12-bit integers for ".3DL".
 float Sixteenth(int r, int c) { return static_cast<float>((r * 3 + c * 5) % 17) / 16.0f; }
 int Twelve(int r, int c) { return ((r * 3 + c) * 151) % 4096; }
 
@@ -86,20 +86,31 @@ const std::string kCubeHeader =
 const std::string kCube = kCubeHeader + Rows(2, false);
 const std::string kDl = "3DMESH\nMesh 0 12\n0 2047 4095\n" + Rows(3, true);
 
-// ".CUBE" rows run red fastest, ".3DL" rows blue fastest; a cube's values scale by the domain's
-// width, a 3dl's 4095 is full scale.
+// Data row r of a read: ".CUBE" rows run red fastest, ".3DL" rows blue fastest.
+const float* Row(CubeLut& lut, bool dl, int r) {
+  const int n = lut.getLutSize(), a = r / n / n, b = r / n % n, c = r % n;
+  return dl ? Point(lut, a, b, c) : Point(lut, c, b, a);
+}
+
+// A file's value as stored: a cube's scaled by the domain's width, a 3dl's 4095 is full scale.
+float Stored(float value, bool dl, float width = 1.0f) {
+  return dl ? value / 4095.0f * 255.0f : value * (width * 255.0f);
+}
+
 void ExpectSample(CubeLut& lut, int n, bool dl, float width = 1.0f) {
   ASSERT_EQ(lut.getLutSize(), n);
-  for (int i = 0; i < n; ++i) {
-    for (int j = 0; j < n; ++j) {
-      for (int k = 0; k < n; ++k) {
-        for (int c = 0; c < 3; ++c) {
-          const int r = dl ? (i * n + j) * n + k : (k * n + j) * n + i;
-          const float want = dl ? static_cast<float>(Twelve(r, c)) / 4095.0f * 255.0f
-                                : Sixteenth(r, c) * (width * 255.0f);
-          ASSERT_EQ(Point(lut, i, j, k)[c], want) << i << j << k << c;
-        }
-      }
+  for (int r = 0; r < n * n * n; ++r) {
+    for (int c = 0; c < 3; ++c) {
+      const float value = dl ? static_cast<float>(Twelve(r, c)) : Sixteenth(r, c);
+      ASSERT_EQ(Row(lut, dl, r)[c], Stored(value, dl, width)) << r << c;
+    }
+  }
+}
+
+void ExpectFirstRows(CubeLut& lut, bool dl, const std::vector<std::array<float, 3>>& rows) {
+  for (size_t r = 0; r < rows.size(); ++r) {
+    for (int c = 0; c < 3; ++c) {
+      EXPECT_EQ(Row(lut, dl, static_cast<int>(r))[c], Stored(rows[r][c], dl)) << r << c;
     }
   }
 }
@@ -138,46 +149,43 @@ void ExpectStatuses(const std::vector<Mutation>& cases, const char* file, bool d
     }
     if (m.status != 0) continue;
     ExpectSample(*lut, dl ? 3 : 2, dl);
-    if (!dl) {
-      EXPECT_STREQ(lut->getTitle(), "Sample");
-    }
+    EXPECT_STREQ(lut->getTitle(), dl ? "" : "Sample");
   }
 }
 
 TEST(CubeLutFile, CubeStatuses) {
+  const auto cube = [](const std::string& from, const std::string& to) {
+    return Replace(kCube, from, to);
+  };
   const std::string truncated = WithoutLastLine(kCube);
-  const std::string unterminated = kCube.substr(0, kCube.size() - 1);
+  const std::string max110 = cube("DOMAIN_MAX 1.0 1.0 1.0", "DOMAIN_MAX 1 1 0");
   ExpectStatuses(
       {
           {"valid", kCube, 0, 14},
           {"CR-LF", ReplaceAll(kCube, "\n", "\r\n"), 0, 14},
           {"CR-LF, bare CR lines", ReplaceAll(kCube, "\n", "\r\n\r\n"), 0, 27},
           {"CR only", ReplaceAll(kCube, "\n", "\r"), 0, 14},
-          {"last line unterminated", unterminated, 0, 14},
+          {"last line unterminated", kCube.substr(0, kCube.size() - 1), 0, 14},
           {"junk after the table", kCube + "junk\n\x01\xff\n", 0, 14},
-          {"two titles", Replace(kCube, "TITLE \"Sample\"\n", "TITLE \"Sample\"\nTITLE \"B\"\n"),
-           20, 3},
-          {"1-D size", Replace(kCube, "LUT_3D_SIZE 2\n", "LUT_1D_SIZE 2\nLUT_3D_SIZE 2\n"), 20, 5},
-          {"input range", Replace(kCube, "\n\n", "\nLUT_3D_INPUT_RANGE 0 1\n\n"), 20, 6},
-          {"repeated size", Replace(kCube, "LUT_3D_SIZE 2\n", "LUT_3D_SIZE 2\nLUT_3D_SIZE 2\n"), 20,
-           6},
-          {"blank line of spaces", Replace(kCube, "\n\n", "\n   \n"), 20, 6},
-          {"size 1", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE 1"), 23, 5},
-          {"size 65", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE 65"), 23, 5},
-          {"size 257", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE 257"), 23, 5},
-          {"no size", Replace(kCube, "LUT_3D_SIZE 2\n", ""), 23, 6},
-          {"size not a number", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE two"), 10, 5},
-          {"size past int", Replace(kCube, "LUT_3D_SIZE 2", "LUT_3D_SIZE 4294967298"), 10, 5},
-          {"max 1 1 0", Replace(kCube, "DOMAIN_MAX 1.0 1.0 1.0", "DOMAIN_MAX 1 1 0"), 22, 7},
-          {"max 1 1 0, CR-LF",
-           ReplaceAll(Replace(kCube, "DOMAIN_MAX 1.0 1.0 1.0", "DOMAIN_MAX 1 1 0"), "\n", "\r\n"),
-           22, 7},
-          {"max equal to min", Replace(kCube, "DOMAIN_MIN 0.0 0.0 0.0", "DOMAIN_MIN 0 1 0"), 22, 7},
-          {"two domain values", Replace(kCube, "DOMAIN_MIN 0.0 0.0 0.0", "DOMAIN_MIN 0 0"), 10, 3},
-          {"domain past float", Replace(kCube, "DOMAIN_MAX 1.0", "DOMAIN_MAX 1e39"), 10, 4},
-          {"title without quote", Replace(kCube, "TITLE \"Sample\"", "TITLE Sample"), 21, 2},
-          {"title alone", Replace(kCube, "TITLE \"Sample\"", "TITLE"), 10, 2},
-          {"title quote alone", Replace(kCube, "TITLE \"Sample\"", "TITLE \""), 10, 2},
+          {"two titles", cube("TITLE \"Sample\"\n", "TITLE \"Sample\"\nTITLE \"B\"\n"), 20, 3},
+          {"1-D size", cube("LUT_3D_SIZE 2\n", "LUT_1D_SIZE 2\nLUT_3D_SIZE 2\n"), 20, 5},
+          {"input range", cube("\n\n", "\nLUT_3D_INPUT_RANGE 0 1\n\n"), 20, 6},
+          {"repeated size", cube("LUT_3D_SIZE 2\n", "LUT_3D_SIZE 2\nLUT_3D_SIZE 2\n"), 20, 6},
+          {"blank line of spaces", cube("\n\n", "\n   \n"), 20, 6},
+          {"size 1", cube("LUT_3D_SIZE 2", "LUT_3D_SIZE 1"), 23, 5},
+          {"size 65", cube("LUT_3D_SIZE 2", "LUT_3D_SIZE 65"), 23, 5},
+          {"size 257", cube("LUT_3D_SIZE 2", "LUT_3D_SIZE 257"), 23, 5},
+          {"no size", cube("LUT_3D_SIZE 2\n", ""), 23, 6},
+          {"size not a number", cube("LUT_3D_SIZE 2", "LUT_3D_SIZE two"), 10, 5},
+          {"size past int", cube("LUT_3D_SIZE 2", "LUT_3D_SIZE 4294967298"), 10, 5},
+          {"max 1 1 0", max110, 22, 7},
+          {"max 1 1 0, CR-LF", ReplaceAll(max110, "\n", "\r\n"), 22, 7},
+          {"max equal to min", cube("DOMAIN_MIN 0.0 0.0 0.0", "DOMAIN_MIN 0 1 0"), 22, 7},
+          {"two domain values", cube("DOMAIN_MIN 0.0 0.0 0.0", "DOMAIN_MIN 0 0"), 10, 3},
+          {"domain past float", cube("DOMAIN_MAX 1.0", "DOMAIN_MAX 1e39"), 10, 4},
+          {"title without quote", cube("TITLE \"Sample\"", "TITLE Sample"), 21, 2},
+          {"title alone", cube("TITLE \"Sample\"", "TITLE"), 10, 2},
+          {"title quote alone", cube("TITLE \"Sample\"", "TITLE \""), 10, 2},
           {"truncated, terminated", truncated, 10, 13},
           {"truncated, unterminated", truncated.substr(0, truncated.size() - 1), 12, 13},
           {"number past float", truncated + "1e39 0 0\n", 24, 14},
@@ -194,6 +202,7 @@ TEST(CubeLutFile, CubeStatuses) {
 }
 
 TEST(CubeLutFile, DlStatuses) {
+  const auto dl = [](const std::string& to) { return Replace(kDl, "0 2047 4095", to); };
   const std::string truncated = WithoutLastLine(kDl);
   std::string range65 = "0";
   for (int i = 1; i < 65; ++i) range65 += " " + std::to_string(i);
@@ -204,10 +213,10 @@ TEST(CubeLutFile, DlStatuses) {
           {"CR only", ReplaceAll(kDl, "\n", "\r"), 0, 30},
           {"text and keywords skipped", "# note\nsome words\n+ alone\nMesh 4 12\n" + kDl, 0, 34},
           {"last line unterminated", kDl.substr(0, kDl.size() - 1), 0, 30},
-          {"range with trailing space", Replace(kDl, "0 2047 4095", "0 2047 4095 "), 10, 30},
-          {"range with double space", Replace(kDl, "0 2047 4095", "0  2047 4095"), 10, 30},
-          {"range of two", Replace(kDl, "0 2047 4095", "0 4095"), 24, 3},
-          {"range of 65", Replace(kDl, "0 2047 4095", range65), 23, 3},
+          {"range with trailing space", dl("0 2047 4095 "), 10, 30},
+          {"range with double space", dl("0  2047 4095"), 10, 30},
+          {"range of two", dl("0 4095"), 24, 3},
+          {"range of 65", dl(range65), 23, 3},
           {"blank header line", Replace(kDl, "3DMESH\n", "3DMESH\n  \n"), 10, 2},
           {"truncated, terminated", truncated, 10, 29},
           {"truncated, unterminated", truncated.substr(0, truncated.size() - 1), 12, 29},
@@ -219,42 +228,18 @@ TEST(CubeLutFile, DlStatuses) {
       "case.3dl", true);
 }
 
-// Tables above the lattice's 64 points are read whole, in lattice order and with the domain's
-// scale; 257 points are too many even for them, and the message names that limit and quotes the
-// line safely.
-TEST(CubeLutFile, LatticeReaderTakesEverySizeTheFormatAllowsAndStopsQuoteTheLine) {
-  constexpr int n = 65;
-  std::string text = "DOMAIN_MAX 2 2 2\nLUT_3D_SIZE 65\n";
-  for (int r = 0; r < n * n * n; ++r) {
-    char row[64];
-    std::snprintf(row, sizeof row, "%g %g %g\n", r % n / 64.0, r / n % n / 64.0, r / n / n / 64.0);
-    text += row;
-  }
+// Status 23 names the limit of the reader that gave it; the quoted line is escaped and cut.
+TEST(CubeLutFile, StopMessagesNameTheReadersLimitAndQuoteTheLineSafely) {
   TempDir dir;
-  std::ifstream in(dir.Write("big.cube", text), std::ios::binary);
+  std::ifstream tooBig(dir.Write("257.cube", "# big\nLUT_3D_SIZE 257\n"), std::ios::binary);
   std::vector<float> points;
-  int size = 0;
+  int size = -1;
   CubeLut::Stop stop;
-  ASSERT_EQ(CubeLut::loadCubeLattice(in, &points, &size, &stop), 0);
-  ASSERT_EQ(size, n);
-  EXPECT_EQ(stop.line, 2 + n * n * n);
-  for (const int i : {0, 1, 17, 64}) {
-    for (const int k : {0, 3, 64}) {
-      const float* p = &points[((static_cast<size_t>(i) * n + 5) * n + k) * 3];
-      EXPECT_EQ(p[0], static_cast<float>(i) / 64.0f * 510.0f);
-      EXPECT_EQ(p[1], 5.0f / 64.0f * 510.0f);
-      EXPECT_EQ(p[2], static_cast<float>(k) / 64.0f * 510.0f);
-    }
-  }
-
-  std::ifstream tooBig(dir.Write("257.cube", Replace(text, "SIZE 65", "SIZE 257")),
-                       std::ios::binary);
   EXPECT_EQ(CubeLut::loadCubeLattice(tooBig, &points, &size, &stop), 23);
   EXPECT_EQ(size, 0);
   EXPECT_EQ(CubeLut::stopMessage("257.cube", stop),
             "257.cube, line 2 (\"LUT_3D_SIZE 257\"): status 23, the size is missing or outside "
             "2..256");
-  // The line is quoted with its quotes, backslashes and controls escaped, cut at 48 characters.
   stop.status = 20;
   stop.line = 7;
   stop.text = "TITLE \"a\\b\"\t" + std::string(49, 'x');
@@ -271,57 +256,24 @@ TEST(CubeLutFile, LatticeReaderTakesEverySizeTheFormatAllowsAndStopsQuoteTheLine
 
 TEST(CubeLutFile, ValuesScaleAndShortRowsKeepTheRowBefore) {
   TempDir dir;
-  // The domain's width scales, its minimum is not subtracted.
+  // The domain's width scales, its minimum is not subtracted; the next read starts afresh.
   const auto lut =
       Load(dir, "narrow.cube", Replace(kCube, "DOMAIN_MIN 0.0 0.0 0.0", "DOMAIN_MIN 0.5 0.5 0.5"));
-  ASSERT_EQ(lut->getStatus(), 0);
   ExpectSample(*lut, 2, false, 0.5f);
-  float lo[3], hi[3];
-  lut->getDomain(lo, hi);
-  EXPECT_EQ(lo[1], 0.5f);
-  EXPECT_EQ(hi[1], 1.0f);
-  // The next read starts from the default domain again.
   ASSERT_TRUE(lut->loadFile(Wide(dir.Write("plain.cube", kCube)).c_str()));
-  lut->getDomain(lo, hi);
-  EXPECT_EQ(lo[0], 0.0f);
   ExpectSample(*lut, 2, false);
 
   // A short row keeps the components it lacks from the row before; the first row from 0.
-  ASSERT_TRUE(lut->loadFile(Wide(dir.Write("short.cube", kCubeHeader +
-                                                             "0.5\n0.25 0.75\n1e20 -1e20 0\n"
-                                                             "99999999999999999999 1 1\n" +
-                                                             Rows(2, false)))
-                                .c_str()));
-  const float expected[4][3] = {{0.5f, 0, 0}, {0.25f, 0.75f, 0}, {1e20f, -1e20f, 0}, {1e20f, 1, 1}};
-  const int at[4][3] = {{0, 0, 0}, {1, 0, 0}, {0, 1, 0}, {1, 1, 0}};
-  for (int r = 0; r < 4; ++r) {
-    for (int c = 0; c < 3; ++c) {
-      EXPECT_EQ(Point(*lut, at[r][0], at[r][1], at[r][2])[c], expected[r][c] * 255.0f) << r << c;
-    }
-  }
-
-  // A ".3DL" file's trailing blank is one more lattice point, whatever the data holds.
-  EXPECT_EQ(Load(dir, "a.3dl", Replace(kDl, "0 2047 4095", "0 2047 4095 "))->getLutSize(), 4);
-
-  // Seventeen range values make N = 17, and 4095 is full scale whatever the range's top.
-  const std::string range17 = "0 64 128 192 256 320 384 448 512 576 640 704 768 832 896 960 1023\n";
-  ExpectSample(*Load(dir, "17.3dl", range17 + Rows(17, true)), 17, true);
-  const auto full =
-      Load(dir, "full.3dl", range17 + WithoutLastLine(Rows(17, true)) + "4095 4095 4095");
-  ASSERT_EQ(full->getStatus(), 0);
-  for (int c = 0; c < 3; ++c) EXPECT_EQ(Point(*full, 16, 16, 16)[c], 255.0f);
-
-  // A lone number keeps the other two components of the row before, on the first row 0.
+  const std::string shortRows = "0.5\n0.25 0.75\n1e20 -1e20 0\n99999999999999999999 1 1\n";
+  ASSERT_TRUE(lut->loadFile(
+      Wide(dir.Write("short.cube", kCubeHeader + shortRows + Rows(2, false))).c_str()));
+  ExpectFirstRows(*lut, false,
+                  {{0.5f, 0, 0}, {0.25f, 0.75f, 0}, {1e20f, -1e20f, 0}, {1e20f, 1, 1}});
   const auto dl = Load(dir, "white.3dl",
                        "0 1 2\n2047\n4095 4095 4095\n1e30 -1e30 1e20\n2047\n" + Rows(3, true));
   ASSERT_EQ(dl->getStatus(), 0);
-  const float dlExpected[4][3] = {
-      {2047, 0, 0}, {4095, 4095, 4095}, {1e30f, -1e30f, 1e20f}, {2047, -1e30f, 1e20f}};
-  for (int r = 0; r < 4; ++r) {
-    for (int c = 0; c < 3; ++c) {
-      EXPECT_EQ(Point(*dl, 0, r / 3, r % 3)[c], dlExpected[r][c] / 4095.0f * 255.0f) << r << c;
-    }
-  }
+  ExpectFirstRows(
+      *dl, true, {{2047, 0, 0}, {4095, 4095, 4095}, {1e30f, -1e30f, 1e20f}, {2047, -1e30f, 1e20f}});
 }
 
 TEST(CubeLutFile, FailedReadsKeepWhatTheyReadAndTheRowTableTakesTheFirstRowsUnscaled) {
@@ -340,7 +292,7 @@ TEST(CubeLutFile, FailedReadsKeepWhatTheyReadAndTheRowTableTakesTheFirstRowsUnsc
   EXPECT_EQ(Point(*lut, 1, 0, 0)[1], 0.0f);
   ExpectBounded(*lut);
 
-  // A row table takes the first rows as the file gives them.
+  // A row table takes the first rows as the file gives them, and the lattice none.
   lut->setRowTable(new float[CubeLut::kMaxSize][3]());
   const std::string narrow = Replace(kCube, "DOMAIN_MIN 0.0 0.0 0.0", "DOMAIN_MIN 0.5 0.5 0.5");
   ASSERT_TRUE(lut->loadFile(Wide(dir.Write("rows.cube", narrow)).c_str()));
@@ -350,8 +302,8 @@ TEST(CubeLutFile, FailedReadsKeepWhatTheyReadAndTheRowTableTakesTheFirstRowsUnsc
   EXPECT_EQ(lut->getRowTable()[2][0], 0.0f);
   EXPECT_EQ(Point(*lut, 1, 0, 0)[0], 0.0f);
 
-  const std::string shortRow = Replace(kCube, "\n\n", "\n\n0.5 0.25\n");
-  EXPECT_FALSE(lut->loadFile(Wide(dir.Write("short.cube", shortRow)).c_str()));
+  EXPECT_FALSE(lut->loadFile(
+      Wide(dir.Write("short.cube", Replace(kCube, "\n\n", "\n\n0.5 0.25\n"))).c_str()));
   EXPECT_EQ(lut->getStatus(), 24);
   EXPECT_EQ(lut->getRowTable()[0][1], 0.25f);
   EXPECT_EQ(lut->getRowTable()[0][2], 0.0f);
@@ -379,7 +331,6 @@ TEST(CubeLutFile, ExtensionPicksTheReaderAndWidePathsBecomeUtf8) {
   const auto lut = std::make_unique<CubeLut>();
   EXPECT_FALSE(lut->loadFile(nullptr));
   EXPECT_FALSE(lut->loadFile(Wide(dir.path + "/missing.cube").c_str()));
-  // The wrong reader fails on the other format.
   EXPECT_FALSE(lut->loadFile(Wide(dir.Write("swapped.3dl", kCube)).c_str()));
 
   dir.Write("F\xC3\xA4rg \xE3\x82\xB0\xF0\x9F\x98\x80.Cube", kCube);
@@ -388,6 +339,7 @@ TEST(CubeLutFile, ExtensionPicksTheReaderAndWidePathsBecomeUtf8) {
   dir.Write("grade.\xD1\x81ube", kCube);
   EXPECT_FALSE(lut->loadFile((Wide(dir.path) + L"/grade.\u0441ube").c_str()));
 
+  // The path stops before a character that would not fit whole, and nothing is written past it.
   const auto convert = [](const std::wstring& wide) {
     std::vector<char> out(tfx::kLutPathBufferBytes, 0);
     tfx::WideToUtf8Path(wide, out.data());
@@ -395,8 +347,6 @@ TEST(CubeLutFile, ExtensionPicksTheReaderAndWidePathsBecomeUtf8) {
         std::all_of(out.begin() + tfx::kLutPathMaxBytes, out.end(), [](char c) { return c == 0; }));
     return std::string(out.data());
   };
-  // The characters are encoded as the host's UTF-8 tests check; the path stops before one that
-  // would not fit whole.
   EXPECT_EQ(convert(std::wstring(2045, L'a') + L"\u00e9").size(), 2047u);
   EXPECT_EQ(convert(std::wstring(2046, L'a') + L"\u00e9").size(), 2046u);
   EXPECT_EQ(convert(std::wstring(2044, L'a') + L"\U0001F600").size(), 2044u);
@@ -424,8 +374,7 @@ TEST(CubeLutFile, WriterHeaderRowsAndRoundTrip) {
   lut->generateLUT3DData(2);
   const std::string path = dir.path + "/out.cube";
   ASSERT_TRUE(lut->writeLUT3D2File(path.c_str()));
-  // Red fastest, and the generated lattice divides by 31: row r is (r & 1, r & 2, r & 4) steps
-  // of 255/31.
+  // Red fastest; the generated lattice's points are steps of 255/31.
   const std::string z = "0.00000000", s = convertFloat2String(255.0f / 31.0f / 255.0f);
   std::string rows;
   for (int r = 0; r < 8; ++r) {
@@ -433,8 +382,7 @@ TEST(CubeLutFile, WriterHeaderRowsAndRoundTrip) {
   }
   EXPECT_EQ(tfx_test::ReadFile(path), header + rows);
 
-  const auto empty = std::make_unique<CubeLut>();
-  ASSERT_TRUE(empty->writeLUT3D2File(path.c_str()));
+  ASSERT_TRUE(std::make_unique<CubeLut>()->writeLUT3D2File(path.c_str()));
   EXPECT_EQ(tfx_test::ReadFile(path), Replace(header, "LUT_3D_SIZE 2", "LUT_3D_SIZE 0"));
 
   testing::internal::CaptureStdout();
@@ -449,24 +397,19 @@ TEST(CubeLutFile, WriterHeaderRowsAndRoundTrip) {
   std::uniform_real_distribution<float> value(0.0f, 255.0f);
   for (const int n : {17, 64}) {
     SCOPED_TRACE(n);
-    const auto outOwned = std::make_unique<CubeLut>();
-    CubeLut& out = *outOwned;
-    const auto inOwned = std::make_unique<CubeLut>();
-    CubeLut& in = *inOwned;
-    out.generateLUT3DData(n);
+    const auto out = std::make_unique<CubeLut>(), in = std::make_unique<CubeLut>();
+    out->generateLUT3DData(n);
     const auto at = [n](CubeLut& l, int p) {
       return &Point(l, p / 3 / n / n, p / 3 / n % n, p / 3 % n)[p % 3];
     };
-    for (int p = 0; p < n * n * n * 3; ++p) *at(out, p) = value(random);
+    for (int p = 0; p < n * n * n * 3; ++p) *at(*out, p) = value(random);
     const std::string round = dir.path + "/round" + std::to_string(n) + ".cube";
-    ASSERT_TRUE(out.writeLUT3D2File(round.c_str()));
-    ASSERT_TRUE(in.loadFile(Wide(round).c_str()));
-    ASSERT_EQ(in.getLutSize(), n);
+    ASSERT_TRUE(out->writeLUT3D2File(round.c_str()));
+    ASSERT_TRUE(in->loadFile(Wide(round).c_str()));
+    ASSERT_EQ(in->getLutSize(), n);
     for (int p = 0; p < n * n * n * 3; ++p) {
-      const float written = *at(out, p) / 255.0f;
-      const float text = std::strtof(convertFloat2String(written).c_str(), nullptr);
-      ASSERT_EQ(*at(in, p), text * 255.0f) << p;
-      ASSERT_NEAR(*at(in, p) / 255.0f, written, 1.5e-7) << p;
+      const float text = std::strtof(convertFloat2String(*at(*out, p) / 255.0f).c_str(), nullptr);
+      ASSERT_EQ(*at(*in, p), text * 255.0f) << p;
     }
   }
 }

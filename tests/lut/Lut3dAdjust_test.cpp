@@ -4,7 +4,7 @@
 
 #include <gtest/gtest.h>
 
-#include <cmath>
+#include <algorithm>
 #include <cstdint>
 #include <cstring>
 #include <functional>
@@ -24,42 +24,15 @@ constexpr int kN = 32;
 
 float* Point(CubeLut* lut, int i, int j, int k) { return tfx_test::LatticePoint(*lut, i, j, k); }
 
-// The identity of size 32 with its points on whole levels (reset() truncates i * 255 / 31), so
-// that an image form, which only takes bytes, can be given exactly each point's colour.
-std::unique_ptr<CubeLut> WholeLevelIdentity() {
-  auto lut = std::make_unique<CubeLut>();
-  lut->generateLUT3DData(kN);
-  lut->reset();
-  return lut;
-}
-
-// One BGRA pixel per lattice point, in the lattice's i, j, k order.
-std::vector<uint8_t> PointColours(CubeLut* lut) {
-  std::vector<uint8_t> pixels;
-  for (int i = 0; i < kN; ++i) {
-    for (int j = 0; j < kN; ++j) {
-      for (int k = 0; k < kN; ++k) {
-        const float* p = Point(lut, i, j, k);
-        pixels.insert(pixels.end(), {static_cast<uint8_t>(p[2]), static_cast<uint8_t>(p[1]),
-                                     static_cast<uint8_t>(p[0]), 255});
-      }
-    }
-  }
-  return pixels;
-}
-
 struct Twin {
   const char* name;
   std::function<void(CxImage*, float)> image;
   std::function<CubeLut*(CubeLut*, float)> lattice;
   std::vector<float> strengths;
-  // How far above the image form's byte the twin's value may lie, and how far below; above 1,
-  // below 0 means "the image value is the twin's value truncated".
-  float above;
-  float below;
-  // The share of channels allowed beyond those bounds, where the image form has no stable
-  // value to compare with.
-  double share = 0;
+  // How far the twin's value may lie above and below the image form's byte; (1, 0) means the
+  // image value is the twin's value truncated.
+  float above, below;
+  double share = 0;  // of channels allowed beyond those bounds
 };
 
 void TemperatureImage(CxImage* image, float t) {
@@ -71,9 +44,20 @@ CubeLut* TemperatureLattice(CubeLut* lut, float t) {
 }
 
 std::vector<Twin> Twins() {
-  // Strengths cover both signs, each operation's limits and, for contrast, the clamped
-  // stretch (184 and up) with its jump at 127.
+  // Both signs and each limit; for contrast the clamped stretch (184 up) with its jump at 127.
   const std::vector<float> common = {-100, -37.5f, -1, 1, 45, 100};
+  // The effect's balance for a = temperature / 200, b = tint / 200.
+  const auto balance = [](CxImage* image, float a) {
+    cv::Mat m(static_cast<int>(image->GetHeight()), static_cast<int>(image->GetWidth()), CV_8UC4,
+              image->GetBits());
+    AdjustWhiteBalance().Process(m, m, ColorGain{1, 1, 1}, a, 0.25f);
+  };
+  const auto balanceLattice = [](CubeLut* lut, float a) {
+    return lut3d_adjustWhiteBalance(lut, a, 0.25f);
+  };
+  // Temperature's blend weight is at most 1 for t from 7735 to 13365; beyond, it extrapolates.
+  const std::vector<float> blending = {7800, 9000, 11499, 11501, 13300},
+                           past = {2000, 14000, 30000};
   return {
       {"exposure", exposureAdjustment, lut3d_exposureAdjustment, {-100, -20, 0.5f, 20, 100}, 1, 0},
       {"brightness", brightnessAdjustment, lut3d_brightnessAdjustment, common, 1, 0},
@@ -83,52 +67,33 @@ std::vector<Twin> Twins() {
       {"shadow", hdrShadow, lut3d_hdrShadow, common, 1, 0},
       {"white level", hdrWhiteLevel, lut3d_hdrWhiteLevel, common, 1, 0},
       {"black level", hdrBlackLevel, lut3d_hdrBlackLevel, common, 1, 0},
-      // The effect's balance for a = temperature / 200, b = tint / 200.
-      {"balance (a)",
-       [](CxImage* image, float a) {
-         cv::Mat m(static_cast<int>(image->GetHeight()), static_cast<int>(image->GetWidth()),
-                   CV_8UC4, image->GetBits());
-         AdjustWhiteBalance().Process(m, m, ColorGain{1, 1, 1}, a, 0.25f);
-       },
-       [](CubeLut* lut, float a) { return lut3d_adjustWhiteBalance(lut, a, 0.25f); },
-       {-0.5f, 0, 0.2f, 0.5f},
-       1,
-       0},
-      // The image form floors the lightness (half a level) and its mask luma, truncates the
-      // weight k (so k may be up to 2 lower) and floors the result: 1 + 127.5 * 2 / 256 +
-      // 0.5 * 205 / 256 above, the lightness term below.
+      {"balance (a)", balance, balanceLattice, {-0.5f, 0, 0.2f, 0.5f}, 1, 0},
+      // The image form floors the lightness, mask luma, weight (up to 2 lower) and result:
+      // 1 + 127.5 * 2 / 256 + 0.5 * 205 / 256 above, the lightness term below.
       {"vibrance", vibranceAdjustment, lut3d_vibranceAdjustment, common, 2.4f, 1},
-      // The image form floors the luma Y and the shift (Y * k) >> 8, |k| <= 39 here:
-      // 1 + 39 / 256 above, 39 / 256 below.
+      // The image form floors the luma and the shift (Y * k) >> 8, |k| <= 39 here: 39 / 256.
       {"tint", tintAdjustment, lut3d_tintAdjustment, common, 1.16f, 0.16f},
-      // The image form truncates the tinted channel and the blend, rounds hue and saturation to
-      // bytes (1.41 degrees, 1/255) and truncates each output: at full chroma a hue step alone
-      // is 255 * 1.41 / 60 = 6 levels. Bounded while the blend weight is at most 1 (t from
-      // 7735 to 13365).
-      {"temperature",
-       TemperatureImage,
-       TemperatureLattice,
-       {7800, 9000, 11499, 11501, 13300},
-       10,
-       10},
-      // Beyond that the blend extrapolates and can crush a colour to within a level of black,
-      // where HSL saturation is undefined: one level in the image form's blend turns a result
-      // grey that the twin keeps coloured. Only the share of such channels is bounded.
-      {"temperature, extrapolating",
-       TemperatureImage,
-       TemperatureLattice,
-       {2000, 14000, 30000},
-       8,
-       8,
-       0.02}};
+      // Hue and saturation go through bytes: a hue step (1.41 degrees) is 6 levels at full chroma.
+      {"temperature", TemperatureImage, TemperatureLattice, blending, 10, 10},
+      // Extrapolating, the blend can crush a colour to within a level of black, where one level
+      // turns the image form's result grey: only the share of such channels is bounded.
+      {"temperature, extrapolating", TemperatureImage, TemperatureLattice, past, 8, 8, 0.02}};
 }
 
 TEST(Lut3dAdjust, AgreesWithTheImageFormOnEveryPointOfAWholeLevelLattice) {
   for (const Twin& twin : Twins()) {
     for (float strength : twin.strengths) {
       SCOPED_TRACE(std::string(twin.name) + " " + std::to_string(strength));
-      auto lut = WholeLevelIdentity();
-      std::vector<uint8_t> pixels = PointColours(lut.get());
+      // reset() puts the points on whole levels, so that the image form gets each exactly.
+      auto lut = std::make_unique<CubeLut>();
+      lut->generateLUT3DData(kN);
+      lut->reset();
+      std::vector<uint8_t> pixels;  // one BGRA pixel per point, in i, j, k order
+      for (int p = 0; p < kN * kN * kN; ++p) {
+        const float* v = Point(lut.get(), p / kN / kN, p / kN % kN, p % kN);
+        pixels.insert(pixels.end(), {static_cast<uint8_t>(v[2]), static_cast<uint8_t>(v[1]),
+                                     static_cast<uint8_t>(v[0]), 255});
+      }
       uint8_t* bits = pixels.data();
       CxImage image(&bits, kN * kN, kN, 32, kN * kN * 4, IPF_BGRA);
       twin.image(&image, strength);
@@ -136,21 +101,17 @@ TEST(Lut3dAdjust, AgreesWithTheImageFormOnEveryPointOfAWholeLevelLattice) {
       EXPECT_TRUE(tfx_test::AtlasMatches(*lut));  // the atlas kept in step with the lattice
 
       float worstAbove = 0, worstBelow = 0;
-      size_t at = 0, beyond = 0;
-      for (int i = 0; i < kN; ++i) {
-        for (int j = 0; j < kN; ++j) {
-          for (int k = 0; k < kN; ++k, at += 4) {
-            const float* p = Point(lut.get(), i, j, k);
-            for (int c = 0; c < 3; ++c) {
-              const float diff = p[c] - static_cast<float>(pixels[at + 2 - c]);
-              if (twin.share > 0 && (diff > twin.above || -diff > twin.below)) {
-                ++beyond;
-                continue;
-              }
-              worstAbove = std::max(worstAbove, diff);
-              worstBelow = std::max(worstBelow, -diff);
-            }
+      size_t beyond = 0;
+      for (int p = 0; p < kN * kN * kN; ++p) {
+        const float* v = Point(lut.get(), p / kN / kN, p / kN % kN, p % kN);
+        for (int c = 0; c < 3; ++c) {
+          const float diff = v[c] - static_cast<float>(pixels[p * 4 + 2 - c]);
+          if (twin.share > 0 && (diff > twin.above || -diff > twin.below)) {
+            ++beyond;
+            continue;
           }
+          worstAbove = std::max(worstAbove, diff);
+          worstBelow = std::max(worstBelow, -diff);
         }
       }
       EXPECT_LE(static_cast<double>(beyond), twin.share * kN * kN * kN * 3);
@@ -177,23 +138,13 @@ TEST(Lut3dAdjust, NeutralStrengthNullAndEmptyLutsChangeNothing) {
                            [twin, strength](CubeLut* l) { return twin.lattice(l, strength); });
     }
   }
-  // Points outside 0..255, which a clamping formula would move even at strength 0.
+  // Points outside 0..255 (the generated lattice reaches 520), which a clamping formula would
+  // move even at strength 0.
   auto lut = std::make_unique<CubeLut>();
-  lut->generateLUT3DData(17);
-  Point(lut.get(), 16, 16, 16)[0] = 300.0f;
+  lut->generateLUT3DData(64);
   Point(lut.get(), 3, 0, 5)[2] = -7.5f;
-  // Only the 17^3 points: the rest of the 64-point lattice is never written.
-  const auto points = [&] {
-    std::vector<float> all;
-    for (int i = 0; i < 17; ++i) {
-      for (int j = 0; j < 17; ++j) {
-        const float* row = Point(lut.get(), i, j, 0);
-        all.insert(all.end(), row, row + 17 * 3);
-      }
-    }
-    return all;
-  };
-  const std::vector<float> lattice = points();
+  const float* points = lut->getLut3DData(nullptr, nullptr, nullptr, nullptr);
+  const std::vector<float> lattice(points, points + 64 * 64 * 64 * 3);
   int atlasBytes = 0;
   const uint8_t* atlas = lut->getAtlasData(&atlasBytes);
   const std::vector<uint8_t> atlasBefore(atlas, atlas + atlasBytes);
@@ -202,7 +153,7 @@ TEST(Lut3dAdjust, NeutralStrengthNullAndEmptyLutsChangeNothing) {
   for (const auto& [name, call] : neutral) {
     SCOPED_TRACE(name);
     EXPECT_EQ(call(lut.get()), lut.get());
-    EXPECT_EQ(std::memcmp(lattice.data(), points().data(), lattice.size() * sizeof(float)), 0);
+    EXPECT_EQ(std::memcmp(lattice.data(), points, lattice.size() * sizeof(float)), 0);
     EXPECT_EQ(std::memcmp(atlasBefore.data(), lut->getAtlasData(nullptr), atlasBefore.size()), 0);
     EXPECT_EQ(call(nullptr), nullptr);
     EXPECT_EQ(call(empty.get()), empty.get());
