@@ -8,10 +8,8 @@
 #include <cmath>
 #include <cstdint>
 #include <cstring>
-#include <functional>
 #include <limits>
 #include <string>
-#include <tuple>
 #include <vector>
 
 #include "adjust/ColorAdjustRows.h"
@@ -28,10 +26,7 @@ using tfx_test::NoiseImage;
 using tfx_test::SameBuffer;
 using tfx_test::SameResult;
 
-// Plain per-pixel versions of the colour adjustments, written from the formulas alone and run
-// through GetPixelColor/SetPixelColor, for the fast paths to be compared against. They share no
-// code with the library beyond CxImage.
-
+// Per-pixel references written from the formulas alone, sharing no code with the library.
 template <class Fn>
 void EveryPixel(CxImage* image, Fn fn) {
   tfx_test::MapPixels(image, [&](tagRGBQUAD c) {
@@ -50,20 +45,14 @@ void ReferenceExposure(CxImage* image, float e) {
   if (e == 0) return;
   const float gain = static_cast<float>(std::pow(2.0, e / 50.0 * 0.6));
   EveryPixel(image, [&](uint8_t* const* ch) {
-    for (int i = 0; i < 3; ++i) {
-      *ch[i] = static_cast<uint8_t>(static_cast<int>(std::min(255.0f, *ch[i] * gain)));
-    }
+    for (int i = 0; i < 3; ++i) *ch[i] = FloorAndCap(*ch[i] * gain);
   });
 }
 
 void ReferenceBrightness(CxImage* image, float b) {
   if (b == 0) return;
-  float k;
-  if (b > 0) {
-    k = b / 100.0f + 1.0f;
-  } else {
-    k = static_cast<float>((1.0 / (b / 253.0 + 0.99) - 1.0) * (-255.0) * 0.6);
-  }
+  const float k = b > 0 ? b / 100.0f + 1.0f
+                        : static_cast<float>((1.0 / (b / 253.0 + 0.99) - 1.0) * (-255.0) * 0.6);
   uint8_t* p = image->GetBits();
   const size_t step = image->GetBpp() / 8;
   for (size_t i = 0; i < size_t{image->GetWidth()} * image->GetHeight(); ++i, p += step) {
@@ -74,11 +63,10 @@ void ReferenceBrightness(CxImage* image, float b) {
 void ReferenceContrast(CxImage* image, float c) {
   if (c == 0) return;
   const float t = c > 0 ? 1.0f / (1.0f - c / 255.0f) - 1.0f : c / 255.0f;
-  // Outside int's range (t is infinite at c = 255) the conversion gives INT_MIN, as the x86
-  // truncating instruction does.
+  // Outside int's range (t is infinite at c = 255) x86 truncation gives INT_MIN.
   const float scaled = t * 100.0f * 0.5f;
   int lo = scaled >= -2147483648.0f && scaled < 2147483648.0f ? static_cast<int>(scaled) : INT_MIN;
-  int hi = 0;  // 255 minus the unclamped lo is not used once lo is clamped below
+  int hi = 0;
   if (255 - int64_t{lo} < lo) {
     lo = 120;
     hi = 127;
@@ -91,15 +79,10 @@ void ReferenceContrast(CxImage* image, float c) {
   EveryPixel(image, [&](uint8_t* const* ch) {
     for (int i = 0; i < 3; ++i) {
       const int v = *ch[i];
-      if (lo < 1) {
-        *ch[i] = static_cast<uint8_t>(v * d / 255 - lo);
-      } else if (v <= lo) {
-        *ch[i] = 0;
-      } else if (v > hi) {
-        *ch[i] = 255;
-      } else {
-        *ch[i] = static_cast<uint8_t>((v - lo) * 255 / d);
-      }
+      *ch[i] = static_cast<uint8_t>(lo < 1    ? v * d / 255 - lo
+                                    : v <= lo ? 0
+                                    : v > hi  ? 255
+                                              : (v - lo) * 255 / d);
     }
   });
 }
@@ -128,21 +111,12 @@ void ReferenceSaturation(CxImage* image, float s) {
     const int mx = std::max({*ch[0], *ch[1], *ch[2]});
     const int mn = std::min({*ch[0], *ch[1], *ch[2]});
     if (mx == mn) return;
-    const float sum = (mx + mn) / 255.0f;
-    const float l = sum / 2;
-    const float delta = (mx - mn) / 255.0f;
-    const float lv = l * 255;
+    const float sum = (mx + mn) / 255.0f, l = sum / 2, delta = (mx - mn) / 255.0f, lv = l * 255;
+    const float sat = l < 0.5f ? delta / sum : delta / (2 - sum);
+    const float a = sat + sigma >= 1 ? 1 / sat - 1 : 1 / (1 - sigma) - 1;
     for (int i = 0; i < 3; ++i) {
       const float c = *ch[i];
-      float out;
-      if (sigma >= 0) {
-        const float sat = l < 0.5f ? delta / sum : delta / (2 - sum);
-        const float a = sat + sigma >= 1 ? 1 / sat - 1 : 1 / (1 - sigma) - 1;
-        out = c + (c - lv) * a;
-      } else {
-        out = lv + (c - lv) * (1 + sigma);
-      }
-      *ch[i] = FloorAndCap(out);
+      *ch[i] = FloorAndCap(sigma >= 0 ? c + (c - lv) * a : lv + (c - lv) * (1 + sigma));
     }
   });
 }
@@ -152,40 +126,45 @@ struct Operation {
   CxImage* (*fast)(CxImage*, float, const tfx::ColorAdjustRows&);
   CxImage* (*exported)(CxImage*, float);
   void (*reference)(CxImage*, float);
-  float typical;  // for the tests that sweep layouts rather than strengths
-  // Both signs, the extremes and the points where the formulas change branch. Contrast 1 gives
-  // lo = 0 (compression with d = 255), 100 a stretch, 183 lo = 127 with d = 1, 184 the clamped
-  // lo (120, d = 15), -255 lo = -50; t infinite (255) or negative (300) puts lo below -127,
-  // where it becomes -120. The smallest darkening, -0.01, is already 1.55 levels.
+  float typical;  // for the sweeps over layouts
+  // Both signs, the extremes and every branch point. Contrast 1 gives lo = 0, 183 lo = 127 with
+  // d = 1, 184 the clamped lo (120, d = 15), -255 lo = -50; 255 (t infinite) and 300 (t < 0) put
+  // lo below -127. Brightness -0.01 already darkens by 1.55 levels.
   std::vector<float> sweep;
 };
 
-const Operation kExposure = {"Exposure", tfx::ExposureAdjust, exposureAdjustment, ReferenceExposure,
-                             70.0f,      {50, -50, 100, -100}};
-const Operation kBrightness = {"Brightness",
-                               tfx::BrightnessAdjust,
-                               brightnessAdjustment,
-                               ReferenceBrightness,
-                               -37.0f,
-                               {100, 33.3f, -0.5f, -0.01f, -100}};
-const Operation kContrast = {"Contrast",
-                             tfx::ContrastAdjust,
-                             contrastAdjustment,
-                             ReferenceContrast,
-                             61.0f,
-                             {1, 100, 183, 184, -60, -255, 255, 300}};
-const Operation kVibrance = {"Vibrance", tfx::VibranceAdjust, vibranceAdjustment, ReferenceVibrance,
-                             70.0f,      {100, 37, -100}};
-const Operation kSaturation = {
-    "Saturation", tfx::SaturationAdjust, saturationAdjustment, ReferenceSaturation,
-    45.0f,        {100, 50, -50, -100}};
-const Operation* const kOperations[] = {&kExposure, &kBrightness, &kContrast, &kVibrance,
-                                        &kSaturation};
+const Operation kOperations[] = {
+    {"Exposure",
+     tfx::ExposureAdjust,
+     exposureAdjustment,
+     ReferenceExposure,
+     70,
+     {50, -50, 100, -100}},
+    {"Brightness",
+     tfx::BrightnessAdjust,
+     brightnessAdjustment,
+     ReferenceBrightness,
+     -37,
+     {100, 33.3f, -0.5f, -0.01f, -100}},
+    {"Contrast",
+     tfx::ContrastAdjust,
+     contrastAdjustment,
+     ReferenceContrast,
+     61,
+     {1, 100, 183, 184, -60, -255, 255, 300}},
+    {"Vibrance", tfx::VibranceAdjust, vibranceAdjustment, ReferenceVibrance, 70, {100, 37, -100}},
+    {"Saturation",
+     tfx::SaturationAdjust,
+     saturationAdjustment,
+     ReferenceSaturation,
+     45,
+     {100, 50, -50, -100}}};
+const Operation* const kBrightness = &kOperations[1];
 
-class AllColours : public testing::TestWithParam<const Operation*> {};
+class AllColours : public testing::TestWithParam<Operation> {};
 
 TEST_P(AllColours, MatchesReferenceOnEveryKernelSet) {
-  const Operation& op = *GetParam();
+  const Operation& op = GetParam();
   for (const float strength : op.sweep) {
     const Image expected = Clone(EveryColour());
     op.reference(expected.get(), strength);
@@ -200,15 +179,12 @@ TEST_P(AllColours, MatchesReferenceOnEveryKernelSet) {
 }
 
 INSTANTIATE_TEST_SUITE_P(ColorAdjust, AllColours, testing::ValuesIn(kOperations),
-                         [](const testing::TestParamInfo<const Operation*>& p) {
-                           return std::string(p.param->name);
-                         });
+                         [](const testing::TestParamInfo<Operation>& p) { return p.param.name; });
 
 TEST(ColorAdjustPlan, OnePassEqualsTheFiveOperationsInTurn) {
-  // Every colour, on every kernel set. The settings cover both saturation forms, a vibrance that
-  // lowers, the clamped contrast ramp, and a saturation far past -100 whose results overshoot
-  // both ends beyond the int32 range. A vibrance whose products wrap and a NaN
-  // saturation must not fuse; they run the kernels tested above one after the other.
+  // Both saturation forms, a lowering vibrance, the clamped contrast ramp, and a saturation so far
+  // past -100 that results overshoot the int32 range. Wrapping vibrance products and a NaN
+  // saturation must not fuse: they run the kernels tested above in turn.
   const struct {
     float e, b, c, v, s;
   } cases[] = {{20, 15, 30, 40, 25}, {0, 0, 0, -100, -60}, {-40, -3, 184, 100, 100},
@@ -222,12 +198,10 @@ TEST(ColorAdjustPlan, OnePassEqualsTheFiveOperationsInTurn) {
     ReferenceVibrance(expected.get(), c.v);
     ReferenceSaturation(expected.get(), c.s);
     tfx_test::ForEveryTarget([&] {
-      const tfx::ColorAdjustRows* const rows = &tfx::BestColorAdjustRows();
       SCOPED_TRACE(testing::Message()
                    << c.e << ' ' << c.b << ' ' << c.c << ' ' << c.v << ' ' << c.s);
-      const tfx::ColorAdjustPlan plan(c.e, c.b, c.c, c.v, c.s, *rows);
+      const tfx::ColorAdjustPlan plan(c.e, c.b, c.c, c.v, c.s, tfx::BestColorAdjustRows());
       EXPECT_TRUE(plan.Fused());
-      // From the source into another image, as the effect runs it.
       const Image actual = Clone(EveryColour());
       plan.ApplyInto(actual->GetBits(), EveryColour().GetBits(),
                      size_t{actual->GetWidth()} * actual->GetHeight());
@@ -248,16 +222,13 @@ TEST(ColorAdjustPlan, OnePassEqualsTheFiveOperationsInTurn) {
 
 tagRGBQUAD VibranceByPixel(tagRGBQUAD c, float strength) {
   const unsigned char luma = calLuma(c);
-  const auto mask = static_cast<unsigned char>(-calLuma(calMask(c, luma)));
-  return mixLumaAndColor(c, luma, mask, strength);
+  return mixLumaAndColor(c, luma, static_cast<unsigned char>(-calLuma(calMask(c, luma))), strength);
 }
 
 TEST(ColorAdjustRows, MatchThePerPixelFormsAtExtremeStrengths) {
-  // Far outside what the operations pass, where the reference's ints would overflow: the kernels
-  // switch to their wrap-around and NaN-safe forms around the thresholds below, and must still
-  // give the bytes of the per-pixel forms. Greys, then (v, (v + 128) / 2, 128), whose middle
-  // channel can meet l * 255 exactly, which an infinite gain turns into NaN, then noise; 4101
-  // pixels leave a tail on every vector width.
+  // Far past what the operations pass, where the kernels switch to wrap-around and NaN-safe
+  // forms. Greys, then (v, v / 2 + 64, 128), whose middle channel can meet l * 255 exactly (NaN
+  // under an infinite gain), then noise; 4101 pixels leave a tail on every vector width.
   constexpr float kInf = std::numeric_limits<float>::infinity();
   constexpr float kNan = std::numeric_limits<float>::quiet_NaN();
   std::vector<uint8_t> noise = NoiseBytes(4101 * 4, 77);
@@ -267,124 +238,97 @@ TEST(ColorAdjustRows, MatchThePerPixelFormsAtExtremeStrengths) {
     std::memcpy(&noise[4 * v], grey, 3);
     std::memcpy(&noise[4 * (256 + v)], steps, 3);
   }
-  const float strengths[] = {16448.0f, 16449.0f, -16449.0f, 8.5e6f, -8.5e6f,
-                             1e30f,    kInf,     -kInf,     kNan};
-  const float sigmas[] = {1.0f, 0.999f, 2.0f, 1e30f, kInf, -1e30f, -3.4e38f, -kInf, kNan};
-  const auto check = [&](const char* label, float strength, auto kernel, auto by_pixel) {
+  const auto check = [&](float strength, auto kernel, auto byPixel) {
     std::vector<uint8_t> expected = noise;
     for (size_t i = 0; i < expected.size(); i += 4) {
       tagRGBQUAD c;
       std::memcpy(&c, &expected[i], 4);
-      c = by_pixel(c, strength);
+      c = byPixel(c, strength);
       std::memcpy(&expected[i], &c, 4);
     }
     tfx_test::ForEveryTarget([&] {
-      const tfx::ColorAdjustRows* const rows = &tfx::BestColorAdjustRows();
-      SCOPED_TRACE(testing::Message() << label << ' ' << strength);
+      SCOPED_TRACE(strength);
       std::vector<uint8_t> actual = noise;
-      (rows->*kernel)(actual.data(), actual.size() / 4, strength);
+      (tfx::BestColorAdjustRows().*kernel)(actual.data(), actual.size() / 4, strength);
       ASSERT_EQ(actual, expected);
     });
   };
-  for (const float strength : strengths) {
-    check("vibrance", strength, &tfx::ColorAdjustRows::vibrance, VibranceByPixel);
+  for (const float strength :
+       {16448.0f, 16449.0f, -16449.0f, 8.5e6f, -8.5e6f, 1e30f, kInf, -kInf, kNan}) {
+    check(strength, &tfx::ColorAdjustRows::vibrance, VibranceByPixel);
   }
-  for (const float sigma : sigmas) {
-    check("saturation", sigma, &tfx::ColorAdjustRows::saturation, calNewColor);
+  for (const float sigma : {1.0f, 0.999f, 2.0f, 1e30f, kInf, -1e30f, -3.4e38f, -kInf, kNan}) {
+    check(sigma, &tfx::ColorAdjustRows::saturation, calNewColor);
   }
 }
 
-// The table and gain kernels against their byte forms, on every tail length, into another buffer
-// (whose bytes past the pixels stay) and in place. Random tables, unlike the monotonic curves of
-// the operations, catch a lookup that only works for ordered entries; gains of every sign and
-// size, NaN included, each on its own channel.
+// Every tail length, into another buffer (whose bytes past the pixels stay) and in place. Random
+// tables catch a lookup that only works for ordered entries; gains of every sign and size, NaN
+// included, each on its own channel.
 TEST(ColorAdjustRows, TableAndGainKernelsMatchTheirByteForms) {
-  using Kernel = std::function<void(const tfx::ColorAdjustRows&, uint8_t*, const uint8_t*, size_t)>;
-  using Pixel = std::function<void(uint8_t*)>;  // the three colour bytes of one pixel
-  std::vector<std::tuple<std::string, Kernel, Pixel>> cases;
-  constexpr float kNan = std::numeric_limits<float>::quiet_NaN();
-  const auto byte = [](float v) -> uint8_t {
-    if (v < 0.0f) return 0;
-    return static_cast<uint8_t>(static_cast<int>(v < 255.0f ? v : 255.0f));
-  };
-  for (const std::array<float, 3> gain : {std::array<float, 3>{0.5f, 1.5f, 1.0f},
-                                          {2.0f, 0.0f, -0.25f},
-                                          {1.2345f, 0.9876f, 3e9f},
-                                          {kNan, -kNan, std::numeric_limits<float>::infinity()}}) {
-    cases.emplace_back(
-        "gain " + std::to_string(gain[0]),
-        [gain](const auto& rows, uint8_t* dst, const uint8_t* src, size_t n) {
-          rows.scaleChannels(dst, src, n, gain.data());
-        },
-        [gain, byte](uint8_t* p) {
-          for (int c = 0; c < 3; ++c) p[c] = byte(static_cast<float>(p[c]) * gain[c]);
-        });
-  }
-  for (uint32_t salt = 1; salt <= 4; ++salt) {
-    const std::vector<uint8_t> table = NoiseBytes(256, salt);
-    cases.emplace_back(
-        "table " + std::to_string(salt),
-        [table](const auto& rows, uint8_t* dst, const uint8_t* src, size_t n) {
-          rows.applyTable(dst, src, n, table.data());
-        },
-        [table](uint8_t* p) {
-          for (int c = 0; c < 3; ++c) p[c] = table[p[c]];
-        });
-  }
-  // The brightest table looks up in the row of the largest channel.
-  const std::vector<uint8_t> rowsTable = NoiseBytes(tfx::kBrightestTableBytes, 3);
-  cases.emplace_back(
-      "brightest table",
-      [&](const auto& rows, uint8_t* dst, const uint8_t* src, size_t n) {
-        rows.brightestTable(dst, src, n, rowsTable.data());
-      },
-      [&](uint8_t* p) {
-        const uint8_t* row = &rowsTable[256 * std::max({p[0], p[1], p[2]})];
-        for (int c = 0; c < 3; ++c) p[c] = row[p[c]];
-      });
-  tfx_test::ForEveryTarget([&] {
-    const tfx::ColorAdjustRows* const rows = &tfx::BestColorAdjustRows();
-    for (const auto& [name, kernel, pixel] : cases) {
+  const auto check = [](auto kernel, const auto* argument, auto pixel) {
+    tfx_test::ForEveryTarget([&] {
       for (size_t count : {0, 1, 7, 8, 15, 16, 17, 33, 300, 4099}) {
-        SCOPED_TRACE(testing::Message() << name << " count " << count);
+        SCOPED_TRACE(count);
         std::vector<uint8_t> src = NoiseBytes(count * 4 + 8, uint32_t(count)), expected = src;
         for (size_t i = 0; i < count; ++i) pixel(&expected[4 * i]);
         std::vector<uint8_t> apart = NoiseBytes(src.size(), 77), expectedApart = apart;
         std::copy_n(expected.begin(), 4 * count, expectedApart.begin());
-        kernel(*rows, apart.data(), src.data(), count);
+        const tfx::ColorAdjustRows& rows = tfx::BestColorAdjustRows();
+        (rows.*kernel)(apart.data(), src.data(), count, argument);
         ASSERT_EQ(apart, expectedApart);
-        kernel(*rows, src.data(), src.data(), count);
+        (rows.*kernel)(src.data(), src.data(), count, argument);
         ASSERT_EQ(src, expected);
       }
-    }
+    });
+  };
+  constexpr float kNan = std::numeric_limits<float>::quiet_NaN();
+  for (const std::array<float, 3> gain : {std::array<float, 3>{0.5f, 1.5f, 1.0f},
+                                          {2.0f, 0.0f, -0.25f},
+                                          {1.2345f, 0.9876f, 3e9f},
+                                          {kNan, -kNan, std::numeric_limits<float>::infinity()}}) {
+    SCOPED_TRACE(testing::Message() << "gain " << gain[0] << ' ' << gain[1] << ' ' << gain[2]);
+    check(&tfx::ColorAdjustRows::scaleChannels, gain.data(), [&](uint8_t* p) {
+      for (int c = 0; c < 3; ++c) p[c] = FloorAndCap(static_cast<float>(p[c]) * gain[c]);
+    });
+  }
+  for (uint32_t salt = 1; salt <= 4; ++salt) {
+    SCOPED_TRACE(testing::Message() << "table " << salt);
+    const std::vector<uint8_t> table = NoiseBytes(256, salt);
+    check(&tfx::ColorAdjustRows::applyTable, table.data(), [&](uint8_t* p) {
+      for (int c = 0; c < 3; ++c) p[c] = table[p[c]];
+    });
+  }
+  // The brightest table looks up in the row of the largest channel.
+  const std::vector<uint8_t> rowsTable = NoiseBytes(tfx::kBrightestTableBytes, 3);
+  check(&tfx::ColorAdjustRows::brightestTable, rowsTable.data(), [&](uint8_t* p) {
+    const uint8_t* row = &rowsTable[256 * std::max({p[0], p[1], p[2]})];
+    for (int c = 0; c < 3; ++c) p[c] = row[p[c]];
   });
 }
 
 TEST(ColorAdjust, MatchesReferenceForEveryLayoutWidthAndPaddedStride) {
-  // Widths around every vector size exercise the tails. Padding must stay untouched by all but
-  // brightness, whose walk ignores rows (and the reference walks the same way). Other layouts
-  // take the accessors through the exported functions.
-  for (const Operation* op : kOperations) {
+  // Widths around every vector size; padding stays untouched except by brightness, whose walk
+  // ignores rows (as its reference does). Other layouts go through the exported functions.
+  for (const Operation& op : kOperations) {
     tfx_test::ForEveryTarget([&] {
-      const tfx::ColorAdjustRows* const rows = &tfx::BestColorAdjustRows();
       for (unsigned width = 1; width <= 40; ++width) {
         for (unsigned pad : {0u, 12u}) {
-          SCOPED_TRACE(testing::Message() << op->name << " width " << width << " padding " << pad);
+          SCOPED_TRACE(testing::Message() << op.name << " width " << width << " padding " << pad);
           ASSERT_TRUE(SameResult(
               *NoiseImage(width, 3, 32, IPF_BGRA, width * 4 + pad, width),
-              [&](CxImage* i) { op->fast(i, op->typical, *rows); },
-              [&](CxImage* i) { op->reference(i, op->typical); }));
+              [&](CxImage* i) { op.fast(i, op.typical, tfx::BestColorAdjustRows()); },
+              [&](CxImage* i) { op.reference(i, op.typical); }));
         }
       }
     });
     for (const tfx_test::Layout& layout : tfx_test::kLayouts) {
-      // Narrow pixels give brightness overlapping windows; see the walk test below.
-      if (op == &kBrightness && layout.bpp < 24) continue;
-      SCOPED_TRACE(testing::Message() << op->name << ' ' << layout.bpp << " bpp " << layout.format);
+      if (&op == kBrightness && layout.bpp < 24) continue;  // overlapping windows, tested below
+      SCOPED_TRACE(testing::Message() << op.name << ' ' << layout.bpp << " bpp " << layout.format);
       EXPECT_TRUE(SameResult(
           *NoiseImage(layout, 13, 5, 12, 9),
-          [&](CxImage* i) { EXPECT_EQ(op->exported(i, op->typical), i); },
-          [&](CxImage* i) { op->reference(i, op->typical); }));
+          [&](CxImage* i) { EXPECT_EQ(op.exported(i, op.typical), i); },
+          [&](CxImage* i) { op.reference(i, op.typical); }));
     }
   }
 }
@@ -407,17 +351,14 @@ TEST(ColorAdjust, ToneAdjustEqualsTheThreeCurvesInTurn) {
   }
 }
 
-TEST(ColorAdjust, BrightnessGivesOneBytePixelsOverlappingWindowsInsideTheBuffer) {
-  // Three bytes for each pixel: the windows overlap, and stop at the buffer's end instead of
-  // running past it.
+TEST(ColorAdjust, OnePixelFormsAndNarrowBrightnessKeepTheirLimits) {
+  // Brightness on one-byte pixels: three-byte windows overlap and stop at the buffer's end.
   std::vector<uint8_t> grey(4, 10);
   uint8_t* bits = grey.data();
   CxImage narrow(&bits, 4, 1, 8, 4, IPF_Gray8);
   brightnessAdjustment(&narrow, 100.0f);
   EXPECT_EQ(grey, (std::vector<uint8_t>{20, 40, 80, 80}));
-}
 
-TEST(ColorAdjust, PerPixelFormsKeepTheirOwnLimits) {
   const tagRGBQUAD c{10, 200, 50, 100};  // blue, green, red, alpha
   // calPowColor floors at 0, which the image function's positive gain never needs.
   const tagRGBQUAD dark = calPowColor(c, -2.0f);

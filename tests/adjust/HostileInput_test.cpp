@@ -25,21 +25,12 @@
 
 namespace {
 
-using tfx_test::Clone;
 using tfx_test::Image;
-using tfx_test::NoiseImage;
-using tfx_test::SameBuffer;
-
-// A buffer filled with a pattern that no pixel operation here would produce by chance.
-std::vector<uint8_t> Patterned(size_t bytes) {
-  std::vector<uint8_t> buffer(bytes);
-  for (size_t i = 0; i < bytes; ++i) buffer[i] = static_cast<uint8_t>(i * 31 + 7);
-  return buffer;
-}
+using tfx_test::NoiseBytes;
 
 TEST(CxImageWrapping, NeverGrowsPastTheCallersBuffer) {
   // The header claims 16 bytes of a larger buffer; what lies beyond is not the image's.
-  std::vector<uint8_t> buffer = Patterned(64);
+  std::vector<uint8_t> buffer = NoiseBytes(64, 1);
   const std::vector<uint8_t> original = buffer;
   uint8_t* bits = buffer.data();
   CxImage image(&bits, 2, 2, 32, 8, IPF_BGRA);
@@ -66,9 +57,8 @@ TEST(CxImageWrapping, NeverGrowsPastTheCallersBuffer) {
   EXPECT_EQ(r.GetWidth(), 0u);
 }
 
-// Every image function, at a strength that changes pixels and at the settings that change
-// nothing. The 8- and 16-bit layouts are only refused by the functions that need three colour
-// bytes in four.
+// Every image function at a strength that changes pixels and at settings that change nothing;
+// fourBytes marks those that refuse 8- and 16-bit pixels too.
 struct Function {
   const char* name;
   std::function<CxImage*(CxImage*, float)> run;
@@ -127,13 +117,13 @@ std::vector<Function> Functions() {
 }
 
 TEST(ImageFunctions, LeaveImagesAloneAtIdleSettings) {
-  const Image original = NoiseImage(9, 4, 32, IPF_BGRA, 40, 3);
+  const Image original = tfx_test::NoiseImage(9, 4, 32, IPF_BGRA, 40, 3);
   for (const Function& f : Functions()) {
     for (const float idle : f.idle) {
       SCOPED_TRACE(testing::Message() << f.name << " " << idle);
-      const Image image = Clone(*original);
+      const Image image = tfx_test::Clone(*original);
       EXPECT_EQ(f.run(image.get(), idle), image.get());
-      EXPECT_TRUE(SameBuffer(*original, *image));
+      EXPECT_TRUE(tfx_test::SameBuffer(*original, *image));
     }
   }
 }
@@ -165,7 +155,7 @@ TEST(ImageFunctions, LeaveMissingPixelsAndInconsistentHeadersUntouched) {
     for (const auto& h : headers) {
       if (h.fourBytesOnly && !f.fourBytes) continue;
       SCOPED_TRACE(h.name);
-      std::vector<uint8_t> buffer = Patterned(512);
+      std::vector<uint8_t> buffer = NoiseBytes(512, 2);
       const std::vector<uint8_t> original = buffer;
       uint8_t* bits = buffer.data();
       CxImage image(&bits, h.width, h.height, h.bpp, h.effWidth, h.format);
@@ -178,7 +168,7 @@ TEST(ImageFunctions, LeaveMissingPixelsAndInconsistentHeadersUntouched) {
   }
   // Nor does dehaze find a dark channel in them.
   for (const auto& h : headers) {
-    std::vector<uint8_t> buffer = Patterned(512);
+    std::vector<uint8_t> buffer = NoiseBytes(512, 2);
     uint8_t* bits = buffer.data();
     CxImage image(&bits, h.width, h.height, h.bpp, h.effWidth, h.format);
     uint32_t maxRGB = 7, maxDark = 7;

@@ -21,10 +21,7 @@ using tfx_test::NoiseImage;
 using tfx_test::SameBuffer;
 using tfx_test::SameResult;
 
-// Plain per-pixel versions of the light adjustments, written from the formulas alone and run
-// through GetPixelColor/SetPixelColor, for the table paths to be compared against. They share no
-// code with the library beyond CxImage.
-
+// Per-pixel references written from the formulas alone, sharing no code with the library.
 float Enhance(float ch, float k) { return 255.0f - (255.0f - ch) * (255.0f - k * ch) / 255.0f; }
 
 // fn(channel, M) gives the new channel.
@@ -43,18 +40,18 @@ uint8_t Wrapped(float v) { return static_cast<uint8_t>(static_cast<int>(v)); }
 
 uint8_t Clamped(float v) { return static_cast<uint8_t>(std::clamp(static_cast<int>(v), 0, 255)); }
 
-void ReferenceHighlight(CxImage* image, float h) {
+void RefHighlight(CxImage* image, float h) {
   if (h == 0) return;
   EveryPixel(image, [&](uint8_t ch, float m) { return Wrapped(Enhance(ch, m * (h / 100.0f))); });
 }
 
-void ReferenceShadow(CxImage* image, float s) {
+void RefShadow(CxImage* image, float s) {
   if (s == 0) return;
   const float f = static_cast<float>(s / 100.0f * (s > 0 ? 2.0 : 0.5));
   EveryPixel(image, [&](uint8_t ch, float m) { return Wrapped(Enhance(ch, (1 - m) * f)); });
 }
 
-void ReferenceWhiteLevel(CxImage* image, float w) {
+void RefWhiteLevel(CxImage* image, float w) {
   if (w == 0) return;
   EveryPixel(image, [&](uint8_t ch, float m) {
     const float k = m * (w / 100.0f);
@@ -64,7 +61,7 @@ void ReferenceWhiteLevel(CxImage* image, float w) {
   });
 }
 
-void ReferenceBlackLevel(CxImage* image, float k0) {
+void RefBlackLevel(CxImage* image, float k0) {
   if (k0 == 0) return;
   const float f = static_cast<float>(k0 / 100.0f * (k0 > 0 ? 0.5 : 2.0));
   EveryPixel(image, [&](uint8_t ch, float m) { return Clamped(Enhance(ch, (1 - m) * f)); });
@@ -81,34 +78,28 @@ struct Operation {
   std::vector<float> sweep;
 };
 
-const Operation kHighlight = {"Highlight", hdrHighlight, ReferenceHighlight,  calHighlight,
-                              1.0f,        1.0f,         {100, -100, 37, 300}};
-const Operation kShadow = {"Shadow", hdrShadow, ReferenceShadow,         calShadow,
-                           2.0f,     0.5f,      {100, -100, -41.5f, 250}};
-const Operation kWhiteLevel = {"WhiteLevel", hdrWhiteLevel, ReferenceWhiteLevel, calWhiteLevelPixel,
-                               1.0f,         1.0f,          {100, -100, 63, 250}};
-const Operation kBlackLevel = {"BlackLevel",         hdrBlackLevel, ReferenceBlackLevel,
-                               calBlackLevelPixel,   0.5f,          2.0f,
-                               {100, -100, 29, -180}};
-const Operation* const kOperations[] = {&kHighlight, &kShadow, &kWhiteLevel, &kBlackLevel};
+const Operation kOperations[] = {
+    {"Highlight", hdrHighlight, RefHighlight, calHighlight, 1, 1, {100, -100, 37, 300}},
+    {"Shadow", hdrShadow, RefShadow, calShadow, 2, 0.5, {100, -100, -41.5f, 250}},
+    {"WhiteLevel", hdrWhiteLevel, RefWhiteLevel, calWhiteLevelPixel, 1, 1, {100, -100, 63, 250}},
+    {"BlackLevel", hdrBlackLevel, RefBlackLevel, calBlackLevelPixel, 0.5, 2, {100, -100, 29, -180}},
+};
 
-class LightAllColours : public testing::TestWithParam<const Operation*> {};
+class LightAllColours : public testing::TestWithParam<Operation> {};
 
 TEST_P(LightAllColours, MatchesReference) {
-  for (const float strength : GetParam()->sweep) {
+  for (const float strength : GetParam().sweep) {
     SCOPED_TRACE(strength);
     const Image expected = Clone(EveryColour());
-    GetParam()->reference(expected.get(), strength);
+    GetParam().reference(expected.get(), strength);
     const Image actual = Clone(EveryColour());
-    EXPECT_EQ(GetParam()->exported(actual.get(), strength), actual.get());
+    EXPECT_EQ(GetParam().exported(actual.get(), strength), actual.get());
     EXPECT_TRUE(SameBuffer(*expected, *actual));
   }
 }
 
 INSTANTIATE_TEST_SUITE_P(LightAdjust, LightAllColours, testing::ValuesIn(kOperations),
-                         [](const testing::TestParamInfo<const Operation*>& p) {
-                           return std::string(p.param->name);
-                         });
+                         [](const testing::TestParamInfo<Operation>& p) { return p.param.name; });
 
 TEST(LightAdjust, OnePassEqualsTheFourOperationsInTurn) {
   // The folded table must not tell from four passes, and settings whose operations let a darker
@@ -125,10 +116,10 @@ TEST(LightAdjust, OnePassEqualsTheFourOperationsInTurn) {
     SCOPED_TRACE(testing::Message() << c.h << ' ' << c.s << ' ' << c.w << ' ' << c.k0);
     EXPECT_EQ(tfx::FoldLightAdjust(c.h, c.s, c.w, c.k0, table.data()), c.folds);
     const Image expected = Clone(EveryColour());
-    ReferenceHighlight(expected.get(), c.h);
-    ReferenceShadow(expected.get(), c.s);
-    ReferenceWhiteLevel(expected.get(), c.w);
-    ReferenceBlackLevel(expected.get(), c.k0);
+    RefHighlight(expected.get(), c.h);
+    RefShadow(expected.get(), c.s);
+    RefWhiteLevel(expected.get(), c.w);
+    RefBlackLevel(expected.get(), c.k0);
     const Image actual = Clone(EveryColour());
     EXPECT_EQ(tfx::LightAdjust(actual.get(), c.h, c.s, c.w, c.k0), actual.get());
     EXPECT_TRUE(SameBuffer(*expected, *actual));
@@ -143,19 +134,19 @@ TEST(LightAdjust, MatchesReferenceOnPaddedRowsAndOtherLayouts) {
       SCOPED_TRACE(testing::Message()
                    << layout.bpp << " bpp " << layout.format << " width " << width);
       const Image original = NoiseImage(layout, width, 5, 12, width);
-      for (const Operation* op : kOperations) {
+      for (const Operation& op : kOperations) {
         EXPECT_TRUE(SameResult(
-            *original, [&](CxImage* i) { EXPECT_EQ(op->exported(i, 70), i); },
-            [&](CxImage* i) { op->reference(i, 70); }))
-            << op->name;
+            *original, [&](CxImage* i) { EXPECT_EQ(op.exported(i, 70), i); },
+            [&](CxImage* i) { op.reference(i, 70); }))
+            << op.name;
       }
       EXPECT_TRUE(SameResult(
           *original, [](CxImage* i) { tfx::LightAdjust(i, 70, -40, 30, -55); },
           [](CxImage* i) {
-            ReferenceHighlight(i, 70);
-            ReferenceShadow(i, -40);
-            ReferenceWhiteLevel(i, 30);
-            ReferenceBlackLevel(i, -55);
+            RefHighlight(i, 70);
+            RefShadow(i, -40);
+            RefWhiteLevel(i, 30);
+            RefBlackLevel(i, -55);
           }));
     }
   }
@@ -167,18 +158,17 @@ TEST(LightAdjust, ImageFunctionsScaleStrengthAsThePerPixelFormsExpect) {
   constexpr float kInf = std::numeric_limits<float>::infinity();
   const float strengths[] = {100, -100, 55, 1e30f, -kInf, std::numeric_limits<float>::quiet_NaN()};
   const Image noise = NoiseImage(61, 17, 32, IPF_BGRA, 61 * 4, 21);
-  for (const Operation* op : kOperations) {
+  for (const Operation& op : kOperations) {
     for (const float strength : strengths) {
-      SCOPED_TRACE(testing::Message() << op->name << ' ' << strength);
-      const float arg = strength / 100.0f * (strength > 0 ? op->up : op->down);
+      SCOPED_TRACE(testing::Message() << op.name << ' ' << strength);
+      const float arg = strength / 100.0f * (strength > 0 ? op.up : op.down);
       EXPECT_TRUE(SameResult(
-          *noise, [&](CxImage* i) { op->exported(i, strength); },
-          [&](CxImage* i) { MapPixels(i, [&](tagRGBQUAD c) { return op->perPixel(c, arg); }); }));
+          *noise, [&](CxImage* i) { op.exported(i, strength); },
+          [&](CxImage* i) { MapPixels(i, [&](tagRGBQUAD c) { return op.perPixel(c, arg); }); }));
     }
   }
+  // E(100, 5) = 403.9: the byte form keeps the low 8 bits (403 & 255) rather than clamping.
+  EXPECT_EQ(enHanceColor(100, 5), 147);
 }
-
-// E(100, 5) = 403.9: the byte form keeps the low 8 bits (403 & 255) rather than clamping.
-TEST(LightAdjust, TheByteFormWraps) { EXPECT_EQ(enHanceColor(100, 5), 147); }
 
 }  // namespace

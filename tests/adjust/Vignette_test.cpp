@@ -14,11 +14,6 @@
 
 namespace {
 
-using tfx_test::Clone;
-using tfx_test::Image;
-using tfx_test::NoiseImage;
-using tfx_test::SameBuffer;
-
 // The mask straight from its definition, pixel by pixel over the whole frame.
 std::vector<float> ReferenceMask(int width, int height, float F, float S, float R) {
   const float cx = float(width >> 1), cy = float(height >> 1);
@@ -66,8 +61,6 @@ tagRGBQUAD ReferencePixel(tagRGBQUAD c, float g, float a, float e, float b) {
   for (int i = 0; i < 3; ++i) out[i] = ch[i] < 0.0f ? 0 : uint8_t(int(std::min(255.0f, ch[i])));
   return tagRGBQUAD{out[2], out[1], out[0], c.rgbReserved};
 }
-
-bool SameQuad(tagRGBQUAD x, tagRGBQUAD y) { return std::memcmp(&x, &y, 4) == 0; }
 
 struct Setting {
   float amount, feather, highlights, size, roundness, exposure;
@@ -125,9 +118,8 @@ TEST(VignetteRow, MatchesThePixelFormOnEveryColour) {
       const tagRGBQUAD out = vignettePixel(in, p.g, p.a, p.e, p.b);
       std::memcpy(&expected[i], &out, 4);
       // The pixel form against the definition, on a sample of the colours.
-      if (i % 64 == 0) {
-        ASSERT_TRUE(SameQuad(out, ReferencePixel(in, p.g, p.a, p.e, p.b))) << "colour " << i / 4;
-      }
+      const tagRGBQUAD ref = i % 64 ? out : ReferencePixel(in, p.g, p.a, p.e, p.b);
+      ASSERT_EQ(std::memcmp(&out, &ref, 4), 0) << "colour " << i / 4;
     }
     const std::vector<float> weights(4096, p.g);
     tfx_test::ForEveryTarget([&] {
@@ -138,11 +130,8 @@ TEST(VignetteRow, MatchesThePixelFormOnEveryColour) {
         const size_t n = std::min<size_t>(4096, actual.size() / 4 - i);
         tfx::VignetteRow(actual.data() + 4 * i, weights.data(), n, blend);
       }
-      const auto diff = std::mismatch(expected.begin(), expected.end(), actual.begin());
-      ASSERT_TRUE(diff.first == expected.end())
-          << "colour " << (diff.first - expected.begin()) / 4 << " byte "
-          << (diff.first - expected.begin()) % 4 << ": " << int(*diff.second) << " instead of "
-          << int(*diff.first);
+      const auto diff = std::mismatch(expected.begin(), expected.end(), actual.begin()).first;
+      ASSERT_TRUE(diff == expected.end()) << "byte " << diff - expected.begin();
     });
   }
 }
@@ -173,7 +162,7 @@ TEST(Vignette, MatchesMaskAndPixelFormOnEveryLayout) {
       SCOPED_TRACE(testing::Message() << l.width << 'x' << l.height << '/' << l.bpp << " amount "
                                       << s.amount << " exposure " << s.exposure);
       ASSERT_TRUE(tfx_test::SameResult(
-          *NoiseImage(l.width, l.height, l.bpp, l.format, l.effWidth, l.width),
+          *tfx_test::NoiseImage(l.width, l.height, l.bpp, l.format, l.effWidth, l.width),
           [&](CxImage* i) {
             EXPECT_EQ(vignetteAdjustFilter(i, s.amount, s.feather, s.highlights, s.size,
                                            s.roundness, s.exposure),
