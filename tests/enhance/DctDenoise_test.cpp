@@ -24,27 +24,15 @@ using tfx_test::Image;
 using tfx_test::NoiseBytes;
 using tfx_test::NoiseImage;
 
-// ---- Textbook transforms in double ------------------------------------------------------------
-
-// c(k) cos((2n + 1) k pi / 16) at [k][n].
-const std::vector<double>& Basis() {
-  static const std::vector<double> basis = [] {
-    std::vector<double> b(64);
-    for (int i = 0; i < 64; ++i) {
-      const int k = i / 8, n = i % 8;
-      b[i] = (k == 0 ? std::sqrt(0.125) : 0.5) * std::cos((2 * n + 1) * k * 3.14159265358979 / 16);
-    }
-    return b;
-  }();
-  return basis;
-}
-
-// 8 values `step` apart, in place.
+// The textbook 8-point transform in double, of 8 values `step` apart, in place.
 void Textbook(double* v, bool inverse, int step = 1) {
-  const std::vector<double>& basis = Basis();
+  // c(k) cos((2n + 1) k pi / 16) at [k][n].
+  const auto basis = [](int k, int n) {
+    return (k == 0 ? std::sqrt(0.125) : 0.5) * std::cos((2 * n + 1) * k * 3.14159265358979 / 16);
+  };
   double out[8] = {};
   for (int k = 0; k < 8; ++k) {
-    for (int n = 0; n < 8; ++n) out[k] += basis[inverse ? n * 8 + k : k * 8 + n] * v[n * step];
+    for (int n = 0; n < 8; ++n) out[k] += (inverse ? basis(n, k) : basis(k, n)) * v[n * step];
   }
   for (int k = 0; k < 8; ++k) v[k * step] = out[k];
 }
@@ -93,9 +81,8 @@ TEST(DctTransform, MatchesTheTextbookTransformInPlaceAndOnEveryTarget) {
           tfx::Dct8Scaled(in, out, inverse);
           tfx::Dct8Scaled(inPlace, inPlace, inverse);
         }
-        // The float constants are off by up to 4e-7 relative and each output sums at most 64
-        // products: 2e-6 of the L1 norm bounds the error (times the scaled forms' largest gain,
-        // 10.3), and any wrong term is off by more.
+        // 64 products of constants off by 4e-7 stay within 2e-6 of the L1 norm (times the scaled
+        // forms' largest gain, 10.3); any wrong term is off by more.
         const double bound = (kind > 4 ? 10.3 : 1.0) * 2e-6 * l1;
         for (int i = 0; i < n; ++i) ASSERT_NEAR(expected[i], out[i], bound) << i;
         EXPECT_EQ(std::memcmp(out, inPlace, n * sizeof(float)), 0);
@@ -106,8 +93,6 @@ TEST(DctTransform, MatchesTheTextbookTransformInPlaceAndOnEveryTarget) {
     EXPECT_EQ(std::memcmp(all.data(), firstTarget.data(), all.size() * sizeof(float)), 0);
   });
 }
-
-// ---- The denoiser ------------------------------------------------------------------------------
 
 struct Plane {
   int width, height, stride;
@@ -134,11 +119,8 @@ std::vector<uint8_t> Denoised(const Plane& p, float sigma) {
   return out;
 }
 
-// The denoiser's defined arithmetic, one scaled 8-point transform at a time: each block's rows,
-// then its columns, thresholded at the scaled thresholds and inverted; block rows summed into
-// pixel rows in increasing block row order; the inverse row transform of those sums added into
-// the pixels in increasing block column order; each sum divided by 64 (the scaled transforms'
-// gain) times the number of blocks over the pixel.
+// The denoiser's defined arithmetic, one scaled 8-point transform at a time; the order of the
+// float additions (block rows, then block columns, each increasing) is part of the definition.
 std::vector<uint8_t> Defined(const Plane& p, float sigma) {
   const int w = p.width, h = p.height, blockColumns = w - 8, blockRows = h - 8;
   float thresholds[64];
@@ -180,11 +162,9 @@ std::vector<uint8_t> Defined(const Plane& p, float sigma) {
 }
 
 TEST(DctDenoise, FollowsTheDefinedArithmeticToTheBitOnEveryTarget) {
-  // Widths across tiles of block columns and vector tails, heights around every vector length's
-  // group boundaries and across bands of block rows, more tiles than are walked side by side,
-  // rows with and without padding, and planes narrower or shorter than a block, which come back
-  // as they were. With sigma 0 every block comes back whole, so each mean is its source pixel up
-  // to rounding, and truncation shows any change in the order of the float additions.
+  // Widths across tiles and vector tails, heights around each vector length's group boundaries and
+  // across bands, padded rows, planes smaller than a block. Sigma 0 keeps every block whole, so
+  // truncation shows any change in the order of the float additions.
   std::vector<Plane> planes = {NoisyRamp(9, 9, 9, 61),        NoisyRamp(40, 23, 43, 62),
                                NoisyRamp(77, 31, 77, 63),     NoisyRamp(203, 57, 208, 64),
                                NoisyRamp(300, 20, 300, 65),   NoisyRamp(150, 300, 150, 66),
@@ -212,9 +192,8 @@ TEST(DctDenoise, FollowsTheDefinedArithmeticToTheBitOnEveryTarget) {
 }
 
 TEST(DctDenoise, KeepsAFlatPlaneUnlessTheThresholdPassesItsDcTerm) {
-  // A flat plane of v has one coefficient, the DC term 8 v, which the scaled transforms carry
-  // exactly. It is kept up to the largest sigma with 3 sigma <= 8 v in float, and the next sigma
-  // up zeroes the blocks.
+  // A flat plane of v has only the DC term 8 v, carried exactly: kept up to the largest sigma with
+  // 3 sigma <= 8 v in float, zeroed from the next.
   const int w = 20, h = 18;
   for (int v = 1; v < 256; ++v) {
     SCOPED_TRACE(v);
@@ -261,8 +240,6 @@ TEST(DeNoise, LeavesAWrappedImageItsRowsCannotBePaddedIn) {
   }
 }
 
-// ---- The window denoiser ------------------------------------------------------------------
-
 TEST(ChannelDenoise, PullsEachPixelTowardsItsWindowMean) {
   // Noise with flat patches: zero variance bytes come from flat windows and from noisy ones
   // whose variance wrapped.
@@ -296,24 +273,20 @@ TEST(ChannelDenoise, PullsEachPixelTowardsItsWindowMean) {
   }
 }
 
-// ---- Colour images -----------------------------------------------------------------------------
-
-tagRGBQUAD Same(tagRGBQUAD c) { return c; }
-
 TEST(DctDenoise, FiltersThreeColourPlanesAndKeepsAlphaOnEveryTarget) {
   const float strength = 60.0f, sigma = static_cast<float>(strength * 0.15);
-  struct Case {
+  const struct {
     unsigned bpp;
     _ImagePixelFormat format;
     bool hsl;
     unsigned w, h, extraStride;  // a wrapped stride beyond the padding is recombined without it
-  };
+  } cases[] = {{32, IPF_BGRA, false, 27, 19, 0},  {24, IPF_RGB, false, 27, 19, 0},
+               {32, IPF_RGBA, true, 27, 19, 0},   {24, IPF_BGR, true, 27, 19, 0},
+               {32, IPF_BGRA, false, 150, 37, 0}, {24, IPF_RGB, true, 149, 30, 0},
+               {32, IPF_BGRA, true, 150, 21, 0},  {24, IPF_BGR, false, 149, 22, 0},
+               {32, IPF_RGBA, true, 30, 12, 8}};
   ForEveryTarget([&] {
-    for (const Case c : {Case{32, IPF_BGRA, false, 27, 19, 0}, Case{24, IPF_RGB, false, 27, 19, 0},
-                         Case{32, IPF_RGBA, true, 27, 19, 0}, Case{24, IPF_BGR, true, 27, 19, 0},
-                         Case{32, IPF_BGRA, false, 150, 37, 0}, Case{24, IPF_RGB, true, 149, 30, 0},
-                         Case{32, IPF_BGRA, true, 150, 21, 0}, Case{24, IPF_BGR, false, 149, 22, 0},
-                         Case{32, IPF_RGBA, true, 30, 12, 8}}) {
+    for (const auto& c : cases) {
       SCOPED_TRACE(std::to_string(c.bpp) + (c.hsl ? " bits, HSL, " : " bits, RGB, ") +
                    std::to_string(c.w) + " wide");
       const unsigned w = c.w, h = c.h;
@@ -337,8 +310,8 @@ TEST(DctDenoise, FiltersThreeColourPlanesAndKeepsAlphaOnEveryTarget) {
       ASSERT_EQ(c.hsl ? deNoiseLumiance(image.get(), strength) : deNoiseRGB(image.get(), strength),
                 image.get());
       for (unsigned i = 0; i < w * h; ++i) {
-        tagRGBQUAD expected = (c.hsl ? CxImage::HSLtoRGB : Same)(
-            tagRGBQUAD{planes[2][i], planes[1][i], planes[0][i], 0});
+        const tagRGBQUAD q{planes[2][i], planes[1][i], planes[0][i], 0};
+        tagRGBQUAD expected = c.hsl ? CxImage::HSLtoRGB(q) : q;
         expected.rgbReserved = c.bpp == 32 ? alpha[i] : 0;
         const tagRGBQUAD actual = image->GetPixelColor(i % w, i / w, true);
         ASSERT_EQ(std::memcmp(&expected, &actual, 4), 0) << "pixel " << i;
@@ -355,13 +328,14 @@ TEST(HslRows, GiveTheBytesOfCxImageConversionsForEveryColourOnEveryTarget) {
   std::vector<uint8_t> triples(3 * count), hsl(3 * count), rgb(4 * count);
   for (size_t i = 0; i < count; ++i) {
     const uint8_t* p = pixels + 4 * i;
-    for (size_t k = 0; k < 3; ++k) triples[k * count + i] = p[k];
     const tagRGBQUAD t = CxImage::RGBtoHSL(tagRGBQUAD{p[0], p[1], p[2], p[3]});
-    hsl[i] = t.rgbRed;
-    hsl[count + i] = t.rgbGreen;
-    hsl[2 * count + i] = t.rgbBlue;
     const tagRGBQUAD c = CxImage::HSLtoRGB(tagRGBQUAD{p[2], p[1], p[0], 0});
-    const uint8_t back[4] = {c.rgbBlue, c.rgbGreen, c.rgbRed, p[3]};
+    const uint8_t h[3] = {t.rgbRed, t.rgbGreen, t.rgbBlue},
+                  back[4] = {c.rgbBlue, c.rgbGreen, c.rgbRed, p[3]};
+    for (size_t k = 0; k < 3; ++k) {
+      triples[k * count + i] = p[k];
+      hsl[k * count + i] = h[k];
+    }
     std::copy(back, back + 4, &rgb[4 * i]);
   }
   ForEveryTarget([&] {

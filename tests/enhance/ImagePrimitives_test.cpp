@@ -61,14 +61,9 @@ TEST(FilterBox, AveragesTheWindowAtEachAnchorReadingOnlyItsReach) {
                 }
               }
               // The nearest integer; an exact half may go either way.
-              const int low = sum / area;
-              const int twiceRest = 2 * (sum % area);
-              const int got = dst[y * dstStep + x];
-              if (twiceRest == area) {
-                ASSERT_TRUE(got == low || got == low + 1) << "at " << x << "," << y;
-              } else {
-                ASSERT_EQ(got, low + (twiceRest > area)) << "at " << x << "," << y;
-              }
+              const int got = dst[y * dstStep + x], low = sum / area, twice = 2 * (sum % area);
+              ASSERT_TRUE(got == low + (twice > area) || (twice == area && got == low + 1))
+                  << got << " for " << sum << " / " << area << " at " << x << "," << y;
             }
             for (int x = region.width * channels; x < dstStep; ++x) {
               ASSERT_EQ(dst[y * dstStep + x], 0xA5) << "padding written at " << x << "," << y;
@@ -78,30 +73,6 @@ TEST(FilterBox, AveragesTheWindowAtEachAnchorReadingOnlyItsReach) {
       }
     }
   }
-}
-
-TEST(FilterBox, ReportsBadArgumentsAndLeavesTheDestination) {
-  std::vector<uint8_t> src(64 * 64 * 4, 7), dst(64 * 64 * 4, 0xA5);
-  const std::vector<uint8_t> untouched = dst;
-  uint8_t* d = dst.data();
-  for (const int ch : {1, 4}) {
-    SCOPED_TRACE(testing::Message() << ch << " channels");
-    const Box box = ch == 1 ? ippiFilterBox_8u_C1R : ippiFilterBox_8u_C4R;
-    const uint8_t* s = src.data() + 8 * 64 * ch + 8 * ch;
-    const int step = 64 * ch;
-    EXPECT_EQ(box(nullptr, step, d, step, {4, 4}, {3, 3}, {1, 1}), ippStsNullPtrErr);
-    EXPECT_EQ(box(s, step, nullptr, step, {4, 4}, {3, 3}, {1, 1}), ippStsNullPtrErr);
-    EXPECT_EQ(box(s, step, d, step, {0, 4}, {3, 3}, {1, 1}), ippStsSizeErr);
-    EXPECT_EQ(box(s, step, d, step, {4, 4}, {3, -3}, {1, 0}), ippStsMaskSizeErr);
-    EXPECT_EQ(box(s, step, d, step, {4, 4}, {INT_MAX, 1}, {0, 0}), ippStsMaskSizeErr);
-    EXPECT_EQ(box(s, step, d, step, {4, 4}, {3, 3}, {3, 1}), ippStsAnchorErr);
-    EXPECT_EQ(box(s, 5 * ch, d, step, {4, 4}, {3, 3}, {1, 1}), ippStsStepErr);  // reach is 6
-    EXPECT_EQ(box(s, step, d, 3 * ch, {4, 4}, {3, 3}, {1, 1}), ippStsStepErr);
-    EXPECT_EQ(box(s, -step, d, step, {4, 4}, {3, 3}, {1, 1}), ippStsStepErr);
-    // OpenCV's rows of sums would outgrow int offsets: refused before anything is read.
-    EXPECT_EQ(box(s, INT_MAX, d, INT_MAX, {1 << 20, 1}, {1, 1000}, {0, 0}), ippStsNoMemErr);
-  }
-  EXPECT_EQ(dst, untouched);
 }
 
 TEST(CopyBorder, SurroundsTheSourceWithItsEdgePixelsOrAValue) {
@@ -143,11 +114,28 @@ TEST(CopyBorder, SurroundsTheSourceWithItsEdgePixelsOrAValue) {
   }
 }
 
-TEST(CopyBorder, ReportsBadArguments) {
-  std::vector<uint8_t> src(16 * 16 * 4), dst(16 * 16 * 4, 0xA5);
+TEST(ImagePrimitives, ReportBadArgumentsAndLeaveTheDestination) {
+  std::vector<uint8_t> src(64 * 64 * 4, 7), dst(64 * 64 * 4, 0xA5);
   const std::vector<uint8_t> untouched = dst;
   const uint8_t* s = src.data();
   uint8_t* d = dst.data();
+  for (const int ch : {1, 4}) {
+    SCOPED_TRACE(testing::Message() << ch << " channels");
+    const Box box = ch == 1 ? ippiFilterBox_8u_C1R : ippiFilterBox_8u_C4R;
+    const uint8_t* inner = s + 8 * 64 * ch + 8 * ch;
+    const int step = 64 * ch;
+    EXPECT_EQ(box(nullptr, step, d, step, {4, 4}, {3, 3}, {1, 1}), ippStsNullPtrErr);
+    EXPECT_EQ(box(inner, step, nullptr, step, {4, 4}, {3, 3}, {1, 1}), ippStsNullPtrErr);
+    EXPECT_EQ(box(inner, step, d, step, {0, 4}, {3, 3}, {1, 1}), ippStsSizeErr);
+    EXPECT_EQ(box(inner, step, d, step, {4, 4}, {3, -3}, {1, 0}), ippStsMaskSizeErr);
+    EXPECT_EQ(box(inner, step, d, step, {4, 4}, {INT_MAX, 1}, {0, 0}), ippStsMaskSizeErr);
+    EXPECT_EQ(box(inner, step, d, step, {4, 4}, {3, 3}, {3, 1}), ippStsAnchorErr);
+    EXPECT_EQ(box(inner, 5 * ch, d, step, {4, 4}, {3, 3}, {1, 1}), ippStsStepErr);  // reach is 6
+    EXPECT_EQ(box(inner, step, d, 3 * ch, {4, 4}, {3, 3}, {1, 1}), ippStsStepErr);
+    EXPECT_EQ(box(inner, -step, d, step, {4, 4}, {3, 3}, {1, 1}), ippStsStepErr);
+    // OpenCV's rows of sums would outgrow int offsets: refused before anything is read.
+    EXPECT_EQ(box(inner, INT_MAX, d, INT_MAX, {1 << 20, 1}, {1, 1000}, {0, 0}), ippStsNoMemErr);
+  }
   const uint8_t v[4] = {};
   for (const bool replicate : {true, false}) {
     SCOPED_TRACE(replicate ? "replicate" : "constant");
@@ -179,7 +167,7 @@ bool AlignedTo(const void* p, uintptr_t alignment) {
   return reinterpret_cast<uintptr_t>(p) % alignment == 0;
 }
 
-TEST(PrimitiveAllocation, AlignsRowsAndVectorsAndRefusesBadSizes) {
+TEST(Allocation, AlignsRowsAndVectorsAndZeroesAsAskedAndRefusesBadSizes) {
   for (const int width : {1, 17, 1000}) {
     int step = 0;
     Ipp8u* image = ippiMalloc_8u_C4(width, 3, &step);
@@ -197,9 +185,6 @@ TEST(PrimitiveAllocation, AlignsRowsAndVectorsAndRefusesBadSizes) {
   for (void* p : vectors) ippsFree(p);
   EXPECT_EQ(ippsMalloc_8u(0), nullptr);
   EXPECT_EQ(ippsMalloc_32f(INT_MAX / 2), nullptr);  // more than INT_MAX bytes
-}
-
-TEST(AlignedMemory, AlignsAndZeroesAsAsked) {
   for (const uint32_t size : {0u, 1u, 33u, 4103u}) {
     // Dirty a block first, which the zeroed one is likely to reuse.
     void* dirty = AllocMemory(size, false);
