@@ -128,16 +128,10 @@ TEST(CxImage, OutOfRangeAndMismatchedPixelsReadZeroAndIgnoreWrites) {
   EXPECT_EQ(CxImage().GetPixelColor(0, 0, true), Rgba(0, 0, 0, 0));
 }
 
+// A copy into an empty image is what every test's Clone does.
 TEST(CxImage, CopyReusesASameSizedBufferAndReplacesAnyOther) {
   CxImage src(5, 3, 24, IPF_BGR);
   for (uint32_t i = 0; i < src.GetSize(); ++i) src.GetBits()[i] = static_cast<uint8_t>(i * 7);
-  ImageProbe fresh;
-  fresh.Copy(&src);
-  ASSERT_NE(fresh.GetBits(), nullptr);
-  EXPECT_NE(fresh.GetBits(), src.GetBits());
-  EXPECT_EQ(fresh.OwnsBits(), 1u);
-  EXPECT_EQ(fresh.GetEffWidth(), src.GetEffWidth());
-  EXPECT_EQ(std::memcmp(fresh.GetBits(), src.GetBits(), src.GetSize()), 0);
 
   // A wrapper of the same size receives the pixels in the caller's buffer, which stays the
   // caller's: a double free would show under the sanitizers.
@@ -168,7 +162,7 @@ TEST(CxImage, CopyReusesASameSizedBufferAndReplacesAnyOther) {
   }
 }
 
-TEST(CxImage, RgbToHslUsesIntegerScale) {
+TEST(CxImage, HslConversionsUseIntegerScaleAndRoundTripClosely) {
   EXPECT_EQ(CxImage::RGBtoHSL(Rgba(255, 0, 0, 9)), Rgba(0, 255, 128, 0));  // H, S, L
   for (int v : {0, 77, 255}) {
     EXPECT_EQ(CxImage::RGBtoHSL(Rgba(v, v, v, 0)), Rgba(170, 0, (v * 510 + 255) / 510, 0));
@@ -178,9 +172,6 @@ TEST(CxImage, RgbToHslUsesIntegerScale) {
   EXPECT_EQ(CxImage::RGBtoHSL(Rgba(0, 255, 0, 0)).rgbRed, 85);
   // Light colours take the other saturation denominator.
   EXPECT_EQ(CxImage::RGBtoHSL(Rgba(255, 200, 200, 0)).rgbGreen, 255);
-}
-
-TEST(CxImage, HslToRgbGivesGreyForZeroSaturationAndRoundTripsClosely) {
   for (int l = 0; l < 256; ++l) {
     EXPECT_EQ(CxImage::HSLtoRGB(tagRGBQUAD{uint8_t(l), 0, 99, 7}), Rgba(l, l, l, 0));
   }
@@ -195,25 +186,12 @@ TEST(CxImage, HslToRgbGivesGreyForZeroSaturationAndRoundTripsClosely) {
   }
 }
 
-TEST(CxImage, SplitAndCombineRoundTrip) {
-  CxImage image(7, 3, 32, IPF_BGRA);
-  for (uint32_t i = 0; i < image.GetSize(); ++i) image.GetBits()[i] = static_cast<uint8_t>(i * 37);
-  CxImage r, g, b, a, h, s, l;
+// The planes' round trip through Split and Combine is the channel denoisers' test.
+TEST(CxImage, SplitAndCombineRefuseWhatTheyCannotDo) {
+  CxImage image(7, 3, 32, IPF_BGRA), rgb(1, 1, 32, IPF_BGRA);
+  CxImage r, g, b, a;
   ASSERT_TRUE(image.SplitRGBA(&r, &g, &b, &a));
-  ASSERT_TRUE(image.SplitHSLA(&h, &s, &l, nullptr));
   EXPECT_EQ(r.getFormat(), IPF_Gray8);
-  CxImage rgb(1, 1, 32, IPF_BGRA), hsl(1, 1, 32, IPF_BGRA);
-  ASSERT_TRUE(rgb.Combine(&r, &g, &b, &a, 0));
-  ASSERT_TRUE(hsl.Combine(&h, &s, &l, &a, 1));
-  for (unsigned long y = 0; y < 3; ++y) {
-    for (unsigned long x = 0; x < 7; ++x) {
-      const tagRGBQUAD c = image.GetPixelColor(x, y, true);
-      EXPECT_EQ(rgb.GetPixelColor(x, y, true), c);
-      tagRGBQUAD expected = CxImage::HSLtoRGB(CxImage::RGBtoHSL(c));
-      expected.rgbReserved = c.rgbReserved;
-      EXPECT_EQ(hsl.GetPixelColor(x, y, true), expected);
-    }
-  }
   CxImage grey(4, 4, 8, IPF_Gray8), empty;
   EXPECT_FALSE(grey.SplitRGBA(&r, &g, &b, nullptr));
   EXPECT_FALSE(empty.SplitHSLA(&r, &g, &b, nullptr));

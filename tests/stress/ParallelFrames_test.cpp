@@ -19,7 +19,6 @@
 #include "tessarofx/CxImage.h"
 #include "tessarofx/Denoise.h"
 #include "tessarofx/DetailFilters.h"
-#include "tessarofx/HSLAdjust.h"
 #include "tessarofx/HueAdjust.h"
 #include "tessarofx/LensAdjust.h"
 #include "tessarofx/WhiteBalance.h"
@@ -124,8 +123,6 @@ std::vector<Job> Jobs(const std::wstring& cube) {
   image("hueAdjustment a", 41, 9, [](CxImage* i) { hueAdjustment(i, 40.0f); });
   image("hueAdjustment b", 23, 17, [](CxImage* i) { hueAdjustment(i, -70.0f); });
   image("temperatureAdjustment", 25, 19, [](CxImage* i) { temperatureAdjustment(i, 3500); });
-  image("distortFilter", 34, 20, [](CxImage* i) { distortFilter(i, 45.0f); });
-  image("fringingFilter", 34, 20, [](CxImage* i) { fringingFilter(i, -35.0f); });
   image("deNoiseRGB", 40, 24, [](CxImage* i) { deNoiseRGB(i, 30.0f); });
   image("deNoiseLumiance", 24, 40, [](CxImage* i) { deNoiseLumiance(i, 50.0f); });
   image("dehaze", 36, 20, [](CxImage* i) { dehaze(i, 40.0f); });
@@ -133,12 +130,8 @@ std::vector<Job> Jobs(const std::wstring& cube) {
   image("clarity", 28, 28, [](CxImage* i) { clarity(i, -30.0f); });
   image("diffuse", 33, 21, [](CxImage* i) { diffuse(i, 120.0f); });
   image("addNoiseFilter", 27, 13, [](CxImage* i) { addNoiseFilter(i, 30.0f, 0.5f); });
-  image("hslAdjustment", 29, 11, [](CxImage* i) {
-    HSLBands bands{};
-    bands.band[0] = HSLBandValues{40.0f, -30.0f, 10.0f, 20.0f, 50.0f};
-    hslAdjustment(i, bands);
-  });
-  // Releasing the lens maps while other threads build and read them.
+  // The lens and HSL image forms run in their filters' jobs. Releasing the lens maps while other
+  // threads build and read them:
   image("distortFilter and releaseLensVariables", 31, 17, [](CxImage* i) {
     distortFilter(i, -15.0f);
     releaseLensVariables();
@@ -176,8 +169,7 @@ TEST(ParallelFrames, EveryJobOnFourThreadsGivesItsSerialBytes) {
   }
 
   constexpr int kThreads = 4, kRounds = 2;
-  std::vector<std::vector<Bytes>> results(kThreads, std::vector<Bytes>(jobs.size()));
-  std::vector<int> mismatches(kThreads, 0);
+  std::vector<std::vector<std::string>> wrong(kThreads);
   std::vector<std::thread> threads;
   for (int t = 0; t < kThreads; ++t) {
     threads.emplace_back([&, t] {
@@ -187,14 +179,13 @@ TEST(ParallelFrames, EveryJobOnFourThreadsGivesItsSerialBytes) {
       for (int round = 0; round < kRounds; ++round) {
         for (size_t k = 0; k < n; ++k) {
           const size_t i = t % 2 ? (t * 7 + k) % n : (n - 1 - (t * 5 + k) % n);
-          Bytes out = jobs[i].run();
-          if (out != serial[i]) ++mismatches[t];
-          results[t][i] = std::move(out);
+          if (jobs[i].run() != serial[i]) wrong[t].push_back(jobs[i].name);
         }
       }
     });
   }
   for (std::thread& thread : threads) thread.join();
+  for (int t = 0; t < kThreads; ++t) EXPECT_EQ(wrong[t], std::vector<std::string>{}) << t;
   // The hue matrix published to hosts is the whole matrix of one of the angles, never a mix.
   float published[9], whole[2][9];
   std::copy(matrix, matrix + 9, published);
@@ -204,12 +195,6 @@ TEST(ParallelFrames, EveryJobOnFourThreadsGivesItsSerialBytes) {
   }
   EXPECT_TRUE(std::equal(published, published + 9, whole[0]) ||
               std::equal(published, published + 9, whole[1]));
-  for (int t = 0; t < kThreads; ++t) {
-    EXPECT_EQ(mismatches[t], 0) << "thread " << t;
-    for (size_t i = 0; i < jobs.size(); ++i) {
-      EXPECT_EQ(results[t][i], serial[i]) << jobs[i].name << " on thread " << t;
-    }
-  }
   releaseLensVariables();
 }
 
