@@ -16,44 +16,27 @@ extern "C" {
 
 namespace {
 
+// The module's entry points, typed by the declarations in frei0r.h.
 struct Module {
-  explicit Module(const std::string& slug) {
-    handle = dlopen((std::string(TFX_FREI0R_DIR) + "/tessarofx-" + slug + ".so").c_str(),
-                    RTLD_NOW | RTLD_LOCAL);
-    if (!handle) return;
-    init = reinterpret_cast<decltype(init)>(dlsym(handle, "f0r_init"));
-    info = reinterpret_cast<decltype(info)>(dlsym(handle, "f0r_get_plugin_info"));
-    paramInfo = reinterpret_cast<decltype(paramInfo)>(dlsym(handle, "f0r_get_param_info"));
-    construct = reinterpret_cast<decltype(construct)>(dlsym(handle, "f0r_construct"));
-    destruct = reinterpret_cast<decltype(destruct)>(dlsym(handle, "f0r_destruct"));
-    set = reinterpret_cast<decltype(set)>(dlsym(handle, "f0r_set_param_value"));
-    get = reinterpret_cast<decltype(get)>(dlsym(handle, "f0r_get_param_value"));
-    update = reinterpret_cast<decltype(update)>(dlsym(handle, "f0r_update"));
-  }
+  explicit Module(const std::string& slug)
+      : handle(dlopen((TFX_FREI0R_DIR "/tessarofx-" + slug + ".so").c_str(), RTLD_NOW)) {}
   ~Module() {
     if (handle) dlclose(handle);
   }
-  void* handle = nullptr;
-  int (*init)() = nullptr;
-  void (*info)(f0r_plugin_info_t*) = nullptr;
-  void (*paramInfo)(f0r_param_info_t*, int) = nullptr;
-  f0r_instance_t (*construct)(unsigned, unsigned) = nullptr;
-  void (*destruct)(f0r_instance_t) = nullptr;
-  void (*set)(f0r_instance_t, f0r_param_t, int) = nullptr;
-  void (*get)(f0r_instance_t, f0r_param_t, int) = nullptr;
-  void (*update)(f0r_instance_t, double, const uint32_t*, uint32_t*) = nullptr;
-};
-
-// Every channel differs from the others and from pixel to pixel.
-std::vector<uint32_t> Picture(unsigned width, unsigned height) {
-  std::vector<uint32_t> pixels(static_cast<size_t>(width) * height);
-  for (size_t i = 0; i < pixels.size(); ++i) {
-    pixels[i] = static_cast<uint32_t>((i * 37 + 11) % 256) |
-                static_cast<uint32_t>((i * 91 + 3) % 256) << 8 |
-                static_cast<uint32_t>((i * 13 + 200) % 256) << 16 | 0xC0000000u;
+  template <typename F>
+  F Sym(const char* name) const {
+    return handle ? reinterpret_cast<F>(dlsym(handle, name)) : nullptr;
   }
-  return pixels;
-}
+  void* const handle;
+  decltype(&f0r_init) init = Sym<decltype(init)>("f0r_init");
+  decltype(&f0r_get_plugin_info) info = Sym<decltype(info)>("f0r_get_plugin_info");
+  decltype(&f0r_get_param_info) paramInfo = Sym<decltype(paramInfo)>("f0r_get_param_info");
+  decltype(&f0r_construct) construct = Sym<decltype(construct)>("f0r_construct");
+  decltype(&f0r_destruct) destruct = Sym<decltype(destruct)>("f0r_destruct");
+  decltype(&f0r_set_param_value) set = Sym<decltype(set)>("f0r_set_param_value");
+  decltype(&f0r_get_param_value) get = Sym<decltype(get)>("f0r_get_param_value");
+  decltype(&f0r_update) update = Sym<decltype(update)>("f0r_update");
+};
 
 TEST(Frei0rModules, OneModulePerCatalogedFilterWithItsOwnFace) {
   for (const tfx::catalog::Filter& filter : tfx::catalog::Filters()) {
@@ -68,10 +51,9 @@ TEST(Frei0rModules, OneModulePerCatalogedFilterWithItsOwnFace) {
     EXPECT_EQ(info.plugin_type,
               filter.inputs == 2 ? F0R_PLUGIN_TYPE_MIXER2 : F0R_PLUGIN_TYPE_FILTER);
     // The key colour's three channels become one frei0r colour.
-    const int colours =
-        filter.params.size() > 0 && filter.params[0].role == tfx::catalog::ParamRole::kKeyRed ? 2
-                                                                                              : 0;
-    ASSERT_EQ(info.num_params, static_cast<int>(filter.params.size()) - colours);
+    const bool keyed =
+        filter.params.size() > 0 && filter.params[0].role == tfx::catalog::ParamRole::kKeyRed;
+    ASSERT_EQ(info.num_params, static_cast<int>(filter.params.size()) - (keyed ? 2 : 0));
     for (int i = 0; i < info.num_params; ++i) {
       f0r_param_info_t p{};
       m.paramInfo(&p, i);
@@ -84,19 +66,17 @@ TEST(Frei0rModules, ValuesMapOntoTheCatalogueRangeAndHostileOnesAreTamed) {
   Module m("vignette");
   ASSERT_EQ(m.init(), 1);
   f0r_instance_t inst = m.construct(16, 8);
-  double v = -1;
-  m.get(inst, &v, 1);  // size: default 100 of 0..100
-  EXPECT_EQ(v, 1.0);
-  m.get(inst, &v, 3);  // feather: default 50 of 0..100
-  EXPECT_EQ(v, 0.5);
-  double in = 7;  // clamped to 1
-  m.set(inst, &in, 0);
-  m.get(inst, &v, 0);
-  EXPECT_EQ(v, 1.0);
-  in = std::nan("");  // ignored
-  m.set(inst, &in, 0);
-  m.get(inst, &v, 0);
-  EXPECT_EQ(v, 1.0);
+  const auto get = [&](int index) {
+    double v = -1;
+    m.get(inst, &v, index);
+    return v;
+  };
+  EXPECT_EQ(get(1), 1.0);                       // size: default 100 of 0..100
+  EXPECT_EQ(get(3), 0.5);                       // feather: default 50 of 0..100
+  for (double hostile : {7.0, std::nan("")}) {  // clamped to 1, then ignored
+    m.set(inst, &hostile, 0);
+    EXPECT_EQ(get(0), 1.0) << hostile;
+  }
   m.destruct(inst);
 }
 
@@ -104,13 +84,12 @@ TEST(Frei0rModules, TextArrivesEitherAsPointerToPointerOrAsThePointerItself) {
   Module m("lut");
   ASSERT_EQ(m.init(), 1);
   f0r_instance_t inst = m.construct(4, 4);
-  std::string first = "/nowhere/first.cube";
+  std::string first = "/nowhere/first.cube", second = "/nowhere/second.cube";
   char* text = first.data();
-  m.set(inst, &text, 0);  // the frei0r convention
   char* got = nullptr;
+  m.set(inst, &text, 0);  // the frei0r convention
   m.get(inst, &got, 0);
   EXPECT_STREQ(got, first.c_str());
-  std::string second = "/nowhere/second.cube";
   m.set(inst, second.data(), 0);  // what GStreamer passes while it plays
   m.get(inst, &got, 0);
   EXPECT_STREQ(got, second.c_str());
@@ -123,8 +102,10 @@ TEST(Frei0rModules, ConcurrentSlicesAndInPlaceGiveTheSerialBytes) {
   Module m("coloradjust");
   ASSERT_EQ(m.init(), 1);
   const unsigned width = 64, sliceHeight = 16, slices = 4;
-  const std::vector<uint32_t> in = Picture(width, sliceHeight * slices);
-  const size_t slice = static_cast<size_t>(width) * sliceHeight;
+  const size_t slice = size_t(width) * sliceHeight;
+  // Every channel differs from the others and from pixel to pixel.
+  std::vector<uint32_t> in(slice * slices);
+  for (size_t i = 0; i < in.size(); ++i) in[i] = uint32_t(i * 0x9E3779B1u) | 0xC0000000u;
   f0r_instance_t inst = m.construct(width, sliceHeight);
   double exposure = 0.8, saturation = 0.3;
   m.set(inst, &exposure, 0);
@@ -132,13 +113,12 @@ TEST(Frei0rModules, ConcurrentSlicesAndInPlaceGiveTheSerialBytes) {
 
   std::vector<uint32_t> serial(in.size()), parallel(in.size()), inPlace(in);
   for (unsigned s = 0; s < slices; ++s) m.update(inst, 0, &in[s * slice], &serial[s * slice]);
-  std::vector<std::thread> threads;
   for (int round = 0; round < 8; ++round) {
+    std::vector<std::thread> threads;
     for (unsigned s = 0; s < slices; ++s) {
       threads.emplace_back([&, s] { m.update(inst, 0, &in[s * slice], &parallel[s * slice]); });
     }
     for (auto& t : threads) t.join();
-    threads.clear();
     ASSERT_EQ(parallel, serial);
   }
   for (unsigned s = 0; s < slices; ++s) m.update(inst, 0, &inPlace[s * slice], &inPlace[s * slice]);

@@ -67,68 +67,52 @@ ffmpeg_case chromakey '0x30C040|0.6|0.5|n' ChromeKeyLut3d "${key[@]}" -p mode=0
 ffmpeg_case chromakey '0x30C040|0.6|0.5|y' ChromeKeyLut3d "${key[@]}" -p mode=1
 
 # --- melt: a profile of the picture's own size, so that nothing is scaled.
-cat > profile <<'PROFILE'
-description=test
-width=128
-height=96
-progressive=1
-sample_aspect_num=1
-sample_aspect_den=1
-display_aspect_num=4
-display_aspect_den=3
-frame_rate_num=25
-frame_rate_den=1
-colorspace=709
-PROFILE
-melt_run() {  # melt_run OUT.raw FRAMES [melt args]... ; writes every frame
-  local out=$1 frames=$2
+printf '%s\n' description=test width=128 height=96 progressive=1 sample_aspect_num=1 \
+  sample_aspect_den=1 display_aspect_num=4 display_aspect_den=3 frame_rate_num=25 \
+  frame_rate_den=1 colorspace=709 >profile
+# Six frames of the picture through melt, each against one reference: melt_case NAME REF [ARGS]...
+melt_case() {
+  local name=$1 ref=$2
   shift 2
-  local want=$((128 * 96 * 4 * frames))
   # With parallel rendering (real_time), melt's consumer can stop before its queue drains on a busy
   # machine and write fewer frames; a short file is run again, a wrong frame never is.
   for _ in 1 2 3; do
-    melt -quiet -profile profile "$@" -consumer "avformat:$out" f=rawvideo pix_fmt=bgra \
-      >/dev/null 2>melt.log || { fail "melt $*"; cat melt.log; return; }
-    [ "$(stat -c %s "$out" 2>/dev/null || echo 0)" = "$want" ] && return
+    rm -f melt.raw
+    melt -quiet -profile profile pixbuf:in.png out=5 "$@" -consumer avformat:melt.raw \
+      f=rawvideo pix_fmt=bgra </dev/null >/dev/null 2>melt.log ||
+      { fail "melt $name"; cat melt.log; return; }
+    [ "$(stat -c %s melt.raw)" = $((128 * 96 * 4 * 6)) ] && break
   done
-  fail "melt $*: wrong size"
+  for _ in 1 2 3 4 5 6; do cat "$ref"; done >frames.raw
+  same "melt $name" melt.raw frames.raw
 }
-# Every frame of a multi-frame result against one reference.
-same_frames() {  # same_frames NAME GOT WANT FRAMES
-  local f
-  for ((f = 0; f < $4; f++)); do cat "$3"; done >frames.raw
-  same "$1" "$2" frames.raw
-}
-clip=(pixbuf:in.png out=5)
 # The key chain: mask and colours on two tracks, joined by the two-input module as a transition.
 keyset=(keyColor=#30c040 contrast=0.6 offset=0.5)
 "$tool" apply ChromeKeyLut3d "${key[@]}" -p mode=0 in.png mask.png >/dev/null
 "$tool" apply ChromeKeyLut3d "${key[@]}" -p mode=1 in.png colours.png >/dev/null
 "$tool" apply ChromeKeyCombine --background mask.png colours.png keyed.png >/dev/null
 raw keyed.png ref-keyed.raw
-keychain=("${clip[@]}" -attach frei0r.tessarofx-chromakey "${keyset[@]}" mode=0
-  -track "${clip[@]}" -attach frei0r.tessarofx-chromakey "${keyset[@]}" mode=1
-  -transition frei0r.tessarofx-chromakeycombine a_track=0 b_track=1 in=0 out=5)
 
 # MLT's threading: a rendering thread per frame, and frames cut into slices processed at once
 # (FFmpeg above hands each module whole frames).
-melt_run m-key-rt.raw 6 "${keychain[@]}" real_time=-4
-same_frames "melt key chain, real_time=-4" m-key-rt.raw ref-keyed.raw 6
-melt_run m-color-rt.raw 6 "${clip[@]}" -attach frei0r.tessarofx-coloradjust u_exposure=0.75 \
-  u_brightness=0.4 u_contrast=0.6 u_vib=0.3 u_sat=0.7 threads=4 real_time=-4
-same_frames "melt coloradjust, sliced and real_time=-4" m-color-rt.raw ref-coloradjust.raw 6
-for slug in whitebalance lut atowhite hsl light chromakey; do
-  case $slug in
-    whitebalance) p=(u_temperature=0.7 u_tint=0.35) ;;
-    lut) p=("lut3dPath=$work/look.cube") ;;
-    atowhite) p=() ;;
-    hsl) p=(u_red_hue=0.75 u_red_sat=0.25 u_red_light=0.6 u_orange_hue=0.3) ;;
-    light) p=(u_highLight=0.7 u_shadow=0.6 u_whiteLevel=0.4 u_blackLevel=0.3) ;;
-    chromakey) p=("${keyset[@]}" mode=1) ;;
-  esac
-  melt_run "m-$slug-sliced.raw" 6 "${clip[@]}" -attach "frei0r.tessarofx-$slug" "${p[@]}" threads=3
-  same_frames "melt $slug, sliced" "m-$slug-sliced.raw" "ref-$slug.raw" 6
-done
+melt_case "key chain, real_time=-4" ref-keyed.raw -attach frei0r.tessarofx-chromakey \
+  "${keyset[@]}" mode=0 -track pixbuf:in.png out=5 -attach frei0r.tessarofx-chromakey \
+  "${keyset[@]}" mode=1 -transition frei0r.tessarofx-chromakeycombine a_track=0 b_track=1 in=0 \
+  out=5 real_time=-4
+melt_case "coloradjust, sliced and real_time=-4" ref-coloradjust.raw \
+  -attach frei0r.tessarofx-coloradjust u_exposure=0.75 u_brightness=0.4 u_contrast=0.6 \
+  u_vib=0.3 u_sat=0.7 threads=4 real_time=-4
+while read -r slug params; do
+  # shellcheck disable=SC2086  # the parameters split at their spaces
+  melt_case "$slug, sliced" "ref-$slug.raw" -attach "frei0r.tessarofx-$slug" $params threads=3
+done <<EOF
+whitebalance u_temperature=0.7 u_tint=0.35
+lut lut3dPath=$work/look.cube
+atowhite
+hsl u_red_hue=0.75 u_red_sat=0.25 u_red_light=0.6 u_orange_hue=0.3
+light u_highLight=0.7 u_shadow=0.6 u_whiteLevel=0.4 u_blackLevel=0.3
+chromakey ${keyset[*]} mode=1
+EOF
 
 # --- GStreamer: two pipelines in one process (each branch streams on a thread of its own) and a
 # third process beside it, each against the tool.

@@ -1,9 +1,10 @@
 # The Python module against the tool: the same image through `tessarofx apply`, `fx` and `lut`
 # must give the same bytes. TFX_TOOL names the tool; PYTHONPATH finds the module (CTest sets
 # both).
+import json
 import os
 import subprocess
-import threading
+from concurrent.futures import ThreadPoolExecutor
 
 import numpy as np
 import pytest
@@ -58,13 +59,7 @@ FILTERS = [
 ]
 
 
-def settings(files, params):
-    return {"lut3dPath": str(files[0] / "look.cube")} if params == "lut" else params
-
-
 def test_filters_are_the_tools_list():
-    import json
-
     listed = json.loads(tool("list", "--json"))["filters"]
     mine = tfx.filters()
     assert [f.name for f in mine] == [name for name, _ in FILTERS]
@@ -81,7 +76,7 @@ def test_filters_are_the_tools_list():
 @pytest.mark.parametrize("name,params", FILTERS, ids=[f[0] for f in FILTERS])
 def test_every_filter_gives_the_tools_bytes(files, name, params):
     d, img, bg = files
-    params = settings(files, params)
+    params = {"lut3dPath": str(d / "look.cube")} if params == "lut" else params
     argv = ["apply", name] + [a for k, v in params.items() for a in ("-p", f"{k}={v}")]
     if name == "ChromeKeyCombine":
         argv += ["-b", d / "bg.png"]
@@ -108,13 +103,12 @@ def test_chain_is_the_tools_chain(files):
 
 @pytest.mark.parametrize("call", [
     lambda x, order: tfx.Filter("HSLAdjust", u_red_hue=50)(x, order=order),
-    lambda x, order: tfx.apply(x, "ChromeKeyLut3d", green=220, mode=0, order=order),
     lambda x, order: tfx.apply(x, [tfx.Filter("ColorAdjust", u_sat=60),
                                    tfx.Filter("VignetteAdjust", amount=-40)], order=order),
     lambda x, order: tfx.clarity(x, 60, order=order),
     lambda x, order: tfx.frame(x, 255, 0, 0, 255, 3, order=order),
     lambda x, order: tfx.read_lut(os.environ["TFX_TEST_LUT"]).apply(x, order=order),
-], ids=["filter", "apply", "chain", "function", "resizing-function", "lut"])
+], ids=["filter", "chain", "function", "resizing-function", "lut"])
 def test_orders_reorder_the_bgra_bytes(files, call, monkeypatch):
     d, img, _ = files
     monkeypatch.setenv("TFX_TEST_LUT", str(d / "look.cube"))
@@ -144,13 +138,11 @@ def test_strided_views_are_read_through_their_strides(files):
     np.testing.assert_array_equal(f(img[::-1]), f(np.ascontiguousarray(img[::-1])))
 
 
+# Every function takes the one path of the tool's table, whose every entry the tool tests run: one
+# of each kind of argument (a renamed one, fractions, negatives) and of result size suffices.
 FX = [
-    ("blur", [4]), ("stack-pass", [3, 2]), ("box-blur", [3]), ("window-variance", [2]),
-    ("percentile", [2, 0.5]), ("denoise", [30]), ("local-denoise", [5, 200]),
-    ("dct-denoise", [12.5]), ("dehaze", [40]), ("haze-veil", [0.8]), ("sharpen", [50]),
-    ("clarity", [40]), ("diffuse", [300]), ("grain", [30, 50]), ("hue", [45]),
-    ("temperature", [6500]), ("hsl", [3, 40, -20, 10, 0, 0]), ("vignette", [-50, 40, 50, 60, 0, 0]),
-    ("frame", [255, 0, 0, 255, 4]), ("clip", [30, 20]), ("pad-blur", [5]),
+    ("blur", [4]), ("stack-pass", [3, 2]), ("dct-denoise", [12.5]), ("grain", [30, 50]),
+    ("hsl", [3, 40, -20, 10, 0, 0]), ("frame", [255, 0, 0, 255, 4]), ("clip", [30, 20]),
 ]
 
 
@@ -177,42 +169,43 @@ def test_library_names_and_two_image_functions(files):
 
 def test_luts_match_the_tool(files, tmp_path):
     d, img, _ = files
+
+    def same_file(a, b):
+        assert (tmp_path / a).read_bytes() == (tmp_path / b).read_bytes()
+
+    def tool_lut_image(name):
+        return tool_image(d, "apply", "Lut", "-p", f"lut3dPath={tmp_path / name}", d / "in.png",
+                          d / "out.png")
+
     tool("lut", "bake", "-f", "LightAdjust", "-p", "u_shadow=30", "-f", "ColorAdjust", "-p",
          "u_exposure=-12.5", "--size", 21, tmp_path / "tool.cube")
-    lut = tfx.bake_lut([tfx.Filter("LightAdjust", u_shadow=30), ("ColorAdjust", {"u_exposure": -12.5})],
-                       size=21)
-    lut.write(tmp_path / "mine.cube")
-    assert (tmp_path / "mine.cube").read_bytes() == (tmp_path / "tool.cube").read_bytes()
+    tfx.bake_lut([tfx.Filter("LightAdjust", u_shadow=30), ("ColorAdjust", {"u_exposure": -12.5})],
+                 size=21).write(tmp_path / "mine.cube")
+    same_file("mine.cube", "tool.cube")
     read = tfx.read_lut(tmp_path / "tool.cube")
     assert read.size == 21 and read.table.shape == (21, 21, 21, 3)
-    expected = tool_image(d, "apply", "Lut", "-p", f"lut3dPath={tmp_path / 'tool.cube'}",
-                          d / "in.png", d / "out.png")
-    np.testing.assert_array_equal(read.apply(img), expected)
+    np.testing.assert_array_equal(read.apply(img), tool_lut_image("tool.cube"))
 
     # A .3dl goes through the plug-in's own reader, for a table and for the filter alike.
     rows = np.random.default_rng(2).integers(0, 4096, (27, 3))
     (tmp_path / "grade.3dl").write_text("3DMESH\nMesh 0 12\n0 2047 4095\n" +
                                         "".join("%d %d %d\n" % tuple(r) for r in rows))
     dl = tfx.read_lut(tmp_path / "grade.3dl")
-    expected = tool_image(d, "apply", "Lut", "-p", f"lut3dPath={tmp_path / 'grade.3dl'}",
-                          d / "in.png", d / "out.png")
-    np.testing.assert_array_equal(dl.apply(img), expected)
+    np.testing.assert_array_equal(dl.apply(img), tool_lut_image("grade.3dl"))
     dl.write(tmp_path / "mine3.cube")
     tool("lut", "convert", tmp_path / "grade.3dl", tmp_path / "tool3.cube")
-    assert (tmp_path / "mine3.cube").read_bytes() == (tmp_path / "tool3.cube").read_bytes()
+    same_file("mine3.cube", "tool3.cube")
 
     # Larger than the plug-in holds: refused without a size, resampled as `lut convert` does.
-    n = 66
-    axis = np.linspace(0, 1, n)
+    axis = np.linspace(0, 1, 66)
     b, g, r = np.meshgrid(axis, axis, axis, indexing="ij")
-    rows = "\n".join(f"{x:.6f} {y:.6f} {z:.6f}" for x, y, z in
-                     zip(r.ravel() ** 0.8, g.ravel(), b.ravel()))
-    (tmp_path / "big.cube").write_text(f"LUT_3D_SIZE {n}\n{rows}\n")
+    (tmp_path / "big.cube").write_text("LUT_3D_SIZE 66\n" + "".join(
+        f"{x:.6f} {y:.6f} {z:.6f}\n" for x, y, z in zip(r.ravel() ** 0.8, g.ravel(), b.ravel())))
     with pytest.raises(tfx.LutError, match="66"):
         tfx.read_lut(tmp_path / "big.cube")
     tfx.read_lut(tmp_path / "big.cube", size=33).write(tmp_path / "mine33.cube")
     tool("lut", "convert", tmp_path / "big.cube", tmp_path / "tool33.cube", "--size", 33)
-    assert (tmp_path / "mine33.cube").read_bytes() == (tmp_path / "tool33.cube").read_bytes()
+    same_file("mine33.cube", "tool33.cube")
 
 
 @pytest.mark.parametrize("frame,error", [
@@ -277,20 +270,14 @@ def test_threads_over_separate_filters_give_the_serial_bytes(files):
     frames = [np.roll(img, k, axis=1) for k in range(8)]
     made = [dict(u_exposure=10 * k, u_sat=-5 * k) for k in range(4)]
     serial = [[tfx.Filter("ColorAdjust", **p)(x) for x in frames] for p in made]
-    parallel = [None] * 4
 
-    def work(i):
-        f = tfx.Filter("ColorAdjust", **made[i])
-        parallel[i] = [f(x) for x in frames for _ in range(3)][::3]
+    def work(p):
+        f = tfx.Filter("ColorAdjust", **p)
+        return [f(x) for x in frames for _ in range(3)][::3]
 
-    threads = [threading.Thread(target=work, args=(i,)) for i in range(4)]
-    for t in threads:
-        t.start()
-    for t in threads:
-        t.join()
-    for s, p in zip(serial, parallel):
-        for a, b in zip(s, p):
-            np.testing.assert_array_equal(a, b)
+    with ThreadPoolExecutor(len(made)) as pool:
+        parallel = list(pool.map(work, made))
+    np.testing.assert_array_equal(np.array(parallel), np.array(serial))
 
 
 def test_opencl_class_gives_the_tools_bytes(files):

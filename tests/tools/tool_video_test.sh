@@ -1,8 +1,7 @@
 #!/usr/bin/env bash
-# The tool on clips, as a user runs it: every frame of a lossless result is the picture path's
-# result for that decoded frame; sound, timing and frame count survive; any number of threads
-# gives the same bytes; H.264 stays close to the lossless result; and every failure leaves
-# nothing at the target and names its cause, a full disk included.
+# The tool on clips, as a user runs it: a lossless result is the picture path's, frame by frame;
+# sound, timing and tags survive; threads change nothing; H.264 stays close; and every failure
+# leaves nothing at the target and names its cause, a full disk included.
 #   tool_video_test.sh TOOL
 set -uo pipefail
 tool=$1
@@ -18,11 +17,9 @@ video_md5() { ffmpeg -nostdin -v error -i "$1" -map 0:v -f framemd5 - | grep -v 
 audio_md5() { ffmpeg -nostdin -v error -i "$1" -map 0:a -c copy -f md5 -; }
 times() { ffprobe -v error -select_streams v -show_entries frame=pts -of csv=p=0 "$1"; }
 
-# A lossless BGRA clip with sound, and a variable-frame-rate one.
+# A lossless BGRA clip with sound. Odd timings are the video library tests' business.
 ff -f lavfi -i "testsrc2=s=96x64:r=25:d=0.6,format=bgra" -f lavfi -i "sine=f=440:d=0.6" \
   -c:v ffv1 -c:a aac clip.mkv
-ff -f lavfi -i "testsrc2=s=96x64:r=50:d=0.6,setpts='N*N*40'" -fps_mode vfr -c:v ffv1 \
-  -pix_fmt bgra vfr.mkv
 chain=(-f ColorAdjust -p u_exposure=30 -p u_sat=20 -f VignetteAdjust -p amount=-40)
 
 # Lossless: each frame equals the picture path on that frame.
@@ -30,20 +27,13 @@ chain=(-f ColorAdjust -p u_exposure=30 -p u_sat=20 -f VignetteAdjust -p amount=-
 ff -i clip.mkv -fps_mode passthrough frame_%02d.png
 frames=$(ls frame_*.png | wc -l)
 [ "$frames" = 15 ] || fail "the test clip has $frames frames, not 15"
-same_frames=0
-for f in frame_*.png; do
-  n=${f#frame_}
-  "$tool" apply -q "${chain[@]}" "$f" "ref_$n" >/dev/null
-  ff -i "ref_$n" -f rawvideo -pix_fmt bgra "ref_${n%.png}.raw"
-  ff -i "out.mkv" -vf "select=eq(n\,$((10#${n%.png} - 1)))" -frames:v 1 -f rawvideo -pix_fmt bgra \
-    "got_${n%.png}.raw"
-  cmp -s "ref_${n%.png}.raw" "got_${n%.png}.raw" && same_frames=$((same_frames + 1))
-done
-same "frames equal to the picture path's result" "$same_frames" "$frames"
+for f in frame_*.png; do "$tool" apply -q "${chain[@]}" "$f" "ref_$f" >/dev/null; done
+ff -i ref_frame_%02d.png -f rawvideo -pix_fmt bgra ref.raw
+ff -i out.mkv -fps_mode passthrough -f rawvideo -pix_fmt bgra got.raw
+cmp -s ref.raw got.raw && ok "frames equal to the picture path's result" ||
+  fail "frames differ from the picture path's result"
 same "audio packets copied bit for bit" "$(audio_md5 out.mkv)" "$(audio_md5 clip.mkv)"
 same "frame count and timestamps kept" "$(times out.mkv)" "$(times clip.mkv)"
-"$tool" apply -q "${chain[@]}" --codec ffv1 vfr.mkv vfr-out.mkv || fail "apply on a VFR clip"
-same "variable frame rate kept" "$(times vfr-out.mkv)" "$(times vfr.mkv)"
 
 # Rotation and colour tags survive (stream copy adds the rotation: the encoder option ignores it).
 ff -f lavfi -i "testsrc2=s=96x64:r=25:d=0.4" -c:v libx264 -preset ultrafast -pix_fmt yuv420p \
@@ -83,7 +73,8 @@ ffprobe -v error -show_entries stream=pix_fmt -of csv=p=0 keyed.mov | grep -q yu
   ok "the keyed clip has alpha" || fail "the keyed clip lost its alpha"
 "$tool" key -q --screen 48,192,64 --over frame_01.png green.mkv comp.mp4 || fail "key --over"
 
-# Failures: a clear message, a non-zero exit, nothing at the target.
+# Failures: a clear message, a non-zero exit, nothing at the target. The library's own messages
+# for each cause are its tests' business.
 expect_failure() {  # expect_failure NAME PATTERN TARGET COMMAND...
   local name=$1 pattern=$2 target=$3
   shift 3
@@ -98,7 +89,6 @@ expect_failure() {  # expect_failure NAME PATTERN TARGET COMMAND...
 }
 ff -f lavfi -i "sine=d=0.3" sound.wav
 mkdir -p sealed && chmod 555 sealed
-expect_failure "unreadable input" "no such file" x1.mp4 "$tool" apply ColorAdjust missing.mp4 x1.mp4
 expect_failure "no video stream" "video" x2.mp4 "$tool" apply ColorAdjust sound.wav x2.mp4
 expect_failure "unknown codec" "nosuchcodec" x3.mkv \
   "$tool" apply --codec nosuchcodec ColorAdjust clip.mkv x3.mkv
@@ -106,8 +96,6 @@ if [ "$(id -u)" != 0 ]; then
   expect_failure "unwritable directory" "sealed" sealed/x4.mkv \
     "$tool" apply ColorAdjust clip.mkv sealed/x4.mkv
 fi
-expect_failure "missing output directory" "nowhere" nowhere/x6.mkv \
-  "$tool" apply ColorAdjust clip.mkv nowhere/x6.mkv
 expect_failure "a picture as the output of a clip" "clip" x5.png \
   "$tool" apply ColorAdjust clip.mkv x5.png
 # A full disk: a 64 KiB file system of its own, where mount namespaces are allowed.
@@ -122,10 +110,7 @@ fi
 # Ctrl-C halfway: nothing at the target, no temporary file.
 ff -f lavfi -i "testsrc2=s=640x360:r=25:d=20" -c:v libx264 -preset ultrafast long.mp4
 "$tool" apply -q --threads 1 ColorAdjust -p u_exposure=10 long.mp4 cut.mp4 &
-pid=$!
-sleep 1
-kill -INT $pid
-wait $pid
+sleep 1; kill -INT $!; wait $!
 rc=$?
 left=$(find . -maxdepth 1 -name "*.tmp-*")
 [ $rc != 0 ] && [ ! -e cut.mp4 ] && [ -z "$left" ] && ok "Ctrl-C leaves nothing" ||

@@ -1,14 +1,13 @@
 // Clips are made on the spot by the ffmpeg command-line tool, which also judges the results
-// (packet checksums, PSNR), so that the module is never checked against itself alone.
+// (packet checksums), so that the module is never checked against itself alone.
 #include <gtest/gtest.h>
 #include <stdio.h>
-#include <stdlib.h>
 
-#include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <opencv2/core.hpp>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include "../support/TempDir.h"
@@ -31,10 +30,9 @@ class VideoFiles : public ::testing::Test {
   std::string Path(const std::string& name) const { return dir_.Path(name); }
 
   // Runs the ffmpeg tool quietly; its stdout and stderr come back together.
-  static std::string Ffmpeg(const std::string& args, const std::string& level = "error") {
-    const std::string command = std::string(TFX_FFMPEG_CLI) +
-                                " -hide_banner -nostdin -y -loglevel " + level + " " + args +
-                                " 2>&1";
+  static std::string Ffmpeg(const std::string& args) {
+    const std::string command =
+        std::string(TFX_FFMPEG_CLI) + " -hide_banner -nostdin -y -loglevel error " + args + " 2>&1";
     std::string text;
     FILE* pipe = popen(command.c_str(), "r");
     char buffer[4096];
@@ -48,9 +46,6 @@ class VideoFiles : public ::testing::Test {
     const std::string log = Ffmpeg(args + " '" + path + "'");
     EXPECT_TRUE(fs::exists(path)) << log;
     return path;
-  }
-  std::string PacketSums(const std::string& path, const std::string& streams) {
-    return Ffmpeg("-i '" + path + "' -map 0:" + streams + " -c copy -f md5 -");
   }
 
   struct Clip {
@@ -126,10 +121,10 @@ TEST_F(VideoFiles, LosslessRoundTripKeepsPixelsTimesAlphaAndSideStreams) {
   for (size_t i = 0; i < in.frames.size() && i < out.frames.size(); ++i)
     EXPECT_EQ(cv::norm(in.frames[i].bgra, out.frames[i].bgra, cv::NORM_INF), 0) << "frame " << i;
   EXPECT_EQ(out.lost, 0);
-  for (const char* streams : {"a", "s"}) {
-    const std::string sums = PacketSums(source, streams);
+  for (const std::string streams : {"a", "s"}) {
+    const std::string sums = Ffmpeg("-i '" + source + "' -map 0:" + streams + " -c copy -f md5 -");
     EXPECT_NE(sums.find("MD5="), std::string::npos) << sums;
-    EXPECT_EQ(sums, PacketSums(copy, streams)) << streams;
+    EXPECT_EQ(sums, Ffmpeg("-i '" + copy + "' -map 0:" + streams + " -c copy -f md5 -")) << streams;
   }
 }
 
@@ -140,35 +135,28 @@ TEST_F(VideoFiles, VariableFrameRateKeepsEveryTimestamp) {
            "-f lavfi -i testsrc2=s=64x48:r=25:d=1 -vf \"settb=1/1000,setpts='N/25/TB+"
            "gte(N,10)*0.31/TB+gte(N,18)*(N-18)*0.013/TB'\" -fps_mode passthrough -enc_time_base "
            "1:1000 -c:v ffv1");
+  const Clip in = ReadAll(source);
+  ASSERT_EQ(in.frames.size(), 25u);
+  EXPECT_NEAR(Seconds(in, 10) - Seconds(in, 9), 0.35, 1e-9);
   for (const char* target : {"vfr.mp4", "vfr-copy.mkv"}) {
     Status s = Transcode(source, Path(target), {});
     ASSERT_TRUE(s.ok()) << s.message();
-    const Clip in = ReadAll(source), out = ReadAll(Path(target));
-    ASSERT_EQ(in.frames.size(), 25u);
-    EXPECT_NEAR(Seconds(in, 10) - Seconds(in, 9), 0.35, 1e-9);
-    ExpectSameTimes(in, out);
+    ExpectSameTimes(in, ReadAll(Path(target)));
   }
 }
 
-TEST_F(VideoFiles, H264OutputIsCloseToItsSourceAndKeepsColourAndSound) {
-  const std::string source = Make(
-      "bt709.mp4",
-      "-f lavfi -i mandelbrot=s=320x240:r=25,trim=duration=1 -f lavfi -i sine=d=1 -c:v libx264 "
-      "-pix_fmt yuv420p -colorspace bt709 -color_primaries bt709 -color_trc bt709 "
-      "-color_range tv -c:a aac");
-  const std::string copy = Path("out.mp4");
-  Status s = Transcode(source, copy, {});
-  ASSERT_TRUE(s.ok()) << s.message();
-
-  const Clip in = ReadAll(source), out = ReadAll(copy);
-  for (const Clip* clip : {&in, &out}) {
-    EXPECT_EQ(clip->info.colour.primaries, 1);  // BT.709
-    EXPECT_EQ(clip->info.colour.transfer, 1);
-    EXPECT_EQ(clip->info.colour.matrix, 1);
-    EXPECT_EQ(clip->info.colour.range, 1);  // limited
-    EXPECT_EQ(clip->info.pixelFormat, "yuv420p");
-  }
-  ExpectSameTimes(in, out);
+// What the writer makes of the tags, and how close H.264 stays, the tool's clip tests judge.
+TEST_F(VideoFiles, H264InputIsReadByItsColourTags) {
+  const std::string source =
+      Make("bt709.mp4",
+           "-f lavfi -i mandelbrot=s=320x240:r=25,trim=duration=0.2 -c:v libx264 -pix_fmt yuv420p "
+           "-colorspace bt709 -color_primaries bt709 -color_trc bt709 -color_range tv");
+  const Clip in = ReadAll(source);
+  ASSERT_FALSE(in.frames.empty());
+  const tfxtool::media::ColourTags& c = in.info.colour;
+  // BT.709 throughout, limited range.
+  EXPECT_EQ(std::tie(c.primaries, c.transfer, c.matrix, c.range), std::make_tuple(1, 1, 1, 1));
+  EXPECT_EQ(in.info.pixelFormat, "yuv420p");
   // A small frame with BT.709 tags: the reader must follow the tags, not the size.
   const std::string rgb = Ffmpeg("-i '" + source +
                                  "' -frames:v 1 -sws_flags bicubic+accurate_rnd+full_chroma_int "
@@ -176,13 +164,6 @@ TEST_F(VideoFiles, H264OutputIsCloseToItsSourceAndKeepsColourAndSound) {
   ASSERT_EQ(rgb.size(), 320u * 240 * 4);
   const cv::Mat reference(240, 320, CV_8UC4, const_cast<char*>(rgb.data()));
   EXPECT_LT(cv::norm(reference, in.frames[0].bgra, cv::NORM_L1) / reference.total(), 2.0);
-
-  const std::string psnr =
-      Ffmpeg("-i '" + copy + "' -i '" + source + "' -lavfi psnr -f null -", "info");
-  const size_t at = psnr.find("average:");
-  ASSERT_NE(at, std::string::npos) << psnr;
-  EXPECT_GE(std::atof(psnr.c_str() + at + 8), 40.0) << psnr.substr(at);
-  EXPECT_EQ(PacketSums(source, "a"), PacketSums(copy, "a"));
 }
 
 TEST_F(VideoFiles, ImageSequenceAndStillReadAsVideos) {
@@ -192,7 +173,6 @@ TEST_F(VideoFiles, ImageSequenceAndStillReadAsVideos) {
   options.alpha = true;
   Status s = Transcode(source, Path("shot_%04d.png"), options);
   ASSERT_TRUE(s.ok()) << s.message();
-  EXPECT_TRUE(fs::exists(Path("shot_0005.png")));
   EXPECT_EQ(dir_.Names().size(), 6u);  // the source and five pictures
 
   const Clip in = ReadAll(source), shots = ReadAll(Path("shot_%04d.png"));
@@ -209,12 +189,11 @@ TEST_F(VideoFiles, ImageSequenceAndStillReadAsVideos) {
 TEST_F(VideoFiles, FailuresNameTheirCauseAndLeaveNoFile) {
   const std::string source = Make("in.mkv", "-f lavfi -i testsrc2=s=64x48:r=25:d=2 -c:v ffv1");
   const std::string sound = Make("sound.m4a", "-f lavfi -i sine=d=0.2 -c:a aac");
-  const auto opening = [](const std::string& path) {
+  for (const auto& [path, cause] :
+       {std::pair{Path("missing.mkv"), "No such file"}, {sound, "has no video stream"}}) {
     VideoReader reader;
-    return reader.Open(path).message();
-  };
-  EXPECT_NE(opening(Path("missing.mkv")).find("No such file"), std::string::npos);
-  EXPECT_NE(opening(sound).find("has no video stream"), std::string::npos);
+    EXPECT_NE(reader.Open(path).message().find(cause), std::string::npos) << path;
+  }
 
   const std::vector<std::string> before = dir_.Names();
   struct Case {
@@ -225,7 +204,7 @@ TEST_F(VideoFiles, FailuresNameTheirCauseAndLeaveNoFile) {
            {Path("out.mp4"), "ffv1", "cannot be written into .mp4"},
            {Path("out.mp4"), "pcm_s16le", "does not encode video"},
            {"/nonexistent-tfx/out.mkv", "", "cannot write into directory '/nonexistent-tfx'"},
-           {Path("sound.m4a") + "/out.mkv", "", "Not a directory"}}) {
+           {sound + "/out.mkv", "", "Not a directory"}}) {
     VideoReader reader;
     ASSERT_TRUE(reader.Open(source).ok());
     VideoWriter writer;
@@ -233,8 +212,8 @@ TEST_F(VideoFiles, FailuresNameTheirCauseAndLeaveNoFile) {
     options.codec = c.codec;
     const std::string message = writer.Open(c.target, reader, options).message();
     EXPECT_NE(message.find(c.cause), std::string::npos) << message;
-    EXPECT_FALSE(fs::exists(c.target)) << c.target;
   }
+  EXPECT_FALSE(fs::exists("/nonexistent-tfx"));
   EXPECT_EQ(dir_.Names(), before);
 
   // Abandoned half way, by Abort() and by the interrupt path.

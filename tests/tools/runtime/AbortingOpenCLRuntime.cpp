@@ -1,6 +1,5 @@
-// An OpenCL runtime that aborts the process while the ICD loader starts it, as a runtime does
-// that cannot find its machine (PoCL without /sys) or a broken driver: the loader asks every
-// runtime for this function first.
+// An OpenCL runtime that aborts while the ICD loader starts it, as one that cannot find its machine
+// (PoCL without /sys) or a broken driver does: the loader asks every runtime for this first.
 #include <cstdlib>
 
 extern "C" __attribute__((visibility("default"))) void* clGetExtensionFunctionAddress(const char*) {
